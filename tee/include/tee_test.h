@@ -1,0 +1,124 @@
+/// For tests only: devices in memory, trusted applications given as functions, faults on order,
+/// a power cut, and a sink for log lines.
+#ifndef TEE_TEST_H
+#define TEE_TEST_H
+
+#include <tee_inspect.h>
+#include <tee_ta_image.h>
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace tee::test {
+
+enum class Fault {
+  kAllocation,  // TEE_Malloc returns NULL
+  kStorage,     // a persistent-object call (open, create, read, write, close-and-delete) fails
+  kCrypto,      // a transient-object, operation or cryptographic call that can fail does
+  kTaCall,      // TEE_OpenTASession or TEE_InvokeTACommand fails
+  kShortRead,   // TEE_ReadObjectData succeeds with half of the bytes
+  kPowerCut,    // the n-th durable write and everything durable after it never happens
+};
+
+/// Tells of the latest fault: what was hit, for messages of a failing sweep.
+struct FaultReport {
+  bool fired = false;
+  std::string call;  // for example "TEE_WriteObjectData"
+};
+
+struct TaProperties {
+  TEE_UUID uuid{};
+  uint32_t data_size = 0x200000;
+  uint32_t stack_size = 0x2000;
+  std::string trace_prefix = "TA: test";
+  uint32_t trace_level = 1;
+};
+
+/// A device whose objects live in memory. Its name is a context name for TEEC_InitializeContext().
+/// Objects outlive contexts, sessions and instances; they end with the Device.
+class Device {
+ public:
+  Device();
+  ~Device();
+  Device(const Device &) = delete;
+  Device &operator=(const Device &) = delete;
+
+  const char *name() const;
+
+  /// Uses these functions as the trusted application `properties.uuid` in place of an image.
+  void register_ta(const TaProperties &properties, const tee_ta_entry_points &entry_points);
+
+  /// The `nth` call (1 is the next) of kind `fault` that instances of `uuid` make fails with
+  /// `code` (0: the natural one of that kind); with `and_after` every later one, too. Replaces an
+  /// earlier plan of the same kind.
+  void fail(const TEE_UUID &uuid, Fault fault, unsigned nth, bool and_after = false,
+            TEE_Result code = 0);
+  void clear_faults();
+  FaultReport fault_report() const;
+
+  /// After kPowerCut fired: gives back what storage really holds and lets writes happen again.
+  void restore_power();
+
+  /// All objects of a trusted application: ID to raw data stream.
+  std::map<std::string, std::string> objects(const TEE_UUID &uuid) const;
+  void put_object(const TEE_UUID &uuid, const std::string &id, const std::string &data);
+  void remove_object(const TEE_UUID &uuid, const std::string &id);
+
+  /// Durable writes (object creations, closes after writing, deletions) so far, of all TAs.
+  uint64_t durable_writes() const;
+
+  struct Impl;
+  Impl *impl() const { return impl_.get(); }
+
+ private:
+  std::unique_ptr<Impl> impl_;
+};
+
+/// Makes this thread run as an instance of a trusted application of `device` while it lives, so
+/// that a unit test may call TEE_* functions, or code that does, directly.
+class InsideTa {
+ public:
+  explicit InsideTa(Device &device, const TaProperties &properties = {});
+  ~InsideTa();
+  InsideTa(const InsideTa &) = delete;
+  InsideTa &operator=(const InsideTa &) = delete;
+
+  tee_heap_stats stats() const;
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+/// Collects log lines while it lives, in place of standard error. Sinks nest.
+class TraceSink {
+ public:
+  TraceSink();
+  ~TraceSink();
+  TraceSink(const TraceSink &) = delete;
+  TraceSink &operator=(const TraceSink &) = delete;
+
+  struct Line {
+    std::string tag;       // "ERR"
+    std::string function;  // "init_dsi"
+    std::string message;   // formatted, without a final line feed
+  };
+  const std::vector<Line> &lines() const;
+  void clear();
+
+  struct Impl;
+
+ private:
+  std::unique_ptr<Impl> impl_;
+};
+
+/// Names the folder from which TA images are loaded, before the places that programs look in.
+void set_ta_directory(const std::string &directory);
+
+}  // namespace tee::test
+
+#endif
