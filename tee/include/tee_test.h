@@ -38,11 +38,15 @@ struct TaProperties {
   uint32_t trace_level = 1;
 };
 
-/// A device whose objects live in memory. Its name is a context name for TEEC_InitializeContext().
-/// Objects outlive contexts, sessions and instances; they end with the Device.
+/// A device whose objects live in memory, or in a state directory. Its name is a context name for
+/// TEEC_InitializeContext(). Objects outlive contexts, sessions and instances; in memory they end
+/// with the Device.
 class Device {
  public:
   Device();
+
+  /// With the database of `state_directory`; throws std::runtime_error when it cannot be opened.
+  explicit Device(const std::string &state_directory);
   ~Device();
   Device(const Device &) = delete;
   Device &operator=(const Device &) = delete;

@@ -1,0 +1,105 @@
+#include "heap.h"
+
+#include <tee_internal_api.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <new>
+
+#include "ta_instance.h"
+
+namespace tee {
+
+namespace {
+constexpr uint32_t kAlignment = 16;
+constexpr uint32_t kHeaderLen = 16;
+constexpr size_t kFirstSlots = 256;
+}  // namespace
+
+Heap::~Heap() {
+  for (size_t i = 0; i < num_slots_; ++i) std::free(slots_[i].block);
+}
+
+void *Heap::allocate(uint32_t len) {
+  const uint64_t charge = (uint64_t{len} + kAlignment - 1) / kAlignment * kAlignment + kHeaderLen;
+  if (charge > size_ - in_use_) return nullptr;
+  if (2 * (size_t{live_} + 1) > num_slots_ && !grow()) return nullptr;
+  void *block = std::calloc(1, len);
+  if (block == nullptr) return nullptr;
+  insert({block, static_cast<uint32_t>(charge)});
+  in_use_ += static_cast<uint32_t>(charge);
+  peak_ = std::max(peak_, in_use_);
+  peak_live_ = std::max(peak_live_, ++live_);
+  return block;
+}
+
+bool Heap::release(void *block) {
+  if (live_ == 0) return false;
+  size_t slot = home(block);
+  while (slots_[slot].block != block) {
+    if (slots_[slot].block == nullptr) return false;
+    slot = next(slot);
+  }
+  in_use_ -= slots_[slot].charge;
+  --live_;
+  erase(slot);
+  std::free(block);
+  return true;
+}
+
+// Neighbours in memory are neighbours in the table: allocations that follow each other share its
+// cache lines, which a hash that scatters would not let them do.
+size_t Heap::home(const void *block) const {
+  return reinterpret_cast<uintptr_t>(block) / kAlignment & (num_slots_ - 1);
+}
+
+bool Heap::grow() {
+  const size_t old_num = num_slots_;
+  const size_t new_num = old_num == 0 ? kFirstSlots : 2 * old_num;
+  std::unique_ptr<Slot[]> bigger(new (std::nothrow) Slot[new_num]{});
+  if (!bigger) return false;
+  slots_.swap(bigger);
+  num_slots_ = new_num;
+  for (size_t i = 0; i < old_num; ++i) {
+    if (bigger[i].block != nullptr) insert(bigger[i]);
+  }
+  return true;
+}
+
+void Heap::insert(Slot entry) {
+  size_t slot = home(entry.block);
+  while (slots_[slot].block != nullptr) slot = next(slot);
+  slots_[slot] = entry;
+}
+
+// Closes the gap, so that every entry stays reachable from its home without passing a free slot.
+void Heap::erase(size_t hole) {
+  const size_t mask = num_slots_ - 1;
+  for (size_t i = next(hole); slots_[i].block != nullptr; i = next(i)) {
+    const size_t from_home = (i - home(slots_[i].block)) & mask;
+    const size_t from_hole = (i - hole) & mask;
+    if (from_home < from_hole) continue;
+    slots_[hole] = slots_[i];
+    hole = i;
+  }
+  slots_[hole] = {};
+}
+
+}  // namespace tee
+
+using namespace tee;
+
+void *TEE_Malloc(TEE_LengthType size, uint32_t) {
+  TEE_Result ignored;
+  if (fault_due(Fault::kAllocation, "TEE_Malloc", TEE_ERROR_OUT_OF_MEMORY, &ignored)) {
+    return nullptr;
+  }
+  return current_instance().heap.allocate(size);
+}
+
+void TEE_Free(void *buffer) {
+  if (buffer == nullptr) return;
+  if (!current_instance().heap.release(buffer)) {
+    panic("TEE_Free", "not a live block of this instance");
+  }
+}

@@ -1,0 +1,57 @@
+/// The heap of one instance: what TEE_Malloc() charges against gpd.ta.dataSize.
+#ifndef TEE_HEAP_H
+#define TEE_HEAP_H
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+
+namespace tee {
+
+/// Memory comes from the host in exactly the size asked for, so that a sanitizer sees one byte too
+/// far; the charge is what a small allocator inside a TEE would take. Live blocks are kept in a
+/// hash table beside them: a pointer is judged without being read.
+class Heap {
+ public:
+  explicit Heap(uint32_t size) : size_(size) {}
+  ~Heap();
+  Heap(const Heap &) = delete;
+  Heap &operator=(const Heap &) = delete;
+
+  /// Zero-filled; NULL when the heap is full.
+  void *allocate(uint32_t len);
+
+  /// False when `block` is no live block of this heap.
+  bool release(void *block);
+
+  uint32_t size() const { return size_; }
+  uint32_t in_use() const { return in_use_; }
+  uint32_t peak() const { return peak_; }
+  uint32_t live_blocks() const { return live_; }
+  uint32_t peak_blocks() const { return peak_live_; }
+
+ private:
+  struct Slot {
+    void *block;  // NULL: free
+    uint32_t charge;
+  };
+
+  size_t home(const void *block) const;
+  size_t next(size_t slot) const { return (slot + 1) & (num_slots_ - 1); }
+  bool grow();
+  void insert(Slot entry);
+  void erase(size_t hole);
+
+  const uint32_t size_;
+  uint32_t in_use_ = 0;
+  uint32_t peak_ = 0;
+  uint32_t live_ = 0;
+  uint32_t peak_live_ = 0;
+  // Open addressing with linear probing, a power of two, at most half full.
+  std::unique_ptr<Slot[]> slots_;
+  size_t num_slots_ = 0;
+};
+
+}  // namespace tee
+
+#endif

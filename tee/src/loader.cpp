@@ -1,0 +1,164 @@
+#include "loader.h"
+
+#include <dlfcn.h>
+#include <tee_test.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <mutex>
+#include <span>
+
+#include "error.h"
+#include "host_file.h"
+
+namespace tee {
+
+namespace fs = std::filesystem;
+
+namespace {
+
+std::mutex g_lock;  // of the variable below, and of "is it loaded? then load"
+std::string g_test_directory;
+
+Error bad_image(const fs::path &file, const std::string &why) {
+  return {TEE_ERROR_BAD_FORMAT, "TA image " + file.string() + ": " + why};
+}
+
+// ---- Finding
+
+std::vector<fs::path> search_path() {
+  std::vector<fs::path> folders;
+  if (!g_test_directory.empty()) folders.emplace_back(g_test_directory);
+  std::error_code error;
+  const fs::path program = fs::read_symlink("/proc/self/exe", error);
+  if (!error) folders.push_back(program.parent_path().parent_path() / "ta");
+#ifdef TEE_INSTALLED_TA_DIR
+  folders.emplace_back(TEE_INSTALLED_TA_DIR);
+#endif
+  if (const char *folder = std::getenv("OTRP_TA_DIR"); folder != nullptr && *folder != '\0') {
+    folders.emplace_back(folder);
+  }
+  return folders;
+}
+
+fs::path find_image(const TEE_UUID &ta) {
+  const std::string name = uuid_text(ta) + ".so";
+  std::string looked;
+  for (const fs::path &folder : search_path()) {
+    std::error_code error;
+    if (fs::exists(folder / name, error)) return folder / name;
+    looked += (looked.empty() ? " in " : ", ") + folder.string();
+  }
+  throw Error{TEE_ERROR_ITEM_NOT_FOUND, "no TA image " + name + looked};
+}
+
+// ---- Loading
+
+// A shared object together with the copy it was loaded from: while that is open, no other copy
+// can have the same name, by which the dynamic linker would take one for the other.
+struct LoadedImage {
+  host::File copy;
+  void *handle = nullptr;
+
+  LoadedImage() = default;
+  LoadedImage(const LoadedImage &) = delete;
+  LoadedImage &operator=(const LoadedImage &) = delete;
+  ~LoadedImage() {
+    if (handle != nullptr) ::dlclose(handle);
+  }
+};
+
+bool is_loaded(const fs::path &file) {
+  void *handle = ::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD);
+  if (handle != nullptr) ::dlclose(handle);
+  return handle != nullptr;
+}
+
+host::File copy_of(const fs::path &file) {
+  const host::File source = host::open_for_reading(file.c_str());
+  if (!source.valid()) throw system_error("cannot read " + file.string());
+  host::File copy = host::copy_in_memory(file.filename().c_str(), source);
+  if (!copy.valid()) throw system_error("cannot copy " + file.string());
+  return copy;
+}
+
+std::shared_ptr<LoadedImage> load(const fs::path &file) {
+  auto image = std::make_shared<LoadedImage>();
+  std::string name = file.string();
+  if (is_loaded(file)) {
+    image->copy = copy_of(file);
+    name = "/proc/self/fd/" + std::to_string(image->copy.get());
+  }
+  image->handle = ::dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
+  if (image->handle == nullptr) throw bad_image(file, ::dlerror());
+  return image;
+}
+
+// ---- Checking
+
+const tee_ta_image &checked_header(const LoadedImage &image, const TEE_UUID &ta,
+                                   const fs::path &file) {
+  const auto *header =
+      static_cast<const tee_ta_image *>(::dlsym(image.handle, TEE_TA_IMAGE_SYMBOL));
+  if (header == nullptr) throw bad_image(file, "has no " TEE_TA_IMAGE_SYMBOL);
+  if (header->magic != TEE_TA_IMAGE_MAGIC || header->version != TEE_TA_IMAGE_VERSION) {
+    throw bad_image(file, "header of another kind or version");
+  }
+  if (uuid_bytes(header->uuid) != uuid_bytes(ta)) {
+    throw bad_image(file, "is the image of " + uuid_text(header->uuid));
+  }
+  const tee_ta_entry_points &entry = header->entry_points;
+  if (header->metadata == nullptr || header->metadata->trace_prefix == nullptr ||
+      entry.create == nullptr || entry.destroy == nullptr || entry.open_session == nullptr ||
+      entry.close_session == nullptr || entry.invoke_command == nullptr) {
+    throw bad_image(file, "incomplete header");
+  }
+  return *header;
+}
+
+const tee_property &property(const tee_ta_metadata &metadata, const char *name,
+                             tee_property_type type, const fs::path &file) {
+  for (const tee_property &known : std::span(
+           metadata.properties, metadata.properties != nullptr ? metadata.num_properties : 0)) {
+    if (std::strcmp(known.name, name) == 0 && known.type == type) return known;
+  }
+  throw bad_image(file, std::string("has no property ") + name);
+}
+
+void check_lifecycle(const tee_ta_metadata &metadata, const fs::path &file) {
+  const auto flag = [&](const char *name) {
+    return property(metadata, name, TEE_PROPERTY_BOOL, file).value.boolean;
+  };
+  if (!flag("gpd.ta.singleInstance") || !flag("gpd.ta.multiSession") ||
+      flag("gpd.ta.instanceKeepAlive")) {
+    throw Error{TEE_ERROR_NOT_SUPPORTED,
+                "TA image " + file.string() +
+                    ": only single instance, multi session, no keep-alive can run here"};
+  }
+}
+
+}  // namespace
+
+Program load_program(const TEE_UUID &ta) {
+  const std::lock_guard guard(g_lock);
+  const fs::path file = find_image(ta);
+  std::shared_ptr<LoadedImage> image = load(file);
+  const tee_ta_image &header = checked_header(*image, ta, file);
+  check_lifecycle(*header.metadata, file);
+  return {
+      .uuid = ta,
+      .data_size = property(*header.metadata, "gpd.ta.dataSize", TEE_PROPERTY_U32, file).value.u32,
+      .trace_prefix = header.metadata->trace_prefix,
+      .trace_level = header.metadata->trace_level,
+      .entry_points = header.entry_points,
+      .image = std::move(image),
+  };
+}
+
+void test::set_ta_directory(const std::string &directory) {
+  const std::lock_guard guard(g_lock);
+  g_test_directory = directory;
+}
+
+}  // namespace tee

@@ -1,0 +1,46 @@
+/// The object behind a TEE_ObjectHandle, transient or persistent.
+#ifndef TEE_OBJECT_H
+#define TEE_OBJECT_H
+
+#include <tee_internal_api.h>
+
+#include <cstdint>
+#include <memory>
+
+#include "rsa_key.h"
+
+namespace tee {
+struct OpenData;  // an open data stream of the object store
+}
+
+struct __TEE_ObjectHandle {
+  __TEE_ObjectHandle();
+  ~__TEE_ObjectHandle();  // overwrites attribute values
+
+  uint32_t type = TEE_TYPE_DATA;
+  uint32_t max_size = 0;  // bits
+  uint32_t size = 0;      // bits; 0 until populated or generated
+  uint32_t usage = 0xFFFFFFFF;
+  uint32_t handle_flags = 0;   // TEE_HANDLE_FLAG_*, and TEE_DATA_FLAG_* of a persistent object
+  tee::Attributes attributes;  // buffer attributes by ID
+  tee::SharedKey rsa;          // made of them once; NULL unless an RSA key is set
+  std::unique_ptr<tee::OpenData> persistent;  // NULL for a transient object
+};
+
+namespace tee {
+
+/// The object of a handle that the running instance has open; panics when it has not.
+__TEE_ObjectHandle &checked_object(TEE_ObjectHandle handle, const char *call);
+
+/// Gives the running instance a handle to `object`.
+TEE_ObjectHandle open_handle(std::unique_ptr<__TEE_ObjectHandle> object);
+
+/// Takes the handle back and destroys the object.
+void close_handle(TEE_ObjectHandle handle);
+
+/// Whether keys of `type` may have `size` bits.
+bool key_size_supported(uint32_t type, uint32_t size);
+
+}  // namespace tee
+
+#endif

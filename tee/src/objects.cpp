@@ -1,0 +1,266 @@
+#include <openssl/crypto.h>
+#include <openssl/rand.h>
+
+#include <algorithm>
+#include <iterator>
+
+#include "instance.h"
+#include "object.h"
+#include "persistent.h"
+
+__TEE_ObjectHandle::__TEE_ObjectHandle() = default;
+
+__TEE_ObjectHandle::~__TEE_ObjectHandle() {
+  tee::cleanse(attributes);
+}
+
+namespace tee {
+
+namespace {
+
+struct KeyType {
+  uint32_t type;
+  uint32_t min_size;  // bits
+  uint32_t max_size;
+  uint32_t step;
+};
+
+// The standard has HMAC keys start at 192 bits; the composite keys of JWE bring 128.
+const KeyType kKeyTypes[] = {
+    {TEE_TYPE_AES, 128, 256, 64},
+    {TEE_TYPE_HMAC_SHA256, 128, 1024, 8},
+    {TEE_TYPE_RSA_PUBLIC_KEY, kMinRsaSize, kMaxRsaSize, 8},
+    {TEE_TYPE_RSA_KEYPAIR, kMinRsaSize, kMaxRsaSize, 8},
+};
+
+const uint32_t kPublicAttributes[] = {TEE_ATTR_RSA_MODULUS, TEE_ATTR_RSA_PUBLIC_EXPONENT};
+const uint32_t kCrtAttributes[] = {TEE_ATTR_RSA_PRIME1, TEE_ATTR_RSA_PRIME2, TEE_ATTR_RSA_EXPONENT1,
+                                   TEE_ATTR_RSA_EXPONENT2, TEE_ATTR_RSA_COEFFICIENT};
+
+template <size_t N>
+bool is_one_of(uint32_t id, const uint32_t (&ids)[N]) {
+  return std::find(std::begin(ids), std::end(ids), id) != std::end(ids);
+}
+
+template <size_t N>
+size_t count_of(const Attributes &attributes, const uint32_t (&ids)[N]) {
+  return static_cast<size_t>(std::count_if(std::begin(ids), std::end(ids),
+                                           [&](uint32_t id) { return attributes.contains(id); }));
+}
+
+bool is_rsa(uint32_t type) {
+  return type == TEE_TYPE_RSA_PUBLIC_KEY || type == TEE_TYPE_RSA_KEYPAIR;
+}
+
+bool belongs_to(uint32_t id, uint32_t type) {
+  if (!is_rsa(type)) return id == TEE_ATTR_SECRET_VALUE;
+  if (is_one_of(id, kPublicAttributes)) return true;
+  return type == TEE_TYPE_RSA_KEYPAIR &&
+         (id == TEE_ATTR_RSA_PRIVATE_EXPONENT || is_one_of(id, kCrtAttributes));
+}
+
+bool is_complete(const Attributes &attributes, uint32_t type) {
+  if (!is_rsa(type)) return attributes.contains(TEE_ATTR_SECRET_VALUE);
+  const size_t num_crt = count_of(attributes, kCrtAttributes);
+  return count_of(attributes, kPublicAttributes) == std::size(kPublicAttributes) &&
+         (type == TEE_TYPE_RSA_PUBLIC_KEY || attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT)) &&
+         (num_crt == 0 || num_crt == std::size(kCrtAttributes));
+}
+
+// Copies the attributes into the object; what does not fit its type is a programmer's error.
+void take_attributes(__TEE_ObjectHandle &object, const TEE_Attribute *attrs, uint32_t attrCount,
+                     const char *call) {
+  for (uint32_t i = 0; i < attrCount; ++i) {
+    const uint32_t id = attrs[i].attributeID;
+    if (!belongs_to(id, object.type)) panic(call, "attribute of another object type");
+
+    const auto *bytes = static_cast<const uint8_t *>(attrs[i].content.ref.buffer);
+    const auto [entry, added] =
+        object.attributes.try_emplace(id, bytes, bytes + attrs[i].content.ref.length);
+    if (!added) panic(call, "attribute given twice");
+    const std::vector<uint8_t> &value = entry->second;
+    const uint64_t size = is_rsa(object.type) ? num_bits(value) : uint64_t{8} * value.size();
+    if (size > object.max_size) panic(call, "attribute too big for the object");
+  }
+  if (!is_complete(object.attributes, object.type)) panic(call, "mandatory attribute missing");
+}
+
+// Makes a usable key of the attributes; false when their values cannot be one.
+bool set_key(__TEE_ObjectHandle &object) {
+  if (is_rsa(object.type)) {
+    object.rsa = import_rsa_key(object.attributes);
+    if (object.rsa == nullptr) return false;
+    object.size = num_bits(object.attributes.at(TEE_ATTR_RSA_MODULUS));
+  } else {
+    const auto size = 8 * static_cast<uint32_t>(object.attributes.at(TEE_ATTR_SECRET_VALUE).size());
+    if (!key_size_supported(object.type, size)) return false;
+    object.size = size;
+  }
+  object.handle_flags |= TEE_HANDLE_FLAG_INITIALIZED;
+  return true;
+}
+
+__TEE_ObjectHandle &checked_blank_object(TEE_ObjectHandle handle, const char *call) {
+  __TEE_ObjectHandle &object = checked_object(handle, call);
+  if (object.persistent != nullptr) panic(call, "object is persistent");
+  if ((object.handle_flags & TEE_HANDLE_FLAG_INITIALIZED) != 0) {
+    panic(call, "object is initialized already");
+  }
+  return object;
+}
+
+std::vector<uint8_t> public_exponent_of(const TEE_Attribute *params, uint32_t paramCount,
+                                        const char *call) {
+  if (paramCount == 0) return {};
+  if (paramCount > 1 || params->attributeID != TEE_ATTR_RSA_PUBLIC_EXPONENT) {
+    panic(call, "parameter that this key type does not have");
+  }
+  const auto *bytes = static_cast<const uint8_t *>(params->content.ref.buffer);
+  return {bytes, bytes + params->content.ref.length};
+}
+
+TEE_Result generate_pair(__TEE_ObjectHandle &object, uint32_t size,
+                         const std::vector<uint8_t> &public_exponent) {
+  object.rsa = generate_rsa_key(size, public_exponent);
+  if (object.rsa == nullptr) return TEE_ERROR_BAD_PARAMETERS;
+  object.attributes = export_rsa_key(*object.rsa);
+  object.size = size;
+  object.handle_flags |= TEE_HANDLE_FLAG_INITIALIZED;
+  return TEE_SUCCESS;
+}
+
+TEE_Result generate_secret(__TEE_ObjectHandle &object, uint32_t size) {
+  std::vector<uint8_t> &secret = object.attributes[TEE_ATTR_SECRET_VALUE];
+  secret.resize(size / 8);
+  if (RAND_priv_bytes_ex(nullptr, secret.data(), secret.size(), 0) != 1) {
+    object.attributes.clear();
+    return TEE_ERROR_GENERIC;
+  }
+  return set_key(object) ? TEE_SUCCESS : TEE_ERROR_GENERIC;
+}
+
+}  // namespace
+
+__TEE_ObjectHandle &checked_object(TEE_ObjectHandle handle, const char *call) {
+  if (!open_handles(current_instance()).objects.contains(handle)) {
+    panic(call, "not an open object handle");
+  }
+  return *handle;
+}
+
+TEE_ObjectHandle open_handle(std::unique_ptr<__TEE_ObjectHandle> object) {
+  open_handles(current_instance()).objects.insert(object.get());
+  return object.release();
+}
+
+void close_handle(TEE_ObjectHandle handle) {
+  open_handles(current_instance()).objects.erase(handle);
+  delete handle;
+}
+
+bool key_size_supported(uint32_t type, uint32_t size) {
+  return std::any_of(std::begin(kKeyTypes), std::end(kKeyTypes), [&](const KeyType &key) {
+    return key.type == type && size >= key.min_size && size <= key.max_size && size % key.step == 0;
+  });
+}
+
+}  // namespace tee
+
+using namespace tee;
+
+TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo *objectInfo) {
+  const __TEE_ObjectHandle &known = checked_object(object, __func__);
+  const Fault kind = known.persistent != nullptr ? Fault::kStorage : Fault::kCrypto;
+  if (TEE_Result code; fault_due(kind, __func__, TEE_ERROR_CORRUPT_OBJECT, &code)) return code;
+
+  *objectInfo = {
+      .objectType = known.type,
+      .objectSize = known.size,
+      .maxObjectSize = known.max_size,
+      .objectUsage = known.usage,
+      .dataSize = known.persistent != nullptr ? known.persistent->data_size() : 0,
+      .dataPosition = known.persistent != nullptr ? known.persistent->position() : 0,
+      .handleFlags = known.handle_flags,
+  };
+  return TEE_SUCCESS;
+}
+
+TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attributeID, void *buffer,
+                                        TEE_LengthType *size) {
+  const __TEE_ObjectHandle &known = checked_object(object, __func__);
+  if ((known.handle_flags & TEE_HANDLE_FLAG_INITIALIZED) == 0) {
+    panic(__func__, "object is not initialized");
+  }
+  if ((attributeID & TEE_ATTR_FLAG_VALUE) != 0) panic(__func__, "not a buffer attribute");
+  if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_CORRUPT_OBJECT, &code)) {
+    return code;
+  }
+
+  const auto found = known.attributes.find(attributeID);
+  if (found == known.attributes.end()) return TEE_ERROR_ITEM_NOT_FOUND;
+  const std::vector<uint8_t> &value = found->second;
+  const bool fits = value.size() <= *size;
+  *size = static_cast<TEE_LengthType>(value.size());
+  if (!fits) return TEE_ERROR_SHORT_BUFFER;
+  std::copy(value.begin(), value.end(), static_cast<uint8_t *>(buffer));
+  return TEE_SUCCESS;
+}
+
+TEE_Result TEE_AllocateTransientObject(TEE_ObjectType objectType, uint32_t maxObjectSize,
+                                       TEE_ObjectHandle *object) {
+  *object = TEE_HANDLE_NULL;
+  if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_OUT_OF_MEMORY, &code)) {
+    return code;
+  }
+  if (!key_size_supported(objectType, maxObjectSize)) return TEE_ERROR_NOT_SUPPORTED;
+
+  auto blank = std::make_unique<__TEE_ObjectHandle>();
+  blank->type = objectType;
+  blank->max_size = maxObjectSize;
+  *object = open_handle(std::move(blank));
+  return TEE_SUCCESS;
+}
+
+void TEE_FreeTransientObject(TEE_ObjectHandle object) {
+  if (object == TEE_HANDLE_NULL) return;
+  if (checked_object(object, __func__).persistent != nullptr) {
+    panic(__func__, "object is persistent");
+  }
+  close_handle(object);
+}
+
+void TEE_InitRefAttribute(TEE_Attribute *attr, uint32_t attributeID, const void *buffer,
+                          TEE_LengthType length) {
+  if ((attributeID & TEE_ATTR_FLAG_VALUE) != 0) panic(__func__, "not a buffer attribute");
+  attr->attributeID = attributeID;
+  attr->content.ref.buffer = const_cast<void *>(buffer);
+  attr->content.ref.length = length;
+}
+
+TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attribute *attrs,
+                                       uint32_t attrCount) {
+  __TEE_ObjectHandle &blank = checked_blank_object(object, __func__);
+  if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_BAD_PARAMETERS, &code)) {
+    return code;
+  }
+  take_attributes(blank, attrs, attrCount, __func__);
+  if (set_key(blank)) return TEE_SUCCESS;
+  cleanse(blank.attributes);
+  blank.attributes.clear();
+  return TEE_ERROR_BAD_PARAMETERS;
+}
+
+TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_Attribute *params,
+                           uint32_t paramCount) {
+  __TEE_ObjectHandle &blank = checked_blank_object(object, __func__);
+  if (keySize > blank.max_size) panic(__func__, "key too big for the object");
+  if (blank.type == TEE_TYPE_RSA_PUBLIC_KEY) panic(__func__, "a public key is not generated");
+  if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_GENERIC, &code)) return code;
+  if (!key_size_supported(blank.type, keySize)) return TEE_ERROR_BAD_PARAMETERS;
+
+  if (blank.type == TEE_TYPE_RSA_KEYPAIR) {
+    return generate_pair(blank, keySize, public_exponent_of(params, paramCount, __func__));
+  }
+  if (paramCount != 0) panic(__func__, "parameter that this key type does not have");
+  return generate_secret(blank, keySize);
+}

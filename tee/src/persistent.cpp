@@ -1,0 +1,256 @@
+#include "persistent.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "error.h"
+#include "host_device.h"
+#include "object.h"
+#include "ta_instance.h"
+
+namespace tee {
+
+namespace {
+
+constexpr uint32_t kAccessFlags =
+    TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE | TEE_DATA_FLAG_ACCESS_WRITE_META;
+constexpr uint32_t kShareFlags = TEE_DATA_FLAG_SHARE_READ | TEE_DATA_FLAG_SHARE_WRITE;
+
+// What every storage can hold as one value.
+constexpr size_t kMaxObjectLen = 0x20000000;
+
+}  // namespace
+
+OpenData::OpenData(HostDevice &of_device, std::shared_ptr<OpenObject> opened, uint32_t handle_flags)
+    : device(of_device), object(std::move(opened)), flags(handle_flags) {
+  object->handles.push_back(flags);
+}
+
+OpenData::~OpenData() {
+  const std::lock_guard guard(device.lock);
+  object->handles.erase(std::ranges::find(object->handles, flags));
+  if (unsaved) --object->num_unsaved;
+  object.reset();
+}
+
+void OpenData::mark_unsaved() {
+  if (unsaved) return;
+  unsaved = true;
+  ++object->num_unsaved;
+}
+
+void OpenData::save() {
+  if (!unsaved) return;
+  if (object->num_unsaved == 1) {
+    device.storage->save(object->key, object->data);
+    object->stored = true;
+  }
+  --object->num_unsaved;
+  unsaved = false;
+}
+
+namespace {
+
+ObjectKey checked_key(const void *id, uint32_t id_len, const char *call) {
+  if (id_len > TEE_OBJECT_ID_MAX_LEN) panic(call, "object ID longer than 64 bytes");
+  if (id == nullptr && id_len != 0) panic(call, "object ID is NULL");
+  return {current_instance().uuid, std::string(static_cast<const char *>(id), id_len)};
+}
+
+void check_flags(uint32_t flags, uint32_t allowed, const char *call) {
+  if ((flags & ~allowed) != 0) panic(call, "flags that this call does not have");
+}
+
+OpenData &checked_data(TEE_ObjectHandle handle, uint32_t right, const char *call) {
+  const __TEE_ObjectHandle &object = checked_object(handle, call);
+  if (!object.persistent) panic(call, "object is not persistent");
+  if ((object.persistent->flags & right) == 0) panic(call, "handle lacks the access right");
+  return *object.persistent;
+}
+
+// Among several handles, a right that one of them has must be shared by all (section 5.7).
+bool may_join(const std::vector<uint32_t> &handles, uint32_t flags) {
+  if (handles.empty()) return true;
+  uint32_t used = flags;
+  uint32_t shared = flags;
+  for (const uint32_t other : handles) {
+    used |= other;
+    shared &= other;
+  }
+  const bool reads = (used & TEE_DATA_FLAG_ACCESS_READ) != 0;
+  const bool writes = (used & TEE_DATA_FLAG_ACCESS_WRITE) != 0;
+  return (used & TEE_DATA_FLAG_ACCESS_WRITE_META) == 0 &&
+         (!reads || (shared & TEE_DATA_FLAG_SHARE_READ) != 0) &&
+         (!writes || (shared & TEE_DATA_FLAG_SHARE_WRITE) != 0);
+}
+
+std::shared_ptr<OpenObject> find_open(HostDevice &device, const ObjectKey &key) {
+  const auto open = device.open_objects.find(key);
+  return open != device.open_objects.end() ? open->second.lock() : nullptr;
+}
+
+std::shared_ptr<OpenObject> add_open(HostDevice &device, const ObjectKey &key) {
+  auto object = std::make_shared<OpenObject>(device.open_objects, key);
+  device.open_objects[key] = object;
+  return object;
+}
+
+// NULL when there is no such object.
+std::shared_ptr<OpenObject> find_or_load(HostDevice &device, const ObjectKey &key) {
+  if (auto open = find_open(device, key)) return open;
+  std::optional<Bytes> data = device.storage->load(key);
+  if (!data) return nullptr;
+  auto object = add_open(device, key);
+  object->data = std::move(*data);
+  object->stored = true;
+  return object;
+}
+
+TEE_ObjectHandle hand_out(std::unique_ptr<OpenData> data) {
+  auto object = std::make_unique<__TEE_ObjectHandle>();
+  object->handle_flags = data->flags | TEE_HANDLE_FLAG_PERSISTENT | TEE_HANDLE_FLAG_INITIALIZED;
+  object->persistent = std::move(data);
+  return open_handle(std::move(object));
+}
+
+TEE_Result open_object(const ObjectKey &key, uint32_t flags, TEE_ObjectHandle *handle) {
+  HostDevice &device = current_instance().device;
+  const std::lock_guard guard(device.lock);
+  std::shared_ptr<OpenObject> object = find_or_load(device, key);
+  if (!object) return TEE_ERROR_ITEM_NOT_FOUND;
+  if (!may_join(object->handles, flags)) return TEE_ERROR_ACCESS_CONFLICT;
+  *handle = hand_out(std::make_unique<OpenData>(device, std::move(object), flags));
+  return TEE_SUCCESS;
+}
+
+TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
+                         TEE_ObjectHandle *handle) {
+  HostDevice &device = current_instance().device;
+  const std::lock_guard guard(device.lock);
+  if (find_open(device, key)) return TEE_ERROR_ACCESS_CONFLICT;
+  const bool stored = device.storage->load(key).has_value();
+  if (stored && (flags & TEE_DATA_FLAG_OVERWRITE) == 0) return TEE_ERROR_ACCESS_CONFLICT;
+  if (data.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
+  device.storage->expect_room(data.size());
+
+  std::shared_ptr<OpenObject> object = add_open(device, key);
+  object->data.assign(data.begin(), data.end());
+  object->stored = stored;
+  auto opened =
+      std::make_unique<OpenData>(device, std::move(object), flags & (kAccessFlags | kShareFlags));
+  opened->mark_unsaved();
+  *handle = hand_out(std::move(opened));
+  return TEE_SUCCESS;
+}
+
+TEE_Result write_data(OpenData &data, ByteView bytes) {
+  const std::lock_guard guard(data.device.lock);
+  if (data.at + bytes.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
+  Bytes &stream = data.object->data;
+  const size_t new_len = std::max(stream.size(), data.at + bytes.size());
+  data.device.storage->expect_room(new_len);
+  stream.resize(new_len);
+  std::ranges::copy(bytes, stream.begin() + data.at);
+  data.at += static_cast<uint32_t>(bytes.size());
+  data.mark_unsaved();
+  return TEE_SUCCESS;
+}
+
+TEE_Result delete_object(OpenData &data) {
+  const std::lock_guard guard(data.device.lock);
+  if (data.object->stored) data.device.storage->remove(data.object->key);
+  return TEE_SUCCESS;
+}
+
+bool storage_fault_due(const char *call, TEE_Result *code) {
+  return fault_due(Fault::kStorage, call, TEE_ERROR_STORAGE_NOT_AVAILABLE, code);
+}
+
+}  // namespace
+
+}  // namespace tee
+
+using namespace tee;
+
+TEE_Result TEE_OpenPersistentObject(uint32_t storageID, const void *objectID,
+                                    TEE_LengthType objectIDLen, uint32_t flags,
+                                    TEE_ObjectHandle *object) {
+  *object = TEE_HANDLE_NULL;
+  const ObjectKey key = checked_key(objectID, objectIDLen, __func__);
+  check_flags(flags, kAccessFlags | kShareFlags, __func__);
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+  if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
+  return result_of([&] { return open_object(key, flags, object); });
+}
+
+// Objects with attributes are not kept here: no trusted application of ours stores keys that way.
+TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
+                                      TEE_LengthType objectIDLen, uint32_t flags,
+                                      TEE_ObjectHandle attributes, const void *initialData,
+                                      TEE_LengthType initialDataLen, TEE_ObjectHandle *object) {
+  *object = TEE_HANDLE_NULL;
+  const ObjectKey key = checked_key(objectID, objectIDLen, __func__);
+  check_flags(flags, kAccessFlags | kShareFlags | TEE_DATA_FLAG_OVERWRITE, __func__);
+  if (initialData == nullptr && initialDataLen != 0) panic(__func__, "initial data is NULL");
+  if (attributes != TEE_HANDLE_NULL) checked_object(attributes, __func__);
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+  if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
+  if (attributes != TEE_HANDLE_NULL) return TEE_ERROR_NOT_SUPPORTED;
+  const ByteView data(static_cast<const uint8_t *>(initialData), initialDataLen);
+  return result_of([&] { return create_object(key, flags, data, object); });
+}
+
+void TEE_CloseObject(TEE_ObjectHandle object) {
+  if (object == TEE_HANDLE_NULL) return;
+  OpenData *data = checked_object(object, __func__).persistent.get();
+  if (data != nullptr) {
+    const std::lock_guard guard(data->device.lock);
+    const TEE_Result result = result_of([&] {
+      data->save();
+      return TEE_SUCCESS;
+    });
+    if (result != TEE_SUCCESS) panic(__func__, last_error());
+  }
+  close_handle(object);
+}
+
+// The handle is closed whatever the result.
+TEE_Result TEE_CloseAndDeletePersistentObject1(TEE_ObjectHandle object) {
+  if (object == TEE_HANDLE_NULL) return TEE_SUCCESS;
+  OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_WRITE_META, __func__);
+  TEE_Result result;
+  if (!storage_fault_due(__func__, &result)) {
+    result = result_of([&] { return delete_object(data); });
+  }
+  close_handle(object);
+  return result;
+}
+
+TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void *buffer, TEE_LengthType size,
+                              TEE_LengthType *count) {
+  OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_READ, __func__);
+  if (buffer == nullptr && size != 0) panic(__func__, "buffer is NULL");
+  *count = 0;
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+
+  const std::lock_guard guard(data.device.lock);
+  const Bytes &stream = data.object->data;
+  const uint32_t left = data.at < stream.size() ? data.data_size() - data.at : 0;
+  uint32_t len = std::min(size, left);
+  if (TEE_Result ignored; fault_due(Fault::kShortRead, __func__, TEE_SUCCESS, &ignored)) len /= 2;
+  if (len != 0) std::memcpy(buffer, stream.data() + data.at, len);
+  data.at += len;
+  *count = len;
+  return TEE_SUCCESS;
+}
+
+TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_LengthType size) {
+  OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_WRITE, __func__);
+  if (buffer == nullptr && size != 0) panic(__func__, "buffer is NULL");
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+  if (size == 0) return TEE_SUCCESS;
+  const ByteView bytes(static_cast<const uint8_t *>(buffer), size);
+  const TEE_Result result = result_of([&] { return write_data(data, bytes); });
+  // The standard has no other code for a stream that cannot grow.
+  return result == TEE_ERROR_OUT_OF_MEMORY ? TEE_ERROR_STORAGE_NO_SPACE : result;
+}

@@ -1,0 +1,156 @@
+#include "rsa_key.h"
+
+#include <openssl/core_names.h>
+#include <openssl/crypto.h>
+#include <openssl/params.h>
+#include <openssl/rsa.h>
+#include <tee_internal_api.h>
+
+#include <algorithm>
+#include <bit>
+
+#include "instance.h"
+
+namespace tee {
+
+namespace {
+
+struct RsaAttribute {
+  uint32_t id;
+  const char *param;
+};
+
+const RsaAttribute kRsaAttributes[] = {
+    {TEE_ATTR_RSA_MODULUS, OSSL_PKEY_PARAM_RSA_N},
+    {TEE_ATTR_RSA_PUBLIC_EXPONENT, OSSL_PKEY_PARAM_RSA_E},
+    {TEE_ATTR_RSA_PRIVATE_EXPONENT, OSSL_PKEY_PARAM_RSA_D},
+    {TEE_ATTR_RSA_PRIME1, OSSL_PKEY_PARAM_RSA_FACTOR1},
+    {TEE_ATTR_RSA_PRIME2, OSSL_PKEY_PARAM_RSA_FACTOR2},
+    {TEE_ATTR_RSA_EXPONENT1, OSSL_PKEY_PARAM_RSA_EXPONENT1},
+    {TEE_ATTR_RSA_EXPONENT2, OSSL_PKEY_PARAM_RSA_EXPONENT2},
+    {TEE_ATTR_RSA_COEFFICIENT, OSSL_PKEY_PARAM_RSA_COEFFICIENT1},
+};
+
+KeyContext rsa_context() {
+  return KeyContext(EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr));
+}
+
+SharedKey share(EVP_PKEY *key) {
+  return SharedKey(key, EVP_PKEY_free);
+}
+
+Number to_number(const std::vector<uint8_t> &value) {
+  return Number(BN_bin2bn(value.data(), static_cast<int>(value.size()), nullptr));
+}
+
+bool is_odd(const std::vector<uint8_t> &number) {
+  return (number.back() & 1) != 0;
+}
+
+bool is_product(const std::vector<uint8_t> &n, const std::vector<uint8_t> &p,
+                const std::vector<uint8_t> &q) {
+  const std::unique_ptr<BN_CTX, FreedBy<BN_CTX_free>> scratch(BN_CTX_secure_new());
+  const Number product(BN_new());
+  return scratch && product &&
+         BN_mul(product.get(), to_number(p).get(), to_number(q).get(), scratch.get()) == 1 &&
+         BN_cmp(product.get(), to_number(n).get()) == 0;
+}
+
+bool is_exponent(const std::vector<uint8_t> &e, uint32_t modulus_size) {
+  const uint32_t max_bits = modulus_size > OPENSSL_RSA_SMALL_MODULUS_BITS
+                                ? OPENSSL_RSA_MAX_PUBEXP_BITS
+                                : modulus_size - 1;
+  return num_bits(e) >= 2 && num_bits(e) <= max_bits && is_odd(e);
+}
+
+// Whatever would make OpenSSL refuse to work with the key later. A wrong private exponent or CRT
+// component that passes gives wrong results, as it would on any device.
+bool is_plausible(const Attributes &attributes) {
+  const auto zero = [](const auto &attribute) { return num_bits(attribute.second) == 0; };
+  if (std::any_of(attributes.begin(), attributes.end(), zero)) return false;
+
+  const auto &n = attributes.at(TEE_ATTR_RSA_MODULUS);
+  const uint32_t size = num_bits(n);
+  if (size < kMinRsaSize || size > kMaxRsaSize || !is_odd(n)) return false;
+  if (!is_exponent(attributes.at(TEE_ATTR_RSA_PUBLIC_EXPONENT), size)) return false;
+
+  const auto p = attributes.find(TEE_ATTR_RSA_PRIME1);
+  return p == attributes.end() || is_product(n, p->second, attributes.at(TEE_ATTR_RSA_PRIME2));
+}
+
+}  // namespace
+
+void cleanse(Attributes &attributes) {
+  for (auto &[id, value] : attributes) OPENSSL_cleanse(value.data(), value.size());
+}
+
+uint32_t num_bits(const std::vector<uint8_t> &number) {
+  const auto first = std::find_if(number.begin(), number.end(), [](uint8_t b) { return b != 0; });
+  if (first == number.end()) return 0;
+  const auto rest = static_cast<uint32_t>(number.end() - first - 1);
+  return 8 * rest + static_cast<uint32_t>(std::bit_width(*first));
+}
+
+SharedKey import_rsa_key(const Attributes &attributes) {
+  static_assert(std::endian::native == std::endian::little);
+  const QuietErrors quiet;
+  if (!is_plausible(attributes)) return nullptr;
+
+  // OpenSSL takes numbers in the byte order of the machine.
+  size_t total = 0;
+  for (const auto &[id, value] : attributes) total += value.size();
+  std::vector<uint8_t> numbers(total);
+  uint8_t *at = numbers.data();
+  std::vector<OSSL_PARAM> params;
+  for (const RsaAttribute &known : kRsaAttributes) {
+    const auto found = attributes.find(known.id);
+    if (found == attributes.end()) continue;
+    std::reverse_copy(found->second.begin(), found->second.end(), at);
+    params.push_back(OSSL_PARAM_construct_BN(known.param, at, found->second.size()));
+    at += found->second.size();
+  }
+  params.push_back(OSSL_PARAM_construct_end());
+
+  const bool pair = attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT);
+  const KeyContext context = rsa_context();
+  EVP_PKEY *key = nullptr;
+  const bool made =
+      context && EVP_PKEY_fromdata_init(context.get()) == 1 &&
+      EVP_PKEY_fromdata(context.get(), &key, pair ? EVP_PKEY_KEYPAIR : EVP_PKEY_PUBLIC_KEY,
+                        params.data()) == 1;
+  OPENSSL_cleanse(numbers.data(), numbers.size());
+  return made ? share(key) : nullptr;
+}
+
+SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent) {
+  const QuietErrors quiet;
+  const KeyContext context = rsa_context();
+  if (!context || EVP_PKEY_keygen_init(context.get()) != 1 ||
+      EVP_PKEY_CTX_set_rsa_keygen_bits(context.get(), static_cast<int>(size)) != 1) {
+    return nullptr;
+  }
+  if (!public_exponent.empty()) {
+    if (!is_exponent(public_exponent, size)) return nullptr;
+    const Number e = to_number(public_exponent);
+    if (!e || EVP_PKEY_CTX_set1_rsa_keygen_pubexp(context.get(), e.get()) != 1) return nullptr;
+  }
+  EVP_PKEY *key = nullptr;
+  return EVP_PKEY_generate(context.get(), &key) == 1 ? share(key) : nullptr;
+}
+
+Attributes export_rsa_key(const EVP_PKEY &key) {
+  Attributes attributes;
+  for (const RsaAttribute &known : kRsaAttributes) {
+    BIGNUM *value = nullptr;
+    if (EVP_PKEY_get_bn_param(&key, known.param, &value) != 1) {
+      panic("OpenSSL", "a generated key lacks a component");
+    }
+    const Number number(value);
+    std::vector<uint8_t> bytes(static_cast<size_t>(BN_num_bytes(value)));
+    BN_bn2bin(value, bytes.data());
+    attributes.emplace(known.id, std::move(bytes));
+  }
+  return attributes;
+}
+
+}  // namespace tee

@@ -1,0 +1,38 @@
+/// RSA keys between the attributes of an object and OpenSSL.
+#ifndef TEE_RSA_KEY_H
+#define TEE_RSA_KEY_H
+
+#include <cstdint>
+#include <map>
+#include <vector>
+
+#include "evp.h"
+
+namespace tee {
+
+/// Limits of a modulus, in bits.
+constexpr uint32_t kMinRsaSize = 512;
+constexpr uint32_t kMaxRsaSize = 4096;
+
+/// Attribute values by ID: unsigned big-endian numbers.
+using Attributes = std::map<uint32_t, std::vector<uint8_t>>;
+
+/// Overwrites the values.
+void cleanse(Attributes &attributes);
+
+/// Bits of an unsigned big-endian number, leading zeros left out.
+uint32_t num_bits(const std::vector<uint8_t> &number);
+
+/// The key that the attributes describe: modulus and public exponent, a private exponent, and
+/// five CRT components or none. NULL when it cannot be an RSA key, as far as cheap checks tell.
+SharedKey import_rsa_key(const Attributes &attributes);
+
+/// A new key pair; an empty exponent stands for 65537. NULL when OpenSSL refuses.
+SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent);
+
+/// All eight attributes of a generated key, without leading zeros.
+Attributes export_rsa_key(const EVP_PKEY &key);
+
+}  // namespace tee
+
+#endif

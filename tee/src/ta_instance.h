@@ -1,0 +1,86 @@
+/// A running trusted application: its program, and everything that it holds.
+#ifndef TEE_TA_INSTANCE_H
+#define TEE_TA_INSTANCE_H
+
+#include <tee_inspect.h>
+#include <tee_ta_image.h>
+
+#include <memory>
+#include <string>
+#include <unordered_map>
+
+#include "heap.h"
+#include "instance.h"
+#include "uuid.h"
+
+namespace tee {
+class HostDevice;
+}
+
+/// A session with a trusted application, of a client of either world.
+struct __TEE_TASessionHandle {
+  tee::Instance *instance;  // outlives the session
+  TEE_Identity client;
+  void *context;  // the trusted application's own
+};
+
+namespace tee {
+
+using Session = __TEE_TASessionHandle;
+
+/// What an instance runs, from an image or, in tests, from functions.
+struct Program {
+  TEE_UUID uuid;
+  uint32_t data_size;
+  std::string trace_prefix;
+  uint32_t trace_level;
+  tee_ta_entry_points entry_points;
+  std::shared_ptr<void> image;  // keeps the loaded code; NULL for functions
+};
+
+class Instance {
+ public:
+  Instance(HostDevice &on_device, Program runs);
+  ~Instance();  // gives back what the trusted application left open
+  Instance(const Instance &) = delete;
+  Instance &operator=(const Instance &) = delete;
+
+  /// True when sessions that it has open lead to `other`, directly or through their instances.
+  bool reaches(const Instance &other) const;
+  tee_heap_stats stats() const;
+
+  HostDevice &device;
+  const Program program;
+  const UuidBytes uuid;
+  Heap heap;
+  OpenHandles handles;
+  std::unordered_map<TEE_TASessionHandle, std::unique_ptr<Session>> sessions;
+  uint32_t num_clients = 0;  // sessions that others have with it
+  bool entered = false;      // an entry point of it is on some stack
+};
+
+/// Makes the calling thread run as `instance` while it lives; `client` is who called, NULL where
+/// there is no client.
+class Running {
+ public:
+  explicit Running(Instance &instance, const TEE_Identity *client = nullptr);
+  ~Running();
+  Running(const Running &) = delete;
+  Running &operator=(const Running &) = delete;
+
+  /// The innermost one of this thread, or NULL.
+  static const Running *now();
+
+  Instance &instance() const { return instance_; }
+  const TEE_Identity *client() const { return client_; }
+
+ private:
+  Instance &instance_;
+  const TEE_Identity *client_;
+  const bool was_entered_;
+  const Running *const outer_;
+};
+
+}  // namespace tee
+
+#endif

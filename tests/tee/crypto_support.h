@@ -1,0 +1,114 @@
+/// Keys and operations for tests that call the Internal Core API, and published RSA keys.
+#ifndef CRYPTO_SUPPORT_H
+#define CRYPTO_SUPPORT_H
+
+#include <openssl/evp.h>
+#include <tee_internal_api.h>
+#include <tee_test.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <type_traits>
+#include <utility>
+#include <vector>
+
+using Bytes = std::vector<uint8_t>;
+
+inline Bytes from_hex(const std::string &hex) {
+  Bytes bytes;
+  for (size_t i = 0; i + 1 < hex.size(); i += 2) {
+    bytes.push_back(static_cast<uint8_t>(std::stoul(hex.substr(i, 2), nullptr, 16)));
+  }
+  return bytes;
+}
+
+inline Bytes from_base64url(std::string text) {
+  std::replace(text.begin(), text.end(), '-', '+');
+  std::replace(text.begin(), text.end(), '_', '/');
+  const size_t padding = (4 - text.size() % 4) % 4;
+  text.append(padding, '=');
+  Bytes bytes(text.size() / 4 * 3);
+  EVP_DecodeBlock(bytes.data(), reinterpret_cast<const uint8_t *>(text.data()),
+                  static_cast<int>(text.size()));
+  bytes.resize(bytes.size() - padding);
+  return bytes;
+}
+
+inline uint32_t size_of(const Bytes &bytes) {
+  return static_cast<uint32_t>(bytes.size());
+}
+
+struct HandleCloser {
+  void operator()(TEE_ObjectHandle object) const { TEE_FreeTransientObject(object); }
+  void operator()(TEE_OperationHandle operation) const { TEE_FreeOperation(operation); }
+};
+using Key = std::unique_ptr<std::remove_pointer_t<TEE_ObjectHandle>, HandleCloser>;
+using Operation = std::unique_ptr<std::remove_pointer_t<TEE_OperationHandle>, HandleCloser>;
+
+using AttributeList = std::vector<std::pair<uint32_t, Bytes>>;
+
+inline TEE_Result populate(TEE_ObjectHandle object, const AttributeList &attributes) {
+  std::vector<TEE_Attribute> refs(attributes.size());
+  for (size_t i = 0; i < refs.size(); ++i) {
+    const auto &[id, value] = attributes[i];
+    TEE_InitRefAttribute(&refs[i], id, value.data(), size_of(value));
+  }
+  return TEE_PopulateTransientObject(object, refs.data(), static_cast<uint32_t>(refs.size()));
+}
+
+inline Key blank_key(uint32_t type, uint32_t max_size) {
+  TEE_ObjectHandle object = TEE_HANDLE_NULL;
+  TEE_AllocateTransientObject(type, max_size, &object);
+  return Key(object);
+}
+
+/// NULL when the attributes are refused.
+inline Key make_key(uint32_t type, uint32_t max_size, const AttributeList &attributes) {
+  Key key = blank_key(type, max_size);
+  if (key == nullptr || populate(key.get(), attributes) != TEE_SUCCESS) return nullptr;
+  return key;
+}
+
+inline Key secret_key(uint32_t type, const Bytes &secret) {
+  return make_key(type, 8 * size_of(secret), {{TEE_ATTR_SECRET_VALUE, secret}});
+}
+
+inline Operation make_operation(uint32_t algorithm, uint32_t mode, uint32_t max_key_size = 0,
+                                const Key &key = nullptr) {
+  TEE_OperationHandle operation = TEE_HANDLE_NULL;
+  TEE_AllocateOperation(&operation, algorithm, mode, max_key_size);
+  if (key != nullptr) TEE_SetOperationKey(operation, key.get());
+  return Operation(operation);
+}
+
+/// The key of RFC 7515, appendix A.2, without its CRT components.
+inline AttributeList rfc7515_public() {
+  return {
+      {TEE_ATTR_RSA_MODULUS,
+       from_base64url("ofgWCuLjybRlzo0tZWJjNiuSfb4p4fAkd_wWJcyQoTbji9k0l8W26mPddxHmfHQp-Vaw-"
+                      "4qPCJrcS2mJPMEzP1Pt0"
+                      "Bm4d4QlL-yRT-SFd2lZS-pCgNMsD1W_YpRPEwOWvG6b32690r2jZ47soMZo9wGzjb_7OMg0LOL-"
+                      "bSf63kpaSHSXndS"
+                      "5z5rexMdbBYUsLA9e-KXBdQOS-"
+                      "UTo7WTBEMa2R2CapHg665xsmtdVMTBQY4uDZlxvb3qCo5ZwKh9kG4LT6_I5IhlJH"
+                      "7aGhyxXFvUK-DWNmoudF8NAco9_h9iaGNj8q2ethFkMLs91kzk2PAcDTW9gb54h4FRWyuXpoQ")},
+      {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}}};
+}
+
+inline AttributeList rfc7515_private() {
+  AttributeList key = rfc7515_public();
+  key.emplace_back(
+      TEE_ATTR_RSA_PRIVATE_EXPONENT,
+      from_base64url("Eq5xpGnNCivDflJsRQBXHx1hdR1k6Ulwe2JZD50LpXyWPEAeP88vLNO97IjlA7_"
+                     "GQ5sLKMgvfTeXZx9SE-7YwVol2"
+                     "NXOoAJe46sui395IW_GO-pWJ1O0BkTGoVEn2bKVRUCgu-"
+                     "GjBVaYLU6f3l9kJfFNS3E0QbVdxzubSu3Mkqzjkn439X0"
+                     "M_V51gfpRLI9JYanrC4D4qAdGcopV_"
+                     "0ZHHzQlBjudU2QvXt4ehNYTCBr6XCLQUShb1juUO1ZdiYoFaFQT5Tw8bGUl_"
+                     "x_jTj3ccPDVZFD9pIuhLhBOneufuBiB4cS98l2SR_RQyGWSeWjnczT0QU91p1DhOVRuOopznQ"));
+  return key;
+}
+
+#endif
