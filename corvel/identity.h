@@ -1,0 +1,55 @@
+/// What makes this device this device. It lies in one persistent object, which is created whole:
+/// a device that loses power at its first use has either no identity yet, or all of it.
+///
+/// Object "IDENTITY": the device ID, kDeviceIdLen characters, then the TEE key in the form in
+/// which it is handed out (see corvel.h), in order of the types.
+#ifndef IDENTITY_H
+#define IDENTITY_H
+
+#include <tee_internal_api.h>
+
+constexpr uint32_t kDeviceIdLen = 32;
+constexpr uint32_t kEndorsementIdLen = 64;
+
+/// Bytes from TEE_Malloc that nobody may find in freed memory.
+class secret_buffer {
+ public:
+  secret_buffer() = default;
+  ~secret_buffer();
+  secret_buffer(const secret_buffer &) = delete;
+  secret_buffer &operator=(const secret_buffer &) = delete;
+
+  [[nodiscard]] bool allocate(uint32_t len);  // once
+  uint8_t *data() { return data_; }
+
+ private:
+  uint8_t *data_ = nullptr;
+  uint32_t len_ = 0;
+};
+
+struct byte_view {
+  const uint8_t *data;
+  uint32_t len;
+};
+
+/// The views look into `stored`.
+struct identity {
+  secret_buffer stored;
+  byte_view device_id;
+  byte_view key_box;
+  byte_view modulus;
+  byte_view public_exponent;
+};
+
+/// Reads the identity into the fresh `*device`; makes and stores it first if there is none.
+///
+/// Returns TEE_ERROR_CORRUPT_OBJECT for an object of another form, which is left alone: those who
+/// know this device know it by what was there. Other failures are the platform's.
+[[nodiscard]] TEE_Result get_identity(identity *device);
+
+/// An ID for the key that `label` names: the SHA-256 digest of device ID and label in
+/// hexadecimal digits, with a final NUL.
+[[nodiscard]] TEE_Result get_endorsement_id(const identity &device, byte_view label,
+                                            char id[kEndorsementIdLen + 1]);
+
+#endif
