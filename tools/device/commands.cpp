@@ -1,0 +1,171 @@
+#include "device/commands.h"
+
+#include <cstdio>
+#include <iostream>
+#include <nlohmann/json.hpp>
+#include <optional>
+
+#include "common/encoding.h"
+#include "common/files.h"
+#include "device/device_client.h"
+#include "device/inspect.h"
+#include "device/object_id.h"
+#include "device/raw_session.h"
+
+namespace device {
+namespace {
+
+void print(std::string_view text) {
+  tools::write_file("-", text);
+}
+
+void print_note(std::string_view text) {
+  tools::print_error_line(kProgram, text);
+}
+
+/// Prints the agent's heap figures, if wanted, before the instance that they belong to is gone:
+/// declare it after the session.
+class StatsAtEnd {
+ public:
+  StatsAtEnd(const Arguments &arguments, Device &device)
+      : wanted_(arguments.stats), device_(device) {}
+  StatsAtEnd(const StatsAtEnd &) = delete;
+  StatsAtEnd &operator=(const StatsAtEnd &) = delete;
+  ~StatsAtEnd() {
+    try {
+      if (wanted_) print_figures();
+    } catch (const std::exception &failure) {
+      print_note(failure.what());
+    }
+  }
+
+ private:
+  void print_figures() {
+    const std::vector<Figure> figures = inspection()->heap_figures(device_);
+    if (figures.empty()) print_note("no figures: the agent is not running");
+    for (const Figure &figure : figures) {
+      fprintf(stderr, "stats: %s %u\n", figure.name, figure.value);
+    }
+  }
+
+  bool wanted_;
+  Device &device_;
+};
+
+/// A device with a session to the agent.
+struct OpenAgent {
+  explicit OpenAgent(const Arguments &arguments)
+      : device(arguments.state_directory), session(device, kAgentUuid), stats(arguments, device) {}
+
+  Device device;
+  Session session;
+  StatsAtEnd stats;
+};
+
+const Message &message_of(const Arguments &arguments) {
+  const Message *message = find_message(arguments.message);
+  if (message != nullptr) return *message;
+  std::string names;
+  for (const Message &known : messages()) names += std::string(" ") + known.name;
+  throw tools::UsageError("unknown message \"" + arguments.message + "\": expected one of" + names);
+}
+
+uint32_t capacity_of(const Arguments &arguments) {
+  if (arguments.capacity.empty()) return kDefaultCapacity;
+  return parse_number("--capacity", arguments.capacity);
+}
+
+void write_image(const Arguments &arguments, const Answer &answer) {
+  if (arguments.image_file.empty()) return;
+  if (answer.image) {
+    tools::write_file(arguments.image_file, *answer.image);
+  } else {
+    print_note("the answer holds no TA image, " + arguments.image_file + " is not written");
+  }
+}
+
+}  // namespace
+
+void print_info(const Arguments &arguments) {
+  Device device(arguments.state_directory);
+  const StatsAtEnd stats(arguments, device);
+  const Info info = read_info(device);
+  const nlohmann::ordered_json document = {
+      {"device_id", info.device_id},
+      {"tee_public_key", tools::base64url_encode(info.tee_public_key)}};
+  print(document.dump() + "\n");
+}
+
+void send_request(const Arguments &arguments) {
+  const Message &message = message_of(arguments);
+  const uint32_t capacity = capacity_of(arguments);
+  const std::string request = tools::read_file(arguments.request_file);
+
+  OpenAgent agent(arguments);
+  const Answer answer = send(agent.session, message, request, capacity);
+  if (!answer.response.empty()) tools::write_file(arguments.response_file, answer.response);
+  write_image(arguments, answer);
+  require_success(message, answer);
+}
+
+void query_ta(const Arguments &arguments) {
+  OpenAgent agent(arguments);
+  const QueryAnswer answer = query(agent.session, arguments.taid);
+  print(answer.text + "\n");
+  if (answer.result != TEEC_SUCCESS) throw Error("query", answer.result, answer.origin);
+}
+
+void print_device_id(const Arguments &arguments) {
+  OpenAgent agent(arguments);
+  print(device_id(agent.session) + "\n");
+}
+
+void list_objects(const Arguments &arguments) {
+  Device device(arguments.state_directory);
+  std::string lines;
+  for (const StoredObject &object : inspection()->list_objects(device)) {
+    lines += show_object_id(object.id) + "\t" + std::to_string(object.size) + "\n";
+  }
+  print(lines);
+}
+
+void get_object(const Arguments &arguments) {
+  const std::string id = parse_object_id(arguments.object_id);
+  Device device(arguments.state_directory);
+  print(inspection()->get_object(device, id));
+}
+
+void put_object(const Arguments &arguments) {
+  const std::string id = parse_object_id(arguments.object_id);
+  const std::string data = tools::read_file(arguments.object_file);
+  Device device(arguments.state_directory);
+  inspection()->put_object(device, id, data);
+}
+
+void remove_object(const Arguments &arguments) {
+  const std::string id = parse_object_id(arguments.object_id);
+  Device device(arguments.state_directory);
+  inspection()->remove_object(device, id);
+}
+
+void invoke_once(const Arguments &arguments) {
+  Invocation invocation = {.command_id = parse_number("COMMAND_ID", arguments.command_id),
+                           .input = arguments.input_file,
+                           .output = arguments.output_file,
+                           .capacity = capacity_of(arguments)};
+  if (!arguments.types.empty()) invocation.types = parse_types(arguments.types);
+
+  OpenAgent agent(arguments);
+  const Reply reply = run_invocation(agent.session, invocation);
+  print(reply_line(reply.result, reply.size));
+  if (reply.result != TEEC_SUCCESS) throw Error("invoke", reply.result, reply.origin);
+}
+
+void obey_session(const Arguments &arguments) {
+  Device device(arguments.state_directory);
+  std::optional<Session> agent;
+  const StatsAtEnd stats(arguments, device);
+  run_session(device, std::cin, agent);
+}
+
+}  // namespace device

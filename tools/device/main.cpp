@@ -1,0 +1,205 @@
+/// otrp-device: drives a device from the normal world.
+#include <CLI/CLI.hpp>
+#include <exception>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "common/error_line.h"
+#include "device/commands.h"
+#include "device/device_client.h"
+#include "device/inspect.h"
+
+namespace {
+
+using device::Arguments;
+using device::kProgram;
+
+/// A positional word, which is required, or an option, whose name begins with a hyphen.
+struct Parameter {
+  const char *name;
+  const char *type;
+  std::string Arguments::*value;
+  std::string help;
+};
+
+struct Command {
+  const char *name;
+  void (*run)(const Arguments &);
+  const char *help;
+  std::vector<Parameter> parameters;
+  std::string notes;
+  std::string example;  // what follows the state directory
+};
+
+std::string message_names() {
+  std::string names;
+  for (const device::Message &message : device::messages()) {
+    names += (names.empty() ? "" : ", ") + std::string(message.name);
+  }
+  return names;
+}
+
+const Parameter kCapacity = {"--capacity", "BYTES", &Arguments::capacity,
+                             "Size of the output buffer (default: 4 MiB; 0: no buffer)"};
+const Parameter kObjectId = {"ID", "", &Arguments::object_id, "ID of the object"};
+
+const Command kCommands[] = {
+    {"info",
+     device::print_info,
+     "Print what a TSM operator needs to know of the device, as JSON",
+     {},
+     "",
+     "info > device.json"},
+    {"send",
+     device::send_request,
+     "Send a signed request and print the response",
+     {{"MESSAGE", "", &Arguments::message, "One of: " + message_names()},
+      {"REQUEST", "", &Arguments::request_file, "File with the request"},
+      {"-o", "FILE", &Arguments::response_file, "File for the response"},
+      {"--image-out", "FILE", &Arguments::image_file, "File for the TA image in the answer"},
+      kCapacity},
+     "The response may say \"fail\": that is for the TSM to read, and a success here. When only "
+     "the\n"
+     "TA image does not fit, the device has done what was asked, and the response is printed.\n",
+     "send install-ta request.json -o response.json --image-out ta.bin"},
+    {"query",
+     device::query_ta,
+     "Ask whether a TA is recorded on the device",
+     {{"TAID", "", &Arguments::taid, "ID of the TA"}},
+     "Prints the answer; exit 1 when the TA is not recorded.\n",
+     "query 00112233445566778899aabbccddeeff"},
+    {"device-id", device::print_device_id, "Print the device ID", {}, "", "device-id"},
+    {"invoke",
+     device::invoke_once,
+     "Invoke one command of the agent as it is",
+     {{"COMMAND_ID", "", &Arguments::command_id, "Number of the command"},
+      {"INPUT", "", &Arguments::input_file, "File with the input; -: no input buffer"},
+      {"OUTPUT", "", &Arguments::output_file, "File for the output buffer"},
+      kCapacity,
+      {"--types", "WORD", &Arguments::types,
+       "Parameter types, lowest nibble first: 0 none, 5 input, 6 output, 7 both (default: 0x65)"}},
+     "OUTPUT receives the whole output buffer, which is full of 0xA5 before the call, whatever "
+     "the\n"
+     "result. Prints \"0xRESULT SIZE\": the result, and the size as the agent left it.\n",
+     "invoke 2 - id.bin --capacity 64"},
+    {"session",
+     device::obey_session,
+     "Invoke many commands in one session, read from standard input",
+     {},
+     "Lines, whose fields are separated by blanks or tabs:\n"
+     "  invoke COMMAND_ID INPUT OUTPUT CAPACITY [TYPES]   see invoke; answered by 0xRESULT SIZE\n"
+     "  reopen                     a new session and instance; answered by 0xRESULT 0\n"
+     "Empty lines are passed over. A line that cannot be obeyed ends the program with exit 2, a\n"
+     "session that cannot be opened with exit 1.\n",
+     "session < lines.txt"},
+};
+
+const Command kObjectCommands[] = {
+    {"list", device::list_objects, "Print ID<TAB>SIZE lines in ID order", {}, "", "objects list"},
+    {"get",
+     device::get_object,
+     "Print the raw data stream of an object",
+     {kObjectId},
+     "",
+     "objects get SD_LIST_ID | xxd"},
+    {"put",
+     device::put_object,
+     "Create or replace an object",
+     {kObjectId, {"FILE", "", &Arguments::object_file, "File with the raw data stream"}},
+     "",
+     "objects put SD_LIST_ID list.bin"},
+    {"rm",
+     device::remove_object,
+     "Remove an object",
+     {kObjectId},
+     "After -- an ID may begin with a hyphen.\n",
+     "objects rm -- -odd-id"},
+};
+
+std::string footer(const std::string &notes, const std::string &example) {
+  return notes + "Example:\n  otrp-device --state ./device " + example + "\n";
+}
+
+void add_parameter(CLI::App *command, const Parameter &parameter, Arguments &arguments) {
+  CLI::Option *option =
+      command->add_option(parameter.name, arguments.*parameter.value, parameter.help);
+  option->type_name(parameter.type);
+  if (*parameter.name != '-') option->required();
+}
+
+/// `chosen` becomes the command that the command line names.
+void add_commands(CLI::App *app, std::span<const Command> commands, Arguments &arguments,
+                  const Command *&chosen) {
+  for (const Command &row : commands) {
+    CLI::App *command = app->add_subcommand(row.name, row.help);
+    command->footer(footer(row.notes, row.example));
+    for (const Parameter &parameter : row.parameters) add_parameter(command, parameter, arguments);
+    command->final_callback([&chosen, &row] { chosen = &row; });
+  }
+  app->require_subcommand(1);
+}
+
+/// What only a TEE for developers lets one see.
+void add_inspection(CLI::App *app, Arguments &arguments, const Command *&chosen) {
+  app->add_flag("--stats", arguments.stats, "Print the agent's heap figures to standard error");
+  CLI::App *objects = app->add_subcommand("objects", "Look at the agent's stored objects");
+  objects->footer(footer("IDs show bytes outside printable ASCII, and the backslash, as \\xNN.\n",
+                         "objects list"));
+  add_commands(objects, kObjectCommands, arguments, chosen);
+}
+
+/// A word that has no place says more than what is missing because of it.
+std::string usage_text(const CLI::App &app, const CLI::ParseError &error) {
+  const std::vector<std::string> unknown = app.remaining(true);
+  return (unknown.empty() ? error.what() : "\"" + unknown.front() + "\" is not expected here") +
+         std::string(" (see --help)");
+}
+
+void run(int argc, char **argv) {
+  Arguments arguments;
+  const Command *chosen = nullptr;
+  CLI::App app("Drives an OTrP device from the normal world", kProgram);
+  app.footer(
+      footer("Standard output carries only the result; \"-\" names standard input or output.\n"
+             "Exit: 0 success, 1 the device answered with a failure, 2 wrong usage.\n",
+             "info > device.json"));
+  app.add_option("--state", arguments.state_directory, "State directory of the device")
+      ->required()
+      ->type_name("DIR");
+  add_commands(&app, kCommands, arguments, chosen);
+  if (device::inspection() != nullptr) add_inspection(&app, arguments, chosen);
+
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::Success &help) {
+    app.exit(help);
+    return;
+  } catch (const CLI::ParseError &error) {
+    throw tools::UsageError(usage_text(app, error));
+  }
+  chosen->run(arguments);
+}
+
+int report_failure() {
+  try {
+    throw;
+  } catch (const tools::UsageError &error) {
+    tools::print_error_line(kProgram, error.what());
+    return tools::kExitUsage;
+  } catch (const std::exception &error) {
+    tools::print_error_line(kProgram, error.what());
+    return tools::kExitRefused;
+  }
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+  try {
+    run(argc, argv);
+  } catch (...) {
+    return report_failure();
+  }
+  return 0;
+}

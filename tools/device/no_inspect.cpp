@@ -1,0 +1,9 @@
+#include "device/inspect.h"
+
+namespace device {
+
+const Inspection *inspection() {
+  return nullptr;
+}
+
+}  // namespace device

@@ -1,0 +1,288 @@
+#include "tsm/cli.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <functional>
+#include <string>
+
+#include "common/error_line.h"
+#include "tsm/commands.h"
+#include "tsm/response.h"
+
+namespace tsm {
+namespace {
+
+constexpr char kProgram[] = "otrp-tsm";
+constexpr size_t kMaxNameLen = 56;  // with its prefix it is a storage object ID of 64 bytes
+constexpr size_t kTaidLen = 32;     // what the device's register of images takes
+
+std::string check_name(const std::string &name) {
+  const bool has_control = std::ranges::any_of(
+      name, [](char c) { return static_cast<unsigned char>(c) < ' ' || c == '\x7F'; });
+  if (!name.empty() && name.size() <= kMaxNameLen && !has_control) return "";
+  return "expected 1 to " + std::to_string(kMaxNameLen) + " bytes without control characters";
+}
+
+/// The device takes some values from a JSON text as they stand there.
+std::string check_plain(const std::string &value) {
+  const bool is_plain = !value.empty() && std::ranges::all_of(value, [](char c) {
+    return c >= ' ' && c <= '~' && c != '"' && c != '\\';
+  });
+  return is_plain ? "" : "expected printable ASCII characters, no \" or \\";
+}
+
+/// A TA of another ID would be kept by the device, which then could not register its image.
+std::string check_taid(const std::string &taid) {
+  return taid.size() == kTaidLen ? "" : "expected 32 characters, such as a UUID without its dashes";
+}
+
+using CheckFunction = std::string (*)(const std::string &);
+
+CLI::Validator validator(CheckFunction check) {
+  return CLI::Validator([check](std::string &value) { return check(value); }, "");
+}
+
+/// What an operator gives with a message.
+enum MessageOption : unsigned {
+  kSd = 1u << 0,
+  kSp = 1u << 1,
+  kSpCert = 1u << 2,
+  kDid = 1u << 3,
+  kRenewAik = 1u << 4,
+  kTa = 1u << 5,
+  kImage = 1u << 6,  // with its version
+  kDeleteTa = 1u << 7,
+};
+
+struct MessageHelp {
+  MessageId id;
+  unsigned options;
+  const char *description;
+  const char *example;
+};
+
+constexpr MessageHelp kMessageHelps[] = {
+    {MessageId::kGetDeviceState, 0,
+     "Ask for the device state, and make this TSM known to the device", ""},
+    {MessageId::kCreateSd, kSd | kSp | kSpCert | kDid,
+     "Create a security domain for a service provider", "--sd wallet --sp bank --sp-cert bank.pem"},
+    {MessageId::kUpdateSd, kSd | kSp | kSpCert | kRenewAik,
+     "Renew the AIK and certificate of a security domain's service provider",
+     "--sd wallet --sp bank --renew-aik --sp-cert bank.pem"},
+    {MessageId::kDeleteSd, kSd | kDeleteTa,
+     "Delete a security domain, and its SP's records with the SP's last one",
+     "--sd wallet --delete-ta true"},
+    {MessageId::kInstallTa, kSd | kSp | kTa | kImage, "Install a trusted application",
+     "--sd wallet --sp bank --ta 8d82573a926d4754935332dc29997f74 --ta-version 1.0 "
+     "--image app.img"},
+    {MessageId::kUpdateTa, kSd | kSp | kTa | kImage,
+     "Replace the image and version of a trusted application",
+     "--sd wallet --sp bank --ta 8d82573a926d4754935332dc29997f74 --ta-version 1.1 "
+     "--image app.img"},
+    {MessageId::kDeleteTa, kSd | kTa, "Delete a trusted application",
+     "--sd wallet --ta 8d82573a926d4754935332dc29997f74"},
+    {MessageId::kGetTaInfo, kSp | kTa, "Ask what is recorded about a trusted application",
+     "--sp bank --ta 8d82573a926d4754935332dc29997f74"},
+};
+
+CLI::Option *require_name(CLI::App *command, const char *names, std::string *value,
+                          const char *help) {
+  return command->add_option(names, *value, help)->required()->check(validator(check_name));
+}
+
+void add_message_options(CLI::App *command, const MessageHelp &help, Arguments *arguments) {
+  RequestOptions &request = arguments->request;
+  const bool is_raw = help.id == MessageId::kGetTaInfo;
+  if (help.options & kSd) require_name(command, "--sd", &request.sdname, "Security domain");
+  if (help.options & kSp) {
+    CLI::Option *sp = require_name(command, "--sp", &request.spid, "Service provider's ID");
+    if (is_raw) sp->check(validator(check_plain));
+  }
+  if (help.options & kTa) {
+    CLI::Option *ta = require_name(command, "--ta,--taid", &request.taid, "TA's ID");
+    if (is_raw) ta->check(validator(check_plain));
+    if (help.id == MessageId::kInstallTa) ta->check(validator(check_taid));
+  }
+  if (help.options & kSpCert) {
+    command->add_option("--sp-cert", arguments->spcert,
+                        "SP's certificate: a file, or the text itself");
+  }
+  if (help.options & kDid) {
+    command->add_option("--did", request.did, "Device ID to claim (default: the device's)");
+  }
+  if (help.options & kRenewAik) {
+    command->add_flag("--renew-aik", request.renew_aik, "Make a new AIK; needs --sp-cert");
+  }
+  if (help.options & kImage) {
+    require_name(command, "--ta-version,--version", &request.ta_version, "TA's version");
+    command->add_option("--image", arguments->image_file, "TA image made by `image pack`")
+        ->required();
+  }
+  if (help.options & kDeleteTa) {
+    command
+        ->add_option("--delete-ta", request.deleteta,
+                     "true: delete the records of its TAs too; false: keep them")
+        ->required()
+        ->check(CLI::IsMember({"true", "false"}));
+  }
+  if (is_raw) return;
+  command->add_option("--rid", request.rid, "Request ID (default: random)")
+      ->check(validator(check_plain));
+  command->add_option("--tid", request.tid, "Transaction ID (default: random)")
+      ->check(validator(check_plain));
+}
+
+using RunFunction = int (*)(const Arguments &);
+
+CLI::App *add_command(CLI::App *parent, const std::string &name, const std::string &description,
+                      const std::string &example) {
+  CLI::App *command = parent->add_subcommand(name, description);
+  command->fallthrough();
+  command->footer("Example: " + std::string(kProgram) + " " + example);
+  return command;
+}
+
+void add_messages(CLI::App *parent, const std::string &example_start, Arguments *arguments) {
+  parent->require_subcommand(1);
+  for (const MessageHelp &help : kMessageHelps) {
+    const std::string name(message_of(help.id).command);
+    std::string example = example_start + " " + name;
+    if (*help.example != '\0') example += " " + std::string(help.example);
+    CLI::App *message = add_command(parent, name, help.description, example);
+    add_message_options(message, help, arguments);
+    message->callback([arguments, id = help.id] { arguments->message = id; });
+  }
+}
+
+void add_device_option(CLI::App *command, Arguments *arguments) {
+  command->add_option("--device", arguments->device_file,
+                      "Device file: what `otrp-device info` prints");
+}
+
+void add_dsi_option(CLI::App *command, Arguments *arguments) {
+  command->add_option("--dsi", arguments->dsi_file,
+                      "Device state document (default: the one kept in the home)");
+}
+
+void add_json_flag(CLI::App *command, Arguments *arguments) {
+  command->add_flag("--json", arguments->json, "Print JSON");
+}
+
+void add_commands(CLI::App *app, Arguments *arguments, RunFunction *run) {
+  const auto runs = [run](CLI::App *command, RunFunction function) {
+    command->final_callback([run, function] { *run = function; });
+  };
+
+  CLI::App *init = add_command(app, "init", "Make this TSM: its key, admitted by the CA-TSM",
+                               "init --tsmid tsm1");
+  init->add_option("--tsmid", arguments->tsmid, "This TSM's ID (default: a random one)");
+  init->add_option("--ca", arguments->ca_file,
+                   "PEM file of the CA-TSM's private key (default: the development key)");
+  runs(init, run_init);
+
+  CLI::App *request = add_command(app, "request", "Write a signed request",
+                                  "request get-device-state --device device.json > request.json");
+  add_device_option(request, arguments);
+  request->get_option("--device")->required();
+  add_dsi_option(request, arguments);
+  request->add_option("-o,--output", arguments->output_file, "Where to write it (default: -)");
+  add_messages(request, "request --device device.json", arguments);
+  runs(request, run_request);
+
+  CLI::App *response =
+      add_command(app, "response", "Verify, decrypt and show a response, and keep the device state",
+                  "response response.json --device device.json --dsi-out dsi.json");
+  response->add_option("RESPONSE", arguments->response_file, "The device's response")->required();
+  add_device_option(response, arguments);
+  response->get_option("--device")->required();
+  add_dsi_option(response, arguments);
+  response->add_option("--dsi-out", arguments->dsi_out_file,
+                       "Write the device state document here");
+  add_json_flag(response, arguments);
+  runs(response, run_response);
+
+  CLI::App *image = add_command(app, "image", "Pack and show TA images", "image show app.img");
+  image->require_subcommand(1);
+  CLI::App *pack = add_command(image, "pack", "Put a TA image header before any file",
+                               "image pack app.ta -o app.img");
+  pack->add_option("FILE", arguments->input_file, "The file to wrap")->required();
+  pack->add_option("-o,--output", arguments->output_file, "The image")->required();
+  runs(pack, run_image_pack);
+  CLI::App *show_image =
+      add_command(image, "show", "Show the header of a TA image", "image show app.img");
+  show_image->add_option("IMAGE", arguments->input_file, "The image")->required();
+  add_json_flag(show_image, arguments);
+  runs(show_image, run_image_show);
+
+  CLI::App *manage = add_command(
+      app, "manage", "Request, send and read the response, with a device on this machine",
+      "manage --state ./device get-device-state");
+  manage->add_option("--state", arguments->state_dir, "The device's state directory")->required();
+  manage->add_option("--dsi-out", arguments->dsi_out_file, "Write the device state document here");
+  manage->add_option("--image-out", arguments->image_out_file,
+                     "Write the TA image that the device hands back here");
+  add_json_flag(manage, arguments);
+  add_messages(manage, "manage --state ./device", arguments);
+  runs(manage, run_manage);
+
+  CLI::App *show = add_command(app, "show", "Show the last known state of devices as a tree",
+                               "show --device device.json");
+  add_device_option(show, arguments);
+  show->add_option("--dsi", arguments->dsi_file, "Show this device state document");
+  add_json_flag(show, arguments);
+  runs(show, run_show);
+}
+
+/// The commands that the deepest command on the line can be followed by.
+std::string expected_commands(const CLI::App *app) {
+  while (!app->get_subcommands().empty()) app = app->get_subcommands().front();
+  std::string names;
+  for (const CLI::App *command : app->get_subcommands([](const CLI::App *) { return true; })) {
+    names += (names.empty() ? "" : ", ") + command->get_name();
+  }
+  return names;
+}
+
+std::string explain(const CLI::ParseError &error, const CLI::App &app) {
+  const std::string commands = expected_commands(&app);
+  const bool lacks_command = !commands.empty() && error.get_name() == "RequiredError";
+  return lacks_command ? "expected a command: " + commands
+                       : std::string(error.what()) + " (--help tells more)";
+}
+
+int parse_and_run(std::span<char *> words) {
+  CLI::App app("A Trusted Service Manager: makes requests for OTrP devices, reads their responses.",
+               kProgram);
+  app.require_subcommand(1);
+  app.footer(
+      "Example: otrp-tsm init && otrp-tsm manage --state ./device get-device-state\n\n"
+      "Exit codes: 0 done, 1 the device refused, 2 wrong input, 3 a response that does not "
+      "verify.");
+  Arguments arguments;
+  app.add_option("--home", arguments.home, "This TSM's home directory")->capture_default_str();
+  RunFunction run = nullptr;
+  add_commands(&app, &arguments, &run);
+  try {
+    app.parse(static_cast<int>(words.size()), words.data());
+  } catch (const CLI::ParseError &error) {
+    if (error.get_exit_code() == 0) return app.exit(error);  // help
+    throw tools::UsageError(explain(error, app));
+  }
+  return run(arguments);
+}
+
+}  // namespace
+
+int run_command_line(std::span<char *> words) {
+  try {
+    return parse_and_run(words);
+  } catch (const NotVerified &error) {
+    tools::print_error_line(kProgram, error.what());
+    return kExitNotVerified;
+  } catch (const std::exception &error) {
+    tools::print_error_line(kProgram, error.what());
+    return tools::kExitUsage;
+  }
+}
+
+}  // namespace tsm

@@ -1,0 +1,45 @@
+/// What each command of otrp-tsm does. Functions return an exit code, and throw tools::UsageError
+/// for wrong input and NotVerified for a response that is not to be believed.
+#ifndef TSM_COMMANDS_H
+#define TSM_COMMANDS_H
+
+#include <string>
+
+#include "tsm/messages.h"
+#include "tsm/request.h"
+
+namespace tsm {
+
+constexpr int kExitNotVerified = 3;
+
+/// The command line, read. Files are named by path, "-" for a standard stream.
+struct Arguments {
+  std::string home = "./tsm";
+  std::string tsmid;
+  std::string ca_file;
+  std::string device_file;
+  std::string dsi_file;
+  std::string dsi_out_file;
+  std::string response_file;
+  std::string input_file;
+  std::string output_file = "-";
+  std::string image_file;
+  std::string image_out_file;
+  std::string spcert;  // a file, or the certificate itself
+  std::string state_dir;
+  bool json = false;
+  MessageId message = MessageId::kGetDeviceState;
+  RequestOptions request;
+};
+
+int run_init(const Arguments &arguments);
+int run_request(const Arguments &arguments);
+int run_response(const Arguments &arguments);
+int run_image_pack(const Arguments &arguments);
+int run_image_show(const Arguments &arguments);
+int run_manage(const Arguments &arguments);
+int run_show(const Arguments &arguments);
+
+}  // namespace tsm
+
+#endif

@@ -1,0 +1,36 @@
+/// The device state information: {"dsi": {"tfwdata", "tee": {..., "sdlist", "teeaiklist"}}}.
+///
+/// Functions that read a document take any JSON and pass over what is not as it should be.
+#ifndef TSM_DSI_H
+#define TSM_DSI_H
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "tsm/crypto.h"
+#include "tsm/json.h"
+
+namespace tsm {
+
+/// The "dsihash" of a document's text as the device made it.
+std::string dsi_hash_of_text(std::string_view document_text);
+
+/// The same of a parsed document, however the text it came from was laid out.
+std::string dsi_hash(const Json &document);
+
+/// Whether the document has its two lists.
+bool is_dsi_document(const Json &document);
+
+/// The AIK of a service provider; nothing when the device lists none, or no RSA key.
+std::optional<RsaKey> find_aik(const Json &document, std::string_view spid);
+
+/// The document as a tree of lines: SPs, their AIK fingerprints, security domains, TAs.
+std::string dsi_tree(const Json &document);
+
+/// `text` fit for a terminal: control characters shown as `\xNN`.
+std::string printable(std::string_view text);
+
+}  // namespace tsm
+
+#endif

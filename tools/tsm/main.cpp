@@ -1,0 +1,5 @@
+#include "tsm/cli.h"
+
+int main(int argc, char **argv) {
+  return tsm::run_command_line({argv, static_cast<size_t>(argc)});
+}

@@ -1,0 +1,25 @@
+/// Verified responses and device states as an operator reads them: a few lines, or JSON.
+#ifndef TSM_REPORT_H
+#define TSM_REPORT_H
+
+#include <string>
+#include <string_view>
+
+#include "tsm/json.h"
+#include "tsm/parties.h"
+#include "tsm/response.h"
+
+namespace tsm {
+
+/// Lines for a response that is not a refusal.
+std::string report_lines(const Response &response);
+
+Json report_json(const Response &response);
+
+/// One device: a heading, and its state as a tree. `dsi` is NULL when the state is not known.
+std::string device_lines(const DeviceInfo *device, const Json *dsi);
+Json device_json(const DeviceInfo &device, const Json *dsi);
+
+}  // namespace tsm
+
+#endif
