@@ -29,7 +29,8 @@ function(otrp_generate_ca_tsm_key pem header)
   string(REGEX MATCHALL ".." bytes "${modulus}")
   list(TRANSFORM bytes PREPEND "0x")
   list(JOIN bytes ", " bytes)
-  string(REGEX REPLACE "(([^,]+, )(([^,]+, )?)(([^,]+, )?)(([^,]+, )?)(([^,]+, )?)(([^,]+, )?)(([^,]+, )?)(([^,]+, )?))" "\\1\n    " bytes "${bytes}")
+  string(REPEAT "0x[0-9A-F][0-9A-F], " 8 row)
+  string(REGEX REPLACE "(${row})" "\\1\n    " bytes "${bytes}")
   file(CONFIGURE OUTPUT ${header} CONTENT [[
 /// Generated from OTRP_CA_TSM_KEY: the root from which TSM keys are admitted.
 #ifndef CA_TSM_KEY_H

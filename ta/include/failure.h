@@ -15,10 +15,10 @@
 #define CHECK(cond, code, ...) CHECK_AS(__func__, cond, code, __VA_ARGS__)
 
 /// Returns the code of a call that failed; the callee has said why.
-#define TRY(call)                                \
-  do {                                           \
-    const TEE_Result r_ = (call);                \
-    if (r_ != TEE_SUCCESS) return r_;            \
+#define TRY(call)                     \
+  do {                                \
+    const TEE_Result r_ = (call);     \
+    if (r_ != TEE_SUCCESS) return r_; \
   } while (0)
 
 /// The same, and adds a line of our own: `text` ends in a conversion for the code.
@@ -32,15 +32,15 @@
     return (code);                            \
   } while (0)
 
-#define CHECK_AS(name, cond, code, ...)              \
-  do {                                               \
-    if (!(cond)) FAIL_AS(name, code, __VA_ARGS__);   \
+#define CHECK_AS(name, cond, code, ...)            \
+  do {                                             \
+    if (!(cond)) FAIL_AS(name, code, __VA_ARGS__); \
   } while (0)
 
-#define TRY_LOG_AS(name, call, text)                      \
-  do {                                                    \
-    const TEE_Result r_ = (call);                         \
-    if (r_ != TEE_SUCCESS) FAIL_AS(name, r_, text, r_);   \
+#define TRY_LOG_AS(name, call, text)                    \
+  do {                                                  \
+    const TEE_Result r_ = (call);                       \
+    if (r_ != TEE_SUCCESS) FAIL_AS(name, r_, text, r_); \
   } while (0)
 
 #endif

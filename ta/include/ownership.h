@@ -15,6 +15,11 @@ inline void wipe(void *bytes, uint32_t len) {
   __asm__ __volatile__("" : : "r"(bytes) : "memory");
 }
 
+/// Zero-filled bytes, or NULL.
+inline uint8_t *allocate_bytes(uint32_t len) {
+  return static_cast<uint8_t *>(TEE_Malloc(len, TEE_MALLOC_FILL_ZERO));
+}
+
 template <auto Free>
 struct freed_by {
   template <class T>
@@ -70,8 +75,8 @@ using key_object = owned<TEE_ObjectHandle, TEE_FreeTransientObject>;
 using stored_object = owned<TEE_ObjectHandle, TEE_CloseObject>;
 using operation = owned<TEE_OperationHandle, TEE_FreeOperation>;
 
-/// Lets a plain out-parameter fill an owner: f(out(owner)). The owner's old content is freed
-/// when the call returns.
+/// Lets a plain out-parameter fill an owner: f(out(owner)). The owner has it, and its old content
+/// is freed, only when the whole expression is done: whoever reads the owner needs a new statement.
 template <class T, class Deleter>
 class out {
  public:

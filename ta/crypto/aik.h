@@ -1,0 +1,25 @@
+/// The attestation identity key (AIK) of a service provider: an RSA key pair made in the TEE and
+/// kept as a key box, in base64, in the "aik" member of the SP's record.
+#ifndef AIK_H
+#define AIK_H
+
+#include <stdint.h>
+#include <tee_internal_api.h>
+
+#include "crypto/tlv_box.h"
+
+/// A box, not serialized yet, with a new 2048-bit key pair.
+[[nodiscard]] TEE_Result generate_aik(tlv_box **box);
+
+/// The SP's key box. OTRP_MISSING without a spid or when the record holds no key,
+/// OTRP_SP_NOT_FOUND without a readable record, OTRP_NO_MEMORY when the key is no box.
+[[nodiscard]] TEE_Result get_aik_tlv_box_by_spid(const char *spid, tlv_box **box);
+
+/// The SP's AIK as a new key-pair object; codes as above.
+[[nodiscard]] TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key);
+
+/// The SP's encoded AIK public key in a new buffer; codes as above.
+[[nodiscard]] TEE_Result read_public_aik(const char *spid, uint8_t **encoded,
+                                         uint32_t *encoded_len);
+
+#endif

@@ -1,0 +1,221 @@
+#include "crypto/base64.h"
+
+#include "failure.h"
+#include "ownership.h"
+
+// Characters are classified by comparing, sixteen at a time, and never looked up: what is encoded
+// and decoded here may be a private key, and a table would show its bytes to whoever shares the
+// cache.
+
+namespace {
+
+using characters = int8_t __attribute__((vector_size(16)));
+using quartets = uint32_t __attribute__((vector_size(16)));  // the same bytes, four by four
+
+constexpr uint32_t kNumCharacters = sizeof(characters);
+constexpr uint32_t kNumQuartets = kNumCharacters / 4;
+constexpr uint32_t kBlockLen = kNumQuartets * 3;  // bytes behind sixteen characters
+
+struct alphabet {
+  int8_t value_62;
+  int8_t value_63;
+  char padding;  // 0: none
+  int8_t distance_62 = 62 - value_62;
+  int8_t distance_63 = 63 - value_63;
+};
+constexpr alphabet kStandard = {'+', '/', '='};
+constexpr alphabet kUrl = {'-', '_', 0};
+
+// Distance from a character to its value, in each range that is the same in all alphabets.
+constexpr int8_t kUpper = 0 - 'A';
+constexpr int8_t kLower = 26 - 'a';
+constexpr int8_t kDigit = 52 - '0';
+
+// Place of the n-th character of a quartet in its number, as memory has it.
+constexpr uint32_t shift_of(uint32_t n) {
+  return __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__ ? 8 * n : 24 - 8 * n;
+}
+
+}  // namespace
+
+// ---- Encoding
+
+static uint32_t load_big_endian(const uint8_t *bytes) {
+  return uint32_t{bytes[0]} << 24 | uint32_t{bytes[1]} << 16 | uint32_t{bytes[2]} << 8 | bytes[3];
+}
+
+// Reads one byte more than it encodes.
+template <const alphabet &To>
+static void encode_block(const uint8_t *bytes, char *text) {
+  const quartets bits = {load_big_endian(bytes), load_big_endian(bytes + 3),
+                         load_big_endian(bytes + 6), load_big_endian(bytes + 9)};
+  const quartets split = ((bits >> 26) & 63) << shift_of(0) | ((bits >> 20) & 63) << shift_of(1) |
+                         ((bits >> 14) & 63) << shift_of(2) | ((bits >> 8) & 63) << shift_of(3);
+  characters values;
+  memcpy(&values, &split, sizeof values);
+
+  // Each range adds what its distance differs by from that of the one before.
+  constexpr int8_t kStepLower = kUpper - kLower;
+  constexpr int8_t kStepDigit = kLower - kDigit;
+  constexpr int8_t kStep62 = kDigit - To.distance_62;
+  constexpr int8_t kStep63 = To.distance_62 - To.distance_63;
+  values += ((values > 25) & kStepLower) + ((values > 51) & kStepDigit) +
+            ((values > 61) & kStep62) + ((values > 62) & kStep63) - kUpper;
+  memcpy(text, &values, sizeof values);
+}
+
+static uint32_t num_characters_for(uint32_t num_bytes) {
+  return (num_bytes * 8 + 5) / 6;
+}
+
+template <const alphabet &To>
+static char *encode(const uint8_t *data, uint32_t len) {
+  const uint64_t padded_len = (uint64_t{len} + 2) / 3 * 4;
+  if (data == nullptr || padded_len >= UINT32_MAX) return nullptr;
+  auto *text = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(padded_len) + 1));
+  if (text == nullptr) return nullptr;
+
+  char *at = text;
+  for (; len > kBlockLen; len -= kBlockLen, data += kBlockLen, at += kNumCharacters) {
+    encode_block<To>(data, at);
+  }
+  uint8_t last[kBlockLen + 1] = {};
+  char last_text[kNumCharacters];
+  if (len != 0) memcpy(last, data, len);
+  encode_block<To>(last, last_text);
+  memcpy(at, last_text, num_characters_for(len));
+  at += num_characters_for(len);
+  wipe(last, sizeof last);
+  wipe(last_text, sizeof last_text);
+  for (const char *end = text + padded_len; at != end;) *at++ = To.padding;
+  return text;
+}
+
+char *base64EncodeAddEndZero(const uint8_t *data, uint32_t len) {
+  return encode<kStandard>(data, len);
+}
+
+char *base64urlEncodeAddEndZero(const uint8_t *data, uint32_t len) {
+  char *text = encode<kUrl>(data, len);
+  CHECK(text != nullptr, nullptr, "bad parameter");
+  return text;
+}
+
+// ---- Decoding
+
+namespace {
+
+// What is left of a text in the standard alphabet, in `Also`, or in a mixture of both.
+template <const alphabet &Also>
+struct decoder {
+  const char *at;
+  const char *end;
+  uint8_t *to;
+
+  void take_blocks();
+  void take_quartet();
+};
+
+}  // namespace
+
+// What leads from each character to its value; 0 from one that has none.
+template <const alphabet &Also>
+static inline characters distances_of(characters text) {
+  return ((text >= 'A') & (text <= 'Z') & kUpper) | ((text >= 'a') & (text <= 'z') & kLower) |
+         ((text >= '0') & (text <= '9') & kDigit) |
+         ((text == kStandard.value_62) & kStandard.distance_62) |
+         ((text == kStandard.value_63) & kStandard.distance_63) |
+         ((text == Also.value_62) & Also.distance_62) |
+         ((text == Also.value_63) & Also.distance_63);
+}
+
+static bool any_nonzero(characters flags) {
+  uint64_t halves[2];
+  memcpy(halves, &flags, sizeof halves);
+  return (halves[0] | halves[1]) != 0;
+}
+
+// The high bytes, three or four of them. Four are quicker, where what follows is yet to be written.
+template <size_t Num>
+static inline void store_big_endian(uint32_t bits, uint8_t *to) {
+  if (__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__) bits = __builtin_bswap32(bits);
+  memcpy(to, &bits, Num);
+}
+
+// The usual case: stops before the first block that has something to skip in it.
+template <const alphabet &Also>
+void decoder<Also>::take_blocks() {
+  for (; end - at >= kNumCharacters; at += kNumCharacters, to += kBlockLen) {
+    characters text;
+    memcpy(&text, at, sizeof text);
+    const characters distances = distances_of<Also>(text);
+    if (any_nonzero(distances == 0)) return;
+    const characters values = text + distances;
+    quartets split;
+    memcpy(&split, &values, sizeof split);
+    const quartets bits = ((split >> shift_of(0)) & 63) << 26 |
+                          ((split >> shift_of(1)) & 63) << 20 |
+                          ((split >> shift_of(2)) & 63) << 14 | ((split >> shift_of(3)) & 63) << 8;
+    store_big_endian<4>(bits[0], to);
+    store_big_endian<4>(bits[1], to + 3);
+    store_big_endian<4>(bits[2], to + 6);
+    store_big_endian<3>(bits[3], to + 9);
+  }
+}
+
+// The next four values, or as many as there are, however far apart they stand.
+template <const alphabet &Also>
+void decoder<Also>::take_quartet() {
+  uint32_t bits = 0;
+  int num_values = 0;
+  while (num_values < 4 && at != end) {
+    const auto left = static_cast<size_t>(end - at);
+    const uint32_t len = left < kNumCharacters ? static_cast<uint32_t>(left) : kNumCharacters;
+    characters text = {};
+    memcpy(&text, at, len);
+    const characters distances = distances_of<Also>(text);
+    uint32_t used = 0;
+    for (; used < len && num_values < 4; ++used) {
+      if (distances[used] == 0) continue;
+      bits |= static_cast<uint32_t>(text[used] + distances[used]) << (18 - 6 * num_values++);
+    }
+    at += used;
+  }
+  for (int i = 0; i < num_values - 1; ++i) *to++ = static_cast<uint8_t>(bits >> (16 - 8 * i));
+}
+
+template <const alphabet &Also>
+static uint32_t decode(const char *caller, const char *text, uint32_t len, uint32_t spare,
+                       uint8_t **bytes) {
+  if (text == nullptr) return 0;
+  // floor(3 len / 4) + 3 len mod 4, without the product.
+  const uint32_t rest = 3 * (len % 4);
+  *bytes = allocate_bytes(len / 4 * 3 + rest / 4 + rest % 4 + spare);
+  CHECK_AS(caller, *bytes != nullptr, 0, "decode base64 but not memory");
+  decoder<Also> in = {text, text + len, *bytes};
+  while (in.at != in.end) {
+    in.take_blocks();
+    in.take_quartet();
+  }
+  return static_cast<uint32_t>(in.to - *bytes);
+}
+
+static uint32_t text_len(const char *text) {
+  return text != nullptr ? static_cast<uint32_t>(strlen(text)) : 0;
+}
+
+uint32_t base64DecodeStringRemoveEndZero(const char *text, uint8_t **bytes) {
+  return decode<kStandard>(__func__, text, text_len(text), 0, bytes);
+}
+
+uint32_t base64urlDecodeStringRemoveEndZero(const char *text, uint8_t **bytes) {
+  return decode<kUrl>(__func__, text, text_len(text), 0, bytes);
+}
+
+uint32_t base64urlDecodeStringRemoveEndZeroV2(const char *text, uint32_t len, uint8_t **bytes) {
+  return decode<kUrl>(__func__, text, len, 0, bytes);
+}
+
+uint32_t base64urlDecodeStringAddEndZeroV2(const char *text, uint32_t len, uint8_t **bytes) {
+  return decode<kUrl>(__func__, text, len, 1, bytes);
+}

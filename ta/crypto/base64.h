@@ -1,0 +1,30 @@
+/// Base64 and base64url (RFC 4648, sections 4 and 5).
+///
+/// The encoders make NUL-terminated texts, the standard one padded with "=", the URL one not. The
+/// decoders make bytes, without a NUL behind them but where it is said. They are lenient: a
+/// character outside their alphabet is skipped wherever it stands, padding included, and so is a
+/// last character alone; bits that are left over are dropped. The URL decoders know both alphabets.
+///
+/// Encoding takes the same time for all bytes of a length.
+#ifndef BASE64_H
+#define BASE64_H
+
+#include <stdint.h>
+
+/// NULL when `data` is NULL or memory ran out; only the second logs.
+char *base64EncodeAddEndZero(const uint8_t *data, uint32_t len);
+char *base64urlEncodeAddEndZero(const uint8_t *data, uint32_t len);
+
+/// Number of decoded bytes. `*bytes` receives a new buffer, which is the caller's also when that
+/// number is 0; NULL, with a line in the log, when memory ran out. It is left alone when `text` is
+/// NULL.
+uint32_t base64DecodeStringRemoveEndZero(const char *text, uint8_t **bytes);
+uint32_t base64urlDecodeStringRemoveEndZero(const char *text, uint8_t **bytes);
+
+/// The same for `len` characters, among which a NUL is one that is skipped.
+uint32_t base64urlDecodeStringRemoveEndZeroV2(const char *text, uint32_t len, uint8_t **bytes);
+
+/// The same with a NUL behind the bytes, which is not counted: for bytes that are a text.
+uint32_t base64urlDecodeStringAddEndZeroV2(const char *text, uint32_t len, uint8_t **bytes);
+
+#endif

@@ -1,0 +1,147 @@
+#include "crypto/tlv_box.h"
+
+#include "cursor.h"
+#include "failure.h"
+
+static constexpr uint32_t kRecordHeaderLen = 2 * sizeof(uint16_t);
+static constexpr uint32_t kIntLen = sizeof(uint32_t);
+
+static void destroy_bytes(uint8_t *bytes, uint32_t len) {
+  if (bytes == nullptr) return;
+  wipe(bytes, len);
+  TEE_Free(bytes);
+}
+
+static void destroy_item(void *value) {
+  auto *item = static_cast<tlv_item *>(value);
+  destroy_bytes(item->value, item->len);
+  TEE_Free(item);
+}
+
+using item_ptr = owned<tlv_item *, destroy_item>;
+
+tlv_box *tlv_box_create() {
+  box_ptr box(reinterpret_cast<tlv_box *>(allocate_bytes(sizeof(tlv_box))));
+  CHECK(box, nullptr, "Out of memory, need %dB", static_cast<int>(sizeof(tlv_box)));
+  box->items = key_list_create(destroy_item);
+  return box->items != nullptr ? box.release() : nullptr;
+}
+
+void tlv_box_destroy(tlv_box *box) {
+  if (box == nullptr) return;
+  key_list_destroy(box->items);
+  destroy_bytes(box->serialized, box->serialized_len);
+  TEE_Free(box);
+}
+
+int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t len) {
+  if (len > UINT16_MAX || (value == nullptr && len != 0)) return TLV_ERROR;
+  item_ptr item(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
+  CHECK(item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
+        static_cast<unsigned>(sizeof(tlv_item)));
+  item->type = type;
+  item->len = static_cast<uint16_t>(len);
+  item->value = allocate_bytes(len);
+  CHECK(item->value != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
+        static_cast<int>(len));
+  if (len != 0) memcpy(item->value, value, len);
+
+  // All types at their full length would be more than a length can say.
+  const uint32_t record_len = kRecordHeaderLen + len;
+  if (record_len > UINT32_MAX - box->serialized_len) return TLV_ERROR;
+  const int added = key_list_add(box->items, type, item.get());
+  if (added != 0) return added;
+  (void)item.release();
+  box->serialized_len += record_len;
+  return 0;
+}
+
+int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value) {
+  uint8_t bytes[kIntLen];
+  put_u32(bytes, value);
+  return tlv_box_put_bytes(box, type, bytes, sizeof bytes);
+}
+
+int tlv_box_put_bytes(tlv_box *box, uint16_t type, const uint8_t *value, uint32_t len) {
+  if (box->serialized != nullptr) return TLV_SERIALIZED;
+  return tlv_box_putobject(box, type, value, len);
+}
+
+int tlv_box_serialize(tlv_box *box) {
+  if (box->serialized != nullptr) return TLV_SERIALIZED;
+  uint8_t *at = allocate_bytes(box->serialized_len);
+  CHECK(at != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
+        static_cast<int>(box->serialized_len));
+  box->serialized = at;
+  for (const key_list_entry *entry = box->items->head; entry != nullptr; entry = entry->next) {
+    const auto *item = static_cast<const tlv_item *>(entry->value);
+    put_u16(at, item->type);
+    put_u16(at + sizeof item->type, item->len);
+    memcpy(at + kRecordHeaderLen, item->value, item->len);
+    at += kRecordHeaderLen + item->len;
+  }
+  return 0;
+}
+
+const uint8_t *tlv_box_get_buffer(const tlv_box *box) {
+  return box->serialized;
+}
+
+uint32_t tlv_box_get_size(const tlv_box *box) {
+  return box->serialized_len;
+}
+
+static bool take_record(reader *in, tlv_box *box) {
+  uint16_t type = 0;
+  uint16_t len = 0;
+  const uint8_t *value = nullptr;
+  if (!take_u16(in, &type) || !take_u16(in, &len)) return false;
+  if (len != 0 && !take(in, len, &value)) return false;
+  return tlv_box_putobject(box, type, value, len) == 0;
+}
+
+tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len) {
+  box_ptr box(tlv_box_create());
+  if (!box || (bytes == nullptr && len != 0)) return nullptr;
+  secret_bytes copy;
+  copy.data = allocate_bytes(len);
+  CHECK(copy.data != nullptr, nullptr, "Out of memory, need %dB", static_cast<int>(len));
+  copy.len = len;
+  if (len != 0) memcpy(copy.data, bytes, len);
+
+  for (reader in = {copy.data, len}; in.left != 0;) {
+    if (!take_record(&in, box.get())) return nullptr;
+  }
+  box->serialized = copy.release();
+  return box.release();
+}
+
+static const tlv_item *find_item(const tlv_box *box, uint16_t type) {
+  void *value = nullptr;
+  if (key_list_get(box->items, type, &value) != 0) return nullptr;
+  return static_cast<const tlv_item *>(value);
+}
+
+int tlv_box_get_int(const tlv_box *box, uint16_t type, uint32_t *value) {
+  const tlv_item *item = find_item(box, type);
+  if (item == nullptr || item->len < kIntLen) return TLV_ERROR;
+  *value = get_u32(item->value);
+  return 0;
+}
+
+int tlv_box_get_bytes(const tlv_box *box, uint16_t type, uint8_t *bytes, uint32_t *len) {
+  const tlv_item *item = find_item(box, type);
+  if (item == nullptr || *len < item->len) return TLV_ERROR;
+  if (*len != 0) memset(bytes, 0, *len);
+  if (item->len != 0) memcpy(bytes, item->value, item->len);
+  *len = item->len;
+  return 0;
+}
+
+int tlv_box_get_bytes_ptr(const tlv_box *box, uint16_t type, const uint8_t **bytes, uint32_t *len) {
+  const tlv_item *item = find_item(box, type);
+  if (item == nullptr) return TLV_NOT_FOUND;
+  *bytes = item->value;
+  *len = item->len;
+  return 0;
+}

@@ -1,0 +1,223 @@
+#include "frame/pipeline.h"
+
+#include <string.h>
+
+#include "cursor.h"
+#include "failure.h"
+#include "frame/message_table.h"
+#include "message.h"
+#include "ownership.h"
+
+namespace {
+
+constexpr uint32_t kWordLen = 4;
+constexpr uint32_t kHeaderLen = kWordLen + kWordLen;  // status, R
+
+// The caller's output buffer and what has been put into it.
+struct output {
+  uint8_t *buffer;
+  uint32_t capacity;
+  uint32_t response_len;  // R
+
+  void set_header(TEE_Result status) const {
+    put_u32(buffer, status);
+    put_u32(buffer + kWordLen, response_len);
+  }
+};
+
+// What a message needs while it is worked on; freed when the command ends.
+struct work {
+  slice_ptr message;
+  slice_ptr payload;
+  token_object_ptr request;
+  tee_ptr<char> tsmid;
+  secret_text response;
+  secret_bytes image;
+};
+
+}  // namespace
+
+// ---- The output buffer as working memory
+
+jsmn_string *borrow_share_memory(void *destination, const jsmn_string *slice) {
+  CHECK(destination != nullptr && slice != nullptr, nullptr, "borrow_share_memory input is NULL");
+  jsmn_string *copy = jsmn_init_string();
+  if (copy == nullptr) return nullptr;
+  auto *text = static_cast<char *>(destination);
+  if (slice->len != 0) memcpy(text, slice->data, slice->len);
+  text[slice->len] = 0;
+  copy->data = text;
+  copy->len = slice->len;
+  return copy;
+}
+
+void return_borrow_share_memory(void *destination, const jsmn_string *slice) {
+  if (destination == nullptr || slice == nullptr) {
+    trace_error("return_borrow_share_memory", __LINE__, "borrow_share_memory input is NULL");
+    return;
+  }
+  wipe(destination, slice->len + 1);
+}
+
+TEE_Result add_ta_bin_to_out_buf(void *destination, const uint8_t *image, uint32_t image_len) {
+  CHECK(destination != nullptr && image != nullptr && image_len != 0, OTRP_MISSING,
+        "add_ta_bin_to_out_buf input is NULL");
+  auto *at = static_cast<uint8_t *>(destination);
+  put_u32(at, image_len);
+  memcpy(at + kWordLen, image, image_len);
+  return TEE_SUCCESS;
+}
+
+// ---- The input frame
+
+// Nothing uses the reserved word and the two blocks, but a frame must have them, and they must fit
+// the heap.
+static bool take_copy(reader *in, uint32_t len, tee_ptr<uint8_t> *copy) {
+  const uint8_t *bytes = nullptr;
+  copy->reset(allocate_bytes(len));
+  if (!*copy || !take(in, len, &bytes)) return false;
+  memcpy(copy->get(), bytes, len);
+  return true;
+}
+
+static bool take_block(reader *in, tee_ptr<uint8_t> *block) {
+  uint32_t len = 0;
+  return take_u32(in, &len) && len != 0 && len <= in->left && take_copy(in, len, block);
+}
+
+static TEE_Result read_frame_head(reader *in, uint32_t *message_id) {
+  if (in->left == 0 || reinterpret_cast<uintptr_t>(in->at) > UINTPTR_MAX - in->left) {
+    return TEE_ERROR_BAD_PARAMETERS;
+  }
+  const tee_ptr<uint8_t> reserved(allocate_bytes(kWordLen));
+  if (!reserved) return TEE_ERROR_OUT_OF_MEMORY;
+  const uint8_t *word = nullptr;
+  if (!take(in, kWordLen, &word)) return TEE_ERROR_BAD_PARAMETERS;
+  memcpy(reserved.get(), word, kWordLen);
+
+  tee_ptr<uint8_t> first;
+  tee_ptr<uint8_t> second;
+  const bool whole = take_block(in, &first) && take_block(in, &second) && take_u32(in, message_id);
+  return whole ? TEE_SUCCESS : TEE_ERROR_BAD_PARAMETERS;
+}
+
+// ---- The stages of a message. Their lines carry the command's name.
+
+static const char kName[] = "OTrP_TaInvokeCmd";
+
+static TEE_Result verify(const message_entry *entry, const jsmn_string *message,
+                         secret_bytes *payload) {
+  request_context context = {reinterpret_cast<const uint8_t *>(message->data), message->len,
+                             entry->request_name, nullptr, 0};
+  const TEE_Result result = entry->verify(&context);
+  payload->data = context.payload;
+  payload->len = context.payload_len;
+  CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to verify message");
+  return TEE_SUCCESS;
+}
+
+// Finds out which TSM sent the message; a GetTAInfo request names none.
+static TEE_Result read_sender(work *job) {
+  job->request.reset(jsmn_init_object(job->message.get()));
+  CHECK_AS(kName, job->request, OTRP_BAD_REQUEST, "init request_json get NULL");
+  const slice_ptr tsmid(jsmn_object_get_string(job->request.get(), "tsmid"));
+  if (tsmid && tsmid->len != 0) job->tsmid.reset(jsmn_string_dup(tsmid->data, tsmid->len));
+  return TEE_SUCCESS;
+}
+
+// Moves the payload into the output buffer, so that the heap holds no copy while it is processed.
+static TEE_Result place_payload(secret_bytes *payload, const output &out, work *job,
+                                slice_ptr *placed) {
+  CHECK_AS(kName, payload->data != nullptr && payload->len != 0, OTRP_BAD_REQUEST,
+           "after verify_decode get tbs json is NULL");
+  job->payload->data = reinterpret_cast<const char *>(payload->data);
+  job->payload->len = payload->len;
+  if (payload->len < out.capacity - kHeaderLen) {
+    placed->reset(borrow_share_memory(out.buffer + kHeaderLen, job->payload.get()));
+  }
+  job->payload->data = nullptr;
+  CHECK_AS(kName, *placed && (*placed)->len != 0, OTRP_NO_MEMORY, "borrow_share_memory get NULL");
+  payload->reset();
+  return TEE_SUCCESS;
+}
+
+// Whatever comes of it, nothing of the payload stays in the output buffer.
+static TEE_Result process(const message_entry *entry, const output &out, const slice_ptr &placed,
+                          work *job) {
+  ta_image image = {};
+  char *response = nullptr;
+  const token_object_ptr tbs(jsmn_init_object(placed.get()));
+  const TEE_Result result =
+      entry->process(job->tsmid.get(), tbs.get(), &response, &image, job->request.get());
+  job->response.reset(response);
+  job->image.data = image.data;
+  job->image.len = image.len;
+  return_borrow_share_memory(out.buffer + kHeaderLen, placed.get());
+  CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to process message");
+  return TEE_SUCCESS;
+}
+
+static TEE_Result encode(const message_entry *entry, const work &job, output *out) {
+  uint32_t len = out->capacity - kHeaderLen;
+  const TEE_Result result = entry->encode(job.response.get(), out->buffer + kHeaderLen, &len);
+  CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to encode message");
+  out->response_len = len;
+  return TEE_SUCCESS;
+}
+
+static bool has_image(const work &job) {
+  return job.image.data != nullptr && job.image.len != 0;
+}
+
+static TEE_Result add_image(const work &job, const output &out) {
+  if (!has_image(job)) return TEE_SUCCESS;
+  const uint32_t offset = kHeaderLen + out.response_len;
+  CHECK_AS(kName, uint64_t{offset} + kWordLen + job.image.len <= out.capacity, OTRP_NO_MEMORY,
+           "Failed to add ta_bin, rbuf too small");
+  return add_ta_bin_to_out_buf(out.buffer + offset, job.image.data, job.image.len);
+}
+
+static TEE_Result answer_message(reader *in, uint32_t message_id, work *job, output *out) {
+  const message_entry *entry = find_message(message_id);
+  CHECK_AS(kName, entry != nullptr, OTRP_BAD_REQUEST, "Unknown OTrP cmd: 0x%x\n", message_id);
+  uint32_t len = 0;
+  const uint8_t *text = nullptr;
+  if (!take_u32(in, &len) || !take(in, len, &text)) return OTRP_BAD_REQUEST;
+  job->message->data = reinterpret_cast<const char *>(text);
+  job->message->len = len;
+
+  secret_bytes payload;
+  slice_ptr placed;
+  TRY(verify(entry, job->message.get(), &payload));
+  TRY(read_sender(job));
+  TRY(place_payload(&payload, *out, job, &placed));
+  TRY(process(entry, *out, placed, job));
+  TRY(encode(entry, *job, out));
+  return add_image(*job, *out);
+}
+
+TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out, uint32_t *out_len) {
+  CHECK(in != nullptr && in_len > kWordLen && out != nullptr && out_len != nullptr,
+        TEE_ERROR_BAD_PARAMETERS, "Invalid parameters/length\n");
+  CHECK(*out_len >= kHeaderLen, TEE_ERROR_SHORT_BUFFER, "output buffer is too small\n");
+  work job;
+  job.message.reset(jsmn_init_string());
+  job.payload.reset(jsmn_init_string());
+  CHECK(job.message && job.payload, OTRP_NO_MEMORY,
+        "Failed to allocate memory for request_json_str/request_json_tbs_str\n");
+
+  output answer = {static_cast<uint8_t *>(out), *out_len, 0};
+  answer.set_header(OTRP_RESPONSE_FAILED);
+  reader frame = {static_cast<const uint8_t *>(in), in_len};
+  uint32_t message_id = 0;
+  const TEE_Result framed = read_frame_head(&frame, &message_id);
+  if (framed != TEE_SUCCESS) {
+    answer.set_header(framed);
+    return framed;
+  }
+
+  answer.set_header(answer_message(&frame, message_id, &job, &answer));
+  *out_len = kHeaderLen + answer.response_len;
+  if (has_image(job)) *out_len += kWordLen + job.image.len;
+  return TEE_SUCCESS;
+}

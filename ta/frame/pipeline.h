@@ -1,0 +1,37 @@
+/// The message pipeline: one OTrP request in, one signed OTrP response out.
+///
+///     in:   reserved word | L1 | L1 bytes | L2 | L2 bytes | message ID | M | M bytes of JSON
+///     out:  status | R | R bytes of JSON [ | T | T bytes of TA image ]
+///
+/// Words have 32 bits, little-endian. The two blocks are not used and not empty. Failures of the
+/// frame, of verification and of signing appear in the status word alone; an operation that fails
+/// answers with a signed response that says so.
+#ifndef PIPELINE_H
+#define PIPELINE_H
+
+#include <stdint.h>
+#include <tee_internal_api.h>
+
+#include "state/token_reader.h"
+
+/// Handles one request. `*out_len` is the capacity of `out` and then what was written; with a TA
+/// image that did not fit, what would have been. Both buffers are shared with the normal world,
+/// and `out` serves as working memory for the decoded payload, which is wiped before returning.
+///
+/// TEE_SUCCESS once the frame has been read, whatever came of the message. Otherwise
+/// TEE_ERROR_BAD_PARAMETERS, TEE_ERROR_SHORT_BUFFER, OTRP_NO_MEMORY or TEE_ERROR_OUT_OF_MEMORY,
+/// and `*out_len` is as it was.
+[[nodiscard]] TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out,
+                                          uint32_t *out_len);
+
+/// Copies the slice and a NUL to `destination` and returns a new slice of the copy, or NULL.
+jsmn_string *borrow_share_memory(void *destination, const jsmn_string *slice);
+
+/// Wipes such a copy.
+void return_borrow_share_memory(void *destination, const jsmn_string *slice);
+
+/// Writes the image's length and the image to `destination`.
+[[nodiscard]] TEE_Result add_ta_bin_to_out_buf(void *destination, const uint8_t *image,
+                                               uint32_t image_len);
+
+#endif

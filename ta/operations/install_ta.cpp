@@ -1,0 +1,204 @@
+// InstallTA: decrypts a TA image, records the TA in a security domain and hands the image over.
+#include "operations/install_ta.h"
+
+#include <string.h>
+
+#include "crypto/aik.h"
+#include "crypto/base64.h"
+#include "crypto/rsa.h"
+#include "crypto/symmetric.h"
+#include "failure.h"
+#include "operations/exchange.h"
+#include "operations/operations.h"
+#include "operations/refresh_sd.h"
+#include "security/tsm_trust.h"
+#include "state/object_store.h"
+#include "state/records.h"
+#include "state/ta_register.h"
+
+namespace {
+
+const exchange_texts kTexts = {
+    .process = "installta_process",
+    .tbs_request = "InstallTATBSRequest",
+    .tbs_response = "InstallTATBSResponse",
+    .null_input = "installta_process input is NULL",
+    .needs_tbs = true,
+    .no_root = "init response_root_value fail",
+    .no_root_object = "init response_root_object from response_root_value fail",
+    .no_content = "init content_resp_value fail",
+    .no_content_object = nullptr,
+    .no_response_object = "json error InstallTATBSResponse %p\n",
+    .no_request = "json_value_get_object InstallTATBSRequest_object is null",
+    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
+    .no_dsihash = "jsmn_object_get_string dsihash is null",
+    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
+    .content_unreadable = "json_object_get_value enc_content is null",
+    .content_no_object = "json_value_get_object content_object is null",
+    .not_serialized = "parse response json to string out of mem",
+};
+
+constexpr uint32_t kImageKeyLen = 32;  // the last 16 bytes are the AES key
+
+}  // namespace
+
+// ---- The image
+
+void drop_image(ta_image *image) {
+  if (image->data != nullptr) {
+    wipe(image->data, image->len);
+    TEE_Free(image->data);
+  }
+  *image = {};
+}
+
+const uint8_t *image_with_header(const ta_image &image) {
+  return image.len >= kTaImageHeaderLen ? image.data : nullptr;
+}
+
+static TEE_Result decode_member(const char *caller, const jsmn_object *from, const char *key,
+                                const char *missing, const char *undecodable, secret_bytes *bytes) {
+  const slice_ptr slice(jsmn_object_get_string(from, key));
+  CHECK_AS(caller, slice, OTRP_NO_MEMORY, "%s", missing);
+  bytes->len = base64urlDecodeStringRemoveEndZeroV2(slice->data, slice->len, &bytes->data);
+  CHECK_AS(caller, bytes->len != 0, OTRP_TA_DECRYPT_FAILED, "%s", undecodable);
+  return TEE_SUCCESS;
+}
+
+static TEE_Result unwrap_image_key(const char *caller, const char *spid,
+                                   const jsmn_object *encrypted_ta, secret_bytes *image_key) {
+  secret_bytes wrapped;
+  TRY(decode_member(caller, encrypted_ta, "key", "get encrypted_key_encoded is null",
+                    "encrypted_key decode base64url error get null", &wrapped));
+  key_object aik;
+  TEE_Result result = get_aik_key_handle(spid, out(aik));
+  CHECK_AS(caller, result == TEE_SUCCESS && aik, OTRP_TA_DECRYPT_FAILED,
+           "get_aik_key_handle error code: 0x%x", result);
+  result = rsa_decrypt(aik.get(), wrapped.data, wrapped.len, &image_key->data, &image_key->len);
+  CHECK_AS(caller, result == TEE_SUCCESS && image_key->len >= kImageKeyLen, OTRP_TA_DECRYPT_FAILED,
+           "rsa_decrypt error code: 0x%x", result);
+  return TEE_SUCCESS;
+}
+
+TEE_Result verify_encrypted_ta(const char *field, const char *spid, const jsmn_object *encrypted_ta,
+                               uint8_t **image, uint32_t *image_len, uint8_t **digest) {
+  CHECK(encrypted_ta != nullptr && image != nullptr && image_len != nullptr && digest != nullptr,
+        OTRP_MISSING, "verify_encrypted_ta input is null");
+  *image = nullptr;
+  *image_len = 0;
+  *digest = nullptr;
+
+  secret_bytes image_key;
+  TRY(unwrap_image_key(__func__, spid, encrypted_ta, &image_key));
+  secret_bytes iv;
+  TRY(decode_member(__func__, encrypted_ta, "iv", "get iv_encoded is null",
+                    "iv decode base64url error get null", &iv));
+  secret_bytes cipher;
+  TRY(decode_member(__func__, encrypted_ta, field, "get ciphertadata_encoded is null",
+                    "ciphertadata decode base64url error get null", &cipher));
+  secret_bytes plain;
+  const uint32_t cipher_len = cipher.len;
+  const TEE_Result decrypted = aes_cbc_decrypt_with_update_block(
+      get_aes_key_from_cek(image_key.data), kAesBlockLen, iv.data, iv.len, cipher.release(),
+      cipher_len, &plain.data, &plain.len);
+  CHECK(decrypted == TEE_SUCCESS && plain.len != 0, OTRP_TA_DECRYPT_FAILED,
+        "aes_cbc_decrypt ta decryption fail error code: 0x%x", decrypted);
+
+  tee_ptr<uint8_t> hash(allocate_bytes(kSha256Len));
+  CHECK(hash, OTRP_NO_MEMORY, "no memory for ta_hash");
+  uint32_t hash_len = kSha256Len;
+  CHECK(do_digest_with_sha(TEE_ALG_SHA256, plain.data, plain.len, hash.get(), &hash_len) ==
+            TEE_SUCCESS,
+        OTRP_NO_MEMORY, "compute ta_hash fail");
+  *image_len = plain.len;
+  *image = plain.release();
+  *digest = hash.release();
+  return TEE_SUCCESS;
+}
+
+// ---- The records
+
+static TEE_Result add_ta_to_ta_list(const JSON_Value *sd_info, const char *sdname,
+                                    const char *taid) {
+  JSON_Array *talist = json_object_get_array(json_value_get_object(sd_info), "talist");
+  CHECK(talist != nullptr, OTRP_NO_MEMORY, "add_ta_to_ta_list fail when get talist");
+  json_ptr item(json_value_init_object());
+  JSON_Object *members = json_value_get_object(item.get());
+  const bool appended = json_object_set_string(members, "taid", taid) == JSONSuccess &&
+                        json_object_set_string(members, "taname", taid) == JSONSuccess &&
+                        json_array_append_value(talist, item.get()) == JSONSuccess;
+  CHECK(appended, OTRP_NO_MEMORY, "json_array_append_string talist fail");
+  (void)item.release();
+  return save_sd_info_with_json_value(sdname, sd_info);
+}
+
+// Writes the SD record and the TA record and refreshes the DSI, in this order.
+static TEE_Result install_ta(const char *sdname, const char *spid, const char *taid,
+                             const char *ta_version) {
+  CHECK(sdname != nullptr && spid != nullptr && ta_version != nullptr && taid != nullptr,
+        OTRP_MISSING, "install_ta fail input is null");
+  json_ptr sd_info;
+  TRY_LOG(get_sd_info_persistent_object_to_json_value(sdname, out(sd_info)),
+          "get_sd_info_persistent_object_to_json_value get sd_info from po fail error code: 0x%x");
+  uint32_t found = 0;
+  const TEE_Result checked = check_ta_exist_in_ta_list(taid, sd_info.get(), &found);
+  CHECK(checked == TEE_SUCCESS && found == 0, OTRP_TA_EXISTS,
+        "ta already exist in ta_list, otrp fail error code: 0x%x", checked);
+  CHECK(can_be_stored(taid) && can_be_stored(spid) && can_be_stored(ta_version), OTRP_NO_MEMORY,
+        "install_ta fail, a text cannot be stored");
+
+  TRY_LOG(add_ta_to_ta_list(sd_info.get(), sdname, taid),
+          "add_ta_to_ta_list fail error code: 0x%x");
+  TRY_LOG(save_ta_info_to_persistent_object(spid, sdname, taid, ta_version, false),
+          "save_ta_info_to_persistent_object fail error code: 0x%x");
+  return refresh_sd_in_dsi(__func__, sdname);
+}
+
+// ---- The message
+
+static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
+                            ta_image *image) {
+  const char *name = kTexts.process;
+  TRY(open_response(x));
+  TRY(open_request(x, tbs));
+  TRY(add_ids(x));
+  TRY(check_dsihash(*x));
+  const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
+  CHECK_AS(name, encrypted_ta, OTRP_NO_MEMORY,
+           "jsmn_object_get_object encrypted_ta_object is null");
+  const JSON_Object *content = nullptr;
+  TRY(decrypt_content(x, &content));
+  const char *spid = json_object_get_string(content, "spid");
+  const char *taid = json_object_get_string(content, "taid");
+  const char *sdname = json_object_get_string(content, "sdname");
+  CHECK_AS(name, taid != nullptr, OTRP_MISSING, "install_ta fail input is null");
+  const TEE_Result verified =
+      verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request);
+  CHECK_AS(name, verified == TEE_SUCCESS, verified, "Failed to verify install TA request\n");
+
+  secret_bytes plain;
+  tee_ptr<uint8_t> digest;
+  TRY_LOG_AS(name,
+             verify_encrypted_ta("ciphertadata", spid, encrypted_ta.get(), &plain.data, &plain.len,
+                                 out(digest)),
+             "verify_encrypted_ta error code: 0x%x");
+  TRY_LOG_AS(name, install_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
+             "install_ta error code 0x%x");
+
+  image->len = plain.len;
+  image->data = plain.release();
+  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
+  TRY_LOG_AS(name, save_ta_register_info(taid, image_with_header(*image), kRegisterTa),
+             "save_ta_register_info fail error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result installta_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                             ta_image *image, const jsmn_object *request) {
+  TRY(check_input(kTexts, tbs, response));
+  exchange x(kTexts, tsmid);
+  const TEE_Result result = carry_out(&x, tbs, request, image);
+  const TEE_Result closed = close_response(&x, result, response);
+  if (closed != TEE_SUCCESS) drop_image(image);
+  return closed;
+}

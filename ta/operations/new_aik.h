@@ -1,0 +1,31 @@
+/// A new AIK for an SP, step by step, as CreateSD and UpdateSD make it: the same texts, under the
+/// name of the operation `caller`.
+#ifndef NEW_AIK_H
+#define NEW_AIK_H
+
+#include <stdint.h>
+#include <tee_internal_api.h>
+
+#include "crypto/tlv_box.h"
+#include "state/json.h"
+
+/// The encoded public key of a key box, in a new buffer.
+[[nodiscard]] TEE_Result read_public_half(const char *caller, const tlv_box *box, uint8_t **pubkey,
+                                          uint32_t *pubkey_len);
+
+/// A fresh key pair and its encoded public key.
+[[nodiscard]] TEE_Result make_aik(const char *caller, box_ptr *box, uint8_t **pubkey,
+                                  uint32_t *pubkey_len);
+
+/// Adds the key to the in-memory DSI.
+[[nodiscard]] TEE_Result announce_aik(const char *caller, const char *spid, const uint8_t *pubkey,
+                                      uint32_t pubkey_len);
+
+/// The key box as the base64 text that an SP record holds: private key material.
+[[nodiscard]] TEE_Result encode_aik(const char *caller, tlv_box *box, char **encoded);
+
+/// Sets "teespaik" in a response's content.
+[[nodiscard]] TEE_Result set_teespaik(const char *caller, JSON_Object *content,
+                                      const uint8_t *pubkey, uint32_t pubkey_len);
+
+#endif

@@ -1,0 +1,97 @@
+// UpdateTA: replaces the image and the version of an installed TA.
+#include "failure.h"
+#include "operations/exchange.h"
+#include "operations/install_ta.h"
+#include "operations/operations.h"
+#include "security/tsm_trust.h"
+#include "state/object_store.h"
+#include "state/records.h"
+#include "state/ta_register.h"
+
+namespace {
+
+const exchange_texts kTexts = {
+    .process = "updateta_process",
+    .tbs_request = "UpdateTATBSRequest",
+    .tbs_response = "UpdateTATBSResponse",
+    .null_input = "updateta_process input is NULL",
+    .needs_tbs = true,
+    .no_root = "init response_root_value fail",
+    .no_root_object = "init response_root_object from response_root_value fail",
+    .no_content = "init content_resp_value fail",
+    .no_content_object = nullptr,
+    .no_response_object = "init TBSResponse object fail",
+    .no_request = "init TBSRequest_object from TBSRequest_value fail",
+    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
+    .no_dsihash = "get dsihash null",
+    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
+    .content_unreadable = "get enc_content from TBSRequest_object null",
+    .content_no_object = "get content_object null",
+    .not_serialized = "parse response json to string out of mem",
+};
+
+}  // namespace
+
+// Deletes the TA record and writes it anew. The SD record and the DSI stay as they are.
+static TEE_Result update_ta(const char *sdname, const char *spid, const char *taid,
+                            const char *ta_version) {
+  CHECK(sdname != nullptr && spid != nullptr && ta_version != nullptr && taid != nullptr,
+        OTRP_MISSING, "update ta fail input is null");
+  json_ptr sd_info;
+  TRY_LOG(get_sd_info_persistent_object_to_json_value(sdname, out(sd_info)),
+          "get_sd_info_persistent_object_to_json_value get sd_info from po fail error code: 0x%x");
+  uint32_t found = 0;
+  const TEE_Result checked = check_ta_exist_in_ta_list(taid, sd_info.get(), &found);
+  CHECK(checked == TEE_SUCCESS && found != 0, OTRP_NOT_FOUND,
+        "ta not exist in ta_list, otrp fail error code: 0x%x", checked);
+  CHECK(can_be_stored(spid) && can_be_stored(ta_version), OTRP_NO_MEMORY,
+        "update_ta fail, a text cannot be stored");
+  TRY_LOG(save_ta_info_to_persistent_object(spid, sdname, taid, ta_version, true),
+          "save_ta_info_to_persistent_object fail error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
+                            ta_image *image) {
+  const char *name = kTexts.process;
+  TRY(open_response(x));
+  TRY(open_request(x, tbs));
+  TRY(check_dsihash(*x));
+  const JSON_Object *content = nullptr;
+  TRY(decrypt_content(x, &content));
+  const char *spid = json_object_get_string(content, "spid");
+  const char *taid = json_object_get_string(content, "taid");
+  const char *sdname = json_object_get_string(content, "sdname");
+  CHECK_AS(name, taid != nullptr, OTRP_MISSING, "update ta fail input is null");
+  TRY(verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request));
+
+  const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
+  CHECK_AS(name, encrypted_ta, OTRP_NO_MEMORY,
+           "jsmn_object_get_object encrypted_ta_object is null");
+  secret_bytes plain;
+  tee_ptr<uint8_t> digest;
+  TRY_LOG_AS(name,
+             verify_encrypted_ta("ciphernewtadata", spid, encrypted_ta.get(), &plain.data,
+                                 &plain.len, out(digest)),
+             "verify_encrypted_ta error code: 0x%x");
+  TRY(add_ids(x));
+  TRY_LOG_AS(name, update_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
+             "update_ta error code 0x%x");
+
+  image->len = plain.len;
+  image->data = plain.release();
+  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
+  TRY_LOG_AS(name, save_ta_register_info(taid, image_with_header(*image), kUpdateTa),
+             "save_ta_register_info fail error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result updateta_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                            ta_image *image, const jsmn_object *request) {
+  TRY(check_input(kTexts, tbs, response));
+  exchange x(kTexts, tsmid);
+  const TEE_Result result = carry_out(&x, tbs, request, image);
+  const TEE_Result closed = close_response(&x, result, response);
+  if (closed != TEE_SUCCESS) drop_image(image);
+  return closed;
+}

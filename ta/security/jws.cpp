@@ -1,0 +1,251 @@
+#include "security/jws.h"
+
+#include <string.h>
+#include <ta_config.h>
+
+#include "crypto/base64.h"
+#include "crypto/corvel_client.h"
+#include "crypto/rsa.h"
+#include "failure.h"
+#include "ownership.h"
+#include "security/tsm_trust.h"
+
+namespace {
+
+const char kGetDeviceStateRequest[] = "GetDeviceStateRequest";
+const char kGetTaInfoRequest[] = "GetTAInfoRequest";
+
+const data_part kDot = {".", 1};
+constexpr uint32_t kNumSignedParts = 3;
+
+constexpr uint32_t kModeWithSpekid = 2;
+
+// The members of a request's envelope; slices of the message text.
+struct envelope {
+  slice_ptr payload;
+  slice_ptr protect;
+  slice_ptr signature;
+  slice_ptr tsmid;
+};
+
+}  // namespace
+
+static bool is_present(const slice_ptr &slice) {
+  return slice && slice->data != nullptr;
+}
+
+// ---- Verification
+
+static TEE_Result read_envelope(const char *caller, const request_context *context,
+                                envelope *parts) {
+  const slice_ptr message(jsmn_init_string());
+  CHECK_AS(caller, message, OTRP_NO_MEMORY, "init root_object_jsmn_string error");
+  message->data = reinterpret_cast<const char *>(context->message);
+  message->len = context->message_len;
+  const token_object_ptr root(jsmn_init_object(message.get()));
+  CHECK_AS(caller, root, OTRP_NO_MEMORY, "parse root_object_jsmn_string to root_object error");
+  const token_object_ptr request(jsmn_object_get_object(root.get(), context->request_name));
+  CHECK_AS(caller, request, OTRP_BAD_REQUEST, "%s not found", context->request_name);
+
+  parts->payload.reset(jsmn_object_get_string(request.get(), "payload"));
+  CHECK_AS(caller, is_present(parts->payload), OTRP_BAD_REQUEST, "get base64 payload error");
+  parts->protect.reset(jsmn_object_get_string(request.get(), "protect"));
+  CHECK_AS(caller, is_present(parts->protect), OTRP_BAD_REQUEST, "get base64_protect error");
+  parts->signature.reset(jsmn_object_get_string(request.get(), "signature"));
+  CHECK_AS(caller, is_present(parts->signature), OTRP_BAD_REQUEST, "get base64 signature error");
+  const token_object_ptr header(jsmn_object_get_object(request.get(), "header"));
+  CHECK_AS(caller, header, OTRP_BAD_REQUEST, "request header is NULL");
+  parts->tsmid.reset(jsmn_object_get_string(header.get(), "tsmid"));
+  CHECK_AS(caller, is_present(parts->tsmid), OTRP_BAD_REQUEST, "request header get tsmid is NULL");
+  return TEE_SUCCESS;
+}
+
+static TEE_Result decode_payload(const char *caller, const jsmn_string *payload,
+                                 secret_bytes *decoded) {
+  decoded->len = base64urlDecodeStringAddEndZeroV2(payload->data, payload->len, &decoded->data);
+  CHECK_AS(caller, decoded->len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
+  return TEE_SUCCESS;
+}
+
+bool verify_signature(TEE_ObjectHandle key, const jsmn_string *payload, const jsmn_string *protect,
+                      const jsmn_string *signature) {
+  secret_bytes decoded;
+  decoded.len =
+      base64urlDecodeStringRemoveEndZeroV2(signature->data, signature->len, &decoded.data);
+  CHECK(decoded.len != 0, false, "base64urlDecodeStringRemoveEndZero decode length 0");
+  const data_part parts[] = {{protect->data, protect->len}, kDot, {payload->data, payload->len}};
+  const TEE_Result result =
+      sha_verify_signature(key, parts, kNumSignedParts, decoded.data, decoded.len);
+  CHECK(result == TEE_SUCCESS, false, "sha_verify_signature error");
+  return true;
+}
+
+static TEE_Result take_whole_message(request_context *context) {
+  secret_bytes payload;
+  if (context->message_len < UINT32_MAX) {
+    payload.data = allocate_bytes(context->message_len + 1);
+  }
+  CHECK_AS("verify_decode_by_name", payload.data != nullptr, OTRP_NO_MEMORY,
+           "no memory for %u bytes of payload", context->message_len);
+  memcpy(payload.data, context->message, context->message_len);
+  context->payload = payload.release();
+  context->payload_len = context->message_len;
+  return TEE_SUCCESS;
+}
+
+TEE_Result verify_decode_by_name(request_context *context) {
+  if (strcmp(context->request_name, kGetTaInfoRequest) == 0) return take_whole_message(context);
+  envelope parts;
+  TRY(read_envelope(__func__, context, &parts));
+  const tee_ptr<char> tsmid(jsmn_string_dup(parts.tsmid->data, parts.tsmid->len));
+  CHECK(tsmid, OTRP_NO_MEMORY, "tsmid_copy is null no memory");
+
+  // A TSM's first GetDeviceState is verified with a key that it delivers itself: the chain has to
+  // be admitted first, which each of its keys earns by the CA-TSM key's signature alone.
+  secret_bytes payload;
+  if (strcmp(context->request_name, kGetDeviceStateRequest) == 0) {
+    TRY(decode_payload(__func__, parts.payload.get(), &payload));
+    TRY_LOG(handle_tsm_key_chain(reinterpret_cast<const char *>(payload.data)),
+            "handle_tsm_key_chain error code: 0x%x");
+  }
+
+  key_object key;
+  const TEE_Result found = get_tsm_pubkey_by_tsmid(tsmid.get(), out(key));
+  CHECK(found == TEE_SUCCESS && key, found, "get tsm pubkey error, error code: 0x%x", found);
+  CHECK(
+      verify_signature(key.get(), parts.payload.get(), parts.protect.get(), parts.signature.get()),
+      OTRP_BAD_REQUEST, "Fail to pass signature verification\n");
+  if (payload.data == nullptr) TRY(decode_payload(__func__, parts.payload.get(), &payload));
+
+  context->payload_len = payload.len;
+  context->payload = payload.release();
+  return TEE_SUCCESS;
+}
+
+// ---- Signing
+
+static TEE_Result sign(const char *caller, const jsmn_string *payload, const jsmn_string *protect,
+                       TEE_ObjectHandle key, uint8_t **signature, uint32_t *signature_len) {
+  tee_ptr<uint8_t> buffer(allocate_bytes(kRsaSignatureLen));
+  CHECK_AS(caller, buffer, TEE_ERROR_OUT_OF_MEMORY, "no memory for signature");
+  uint32_t len = kRsaSignatureLen;
+  const data_part parts[] = {{protect->data, protect->len}, kDot, {payload->data, payload->len}};
+  TRY(sha_compute_signature(key, parts, kNumSignedParts, buffer.get(), &len));
+  *signature = buffer.release();
+  *signature_len = len;
+  return TEE_SUCCESS;
+}
+
+TEE_Result sign_with_tee_key(const jsmn_string *payload, const jsmn_string *protect,
+                             uint8_t **signature, uint32_t *signature_len) {
+  *signature = nullptr;
+  *signature_len = 0;
+  const key_object key(get_tee_key());
+  CHECK(key, TEE_ERROR_GENERIC, "get_tee_key error");
+  return sign(__func__, payload, protect, key.get(), signature, signature_len);
+}
+
+TEE_Result sign_with_spaik_key(const jsmn_string *payload, const jsmn_string *protect,
+                               uint8_t **signature, uint32_t *signature_len, TEE_ObjectHandle key) {
+  *signature = nullptr;
+  *signature_len = 0;
+  return sign(__func__, payload, protect, key, signature, signature_len);
+}
+
+static bool set_header(JSON_Object *header, uint32_t mode) {
+  const char *caller = "addHeader";
+  if (json_object_set_string(header, "deviceId", "test_device_id") != JSONSuccess) return false;
+  if (mode != kModeWithSpekid) return true;
+  tee_ptr<char> sp_ek_id;
+  const TEE_Result result = corvel_get_sp_ek_id(out(sp_ek_id));
+  CHECK_AS(caller, result == TEE_SUCCESS, false, "Failed to get SP_EK_ID from CORVEL: 0x%x",
+           result);
+  return json_object_set_string(header, "spekid", sp_ek_id.get()) == JSONSuccess;
+}
+
+bool add_signature_header(JSON_Object *envelope, uint32_t mode) {
+  json_ptr header(json_value_init_object());
+  if (!header || !set_header(json_value_get_object(header.get()), mode)) return false;
+  if (json_object_set_value(envelope, "header", header.get()) != JSONSuccess) return false;
+  (void)header.release();
+  return true;
+}
+
+static jsmn_string slice_of(const char *text) {
+  return {text, static_cast<uint32_t>(strlen(text))};
+}
+
+// base64url of `text` up to its terminator, as a member of `into`.
+static char *encode_text(const char *caller, const char *text, const char *failed) {
+  char *encoded = base64urlEncodeAddEndZero(reinterpret_cast<const uint8_t *>(text),
+                                            static_cast<uint32_t>(strlen(text)));
+  CHECK_AS(caller, encoded != nullptr, nullptr, "%s", failed);
+  return encoded;
+}
+
+static char *encode_signature(const char *caller, const char *payload, const char *protect,
+                              TEE_ObjectHandle key) {
+  const jsmn_string payload_slice = slice_of(payload);
+  const jsmn_string protect_slice = slice_of(protect);
+  tee_ptr<uint8_t> signature;
+  uint32_t len = 0;
+  const TEE_Result result =
+      key != TEE_HANDLE_NULL
+          ? sign_with_spaik_key(&payload_slice, &protect_slice, out(signature), &len, key)
+          : sign_with_tee_key(&payload_slice, &protect_slice, out(signature), &len);
+  if (result != TEE_SUCCESS) return nullptr;
+  char *encoded = base64urlEncodeAddEndZero(signature.get(), len);
+  CHECK_AS(caller, encoded != nullptr, nullptr, "base64url encode signature error");
+  return encoded;
+}
+
+char *construct_json_signature(const char *name, const char *payload, const char *protect,
+                               JSON_Value *header, TEE_ObjectHandle key) {
+  const json_ptr root(json_value_init_object());
+  CHECK(name != nullptr && payload != nullptr && protect != nullptr, nullptr, "null parameter");
+  CHECK(root, nullptr, "init response json error");
+  tee_ptr<char> payload_text(encode_text(__func__, payload, "base64url encode payload error"));
+  if (!payload_text) return nullptr;
+  const tee_ptr<char> protect_text(
+      encode_text(__func__, protect, "base64url encode protect error"));
+  if (!protect_text) return nullptr;
+  const tee_ptr<char> signature_text(
+      encode_signature(__func__, payload_text.get(), protect_text.get(), key));
+  if (!signature_text) return nullptr;
+
+  json_ptr envelope(json_value_init_object());
+  CHECK(envelope, nullptr, "json_parse_string error");
+  JSON_Object *members = json_value_get_object(envelope.get());
+  const bool complete =
+      json_object_set_string(members, "payload", payload_text.get()) == JSONSuccess &&
+      json_object_set_string(members, "signature", signature_text.get()) == JSONSuccess &&
+      json_object_set_string(members, "protect", protect_text.get()) == JSONSuccess &&
+      add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
+  if (!complete) return nullptr;
+  payload_text.reset();
+  if (header != nullptr && json_object_set_value(members, "header", header) != JSONSuccess) {
+    return nullptr;
+  }
+  CHECK(
+      json_object_set_value(json_value_get_object(root.get()), name, envelope.get()) == JSONSuccess,
+      nullptr, "set signature_json to response json Fail");
+  (void)envelope.release();
+  char *text = json_serialize_to_string(root.get());
+  CHECK(text != nullptr, nullptr, "response to json string get NULL");
+  return text;
+}
+
+TEE_Result sign_encode_by_name_with_key(const char *response, const char *name,
+                                        uint8_t *destination, uint32_t *len, TEE_ObjectHandle key) {
+  const uint32_t capacity = *len;
+  *len = 0;
+  CHECK(response != nullptr, OTRP_MISSING, "sign_encode_by_name_with_key input is NULL");
+  const json_text envelope(
+      construct_json_signature(name, response, JWS_HEADER_RS256, nullptr, key));
+  CHECK(envelope, OTRP_RESPONSE_FAILED, "construct_json_signature error");
+  const size_t envelope_len = strlen(envelope.get());
+  CHECK(capacity > envelope_len, OTRP_RESPONSE_FAILED, "buffer is too small");
+  memcpy(destination, envelope.get(), envelope_len);
+  *len = static_cast<uint32_t>(envelope_len);
+  return TEE_SUCCESS;
+}

@@ -1,0 +1,362 @@
+#include "state/dsi.h"
+
+#include <string.h>
+#include <ta_config.h>
+
+#include "crypto/aik.h"
+#include "crypto/base64.h"
+#include "crypto/constant_time.h"
+#include "crypto/symmetric.h"
+#include "failure.h"
+#include "record_names.h"
+#include "state/object_store.h"
+#include "state/records.h"
+
+dsi_json_str_t *g_dsi = nullptr;
+
+namespace {
+
+const char kSdEntryTemplate[] = "{\"name\":\"\",\"spid\":\"\",\"talist\":[]}";
+
+// Members marked "..." are replaced; the order of all is the order in the document.
+const char kDsiTemplate[] =
+    "{\"dsi\":{"
+    "\"tfwdata\":{"
+    "\"tbs\":\"TFW to be signed data is the tid\","
+    "\"cert\":\"BASE64 encoded TFW certificate\","
+    "\"sigalg\":\"Signing method\","
+    "\"sig\":\"Tfw signed data,  BASE64 encoded\"},"
+    "\"tee\":{"
+    "\"name\":\"TEE name\","
+    "\"ver\":\"TEE version\","
+    "\"cert\":\"BASE64 encoded TEE cert\","
+    "\"cacert\":\"JSON array value of CA certificates up to the root CA\","
+    "\"sdlist\":{\"cnt\":\"...\",\"sd\":\"...\"},"
+    "\"teeaiklist\":\"...\"}}}";
+
+constexpr uint32_t kHashTextLen = 2 * kSha256Len;
+
+}  // namespace
+
+template <class T>
+static T *allocate_zeroed() {
+  return static_cast<T *>(TEE_Malloc(sizeof(T), TEE_MALLOC_FILL_ZERO));
+}
+
+// ---- The two forms
+
+void dsi_free(dsi_t *dsi) {
+  if (dsi == nullptr) return;
+  json_value_free(dsi->sdl);
+  json_value_free(dsi->spl);
+  json_value_free(dsi->tal);
+  TEE_Free(dsi);
+}
+
+void dsi_json_str_free(dsi_json_str_t *dsi) {
+  if (dsi == nullptr) return;
+  TEE_Free(dsi->sdl_json_str);
+  TEE_Free(dsi->spl_json_str);
+  TEE_Free(dsi->tal_json_str);
+  TEE_Free(dsi);
+}
+
+static bool parse_over(const char *text, JSON_Value **value) {
+  if (text == nullptr) return true;
+  json_value_free(*value);
+  *value = json_parse_string(text);
+  return *value != nullptr;
+}
+
+static void drop_values(dsi_t *dsi) {
+  json_value_free(dsi->sdl);
+  json_value_free(dsi->spl);
+  json_value_free(dsi->tal);
+  *dsi = {};
+}
+
+TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out) {
+  CHECK(in != nullptr && out != nullptr, OTRP_MISSING, "dsi_json_str_2_dsi input is NULL");
+
+  const char *failed = nullptr;
+  if (!parse_over(in->sdl_json_str, &out->sdl)) {
+    failed = "sdl_json_str";
+  } else if (!parse_over(in->spl_json_str, &out->spl)) {
+    failed = "spl_json_str";
+  } else if (!parse_over(in->tal_json_str, &out->tal)) {
+    failed = "tal_json_str";
+  }
+  if (failed == nullptr) return TEE_SUCCESS;
+  drop_values(out);
+  FAIL(OTRP_NO_MEMORY, "dsi_json_str_2_dsi %s string to json fail", failed);
+}
+
+// A value that is not there has no text: the old one stays.
+static bool serialize(const JSON_Value *value, json_text *text) {
+  if (value == nullptr) return true;
+  text->reset(json_serialize_to_string(value));
+  return *text != nullptr;
+}
+
+static void replace_text(json_text *text, char **old) {
+  if (!*text) return;
+  TEE_Free(*old);
+  *old = text->release();
+}
+
+TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out) {
+  CHECK(in != nullptr && out != nullptr, OTRP_MISSING, "dsi_2_dsi_json_str input is NULL");
+
+  json_text sdl;
+  json_text spl;
+  json_text tal;
+  CHECK(serialize(in->sdl, &sdl), OTRP_NO_MEMORY,
+        "dsi_2_dsi_json_str dsi->sdl json to string fail");
+  CHECK(serialize(in->spl, &spl), OTRP_NO_MEMORY,
+        "dsi_2_dsi_json_str dsi->spl json to string fail");
+  CHECK(serialize(in->tal, &tal), OTRP_NO_MEMORY,
+        "dsi_2_dsi_json_str dsi->tal json to string fail");
+  replace_text(&sdl, &out->sdl_json_str);
+  replace_text(&spl, &out->spl_json_str);
+  replace_text(&tal, &out->tal_json_str);
+  return TEE_SUCCESS;
+}
+
+TEE_Result open_dsi(const char *caller, const dsi_json_str_t *dsi, TEE_Result no_memory,
+                    dsi_ptr *working) {
+  working->reset(allocate_zeroed<dsi_t>());
+  CHECK_AS(caller, *working, no_memory, "malloc dsi fail");
+  TRY_LOG_AS(caller, dsi_json_str_2_dsi(dsi, working->get()),
+             "dsi_json_str_2_dsi error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+// ---- Building it from the records
+
+TEE_Result judge_sp_exist(const JSON_Value *spl, const char *spid) {
+  const JSON_Array *entries = json_value_get_array(spl);
+  const size_t num_entries = json_array_get_count(entries);
+  for (size_t i = 0; i < num_entries; ++i) {
+    const char *listed = json_object_get_string(json_array_get_object(entries, i), "spid");
+    CHECK(listed != nullptr, TEE_ERROR_GENERIC, "No spid fieldin sp json");
+    if (strcmp(listed, spid) == 0) return TEE_SUCCESS;
+  }
+  return TEE_ERROR_ITEM_NOT_FOUND;
+}
+
+TEE_Result append_aik_entry(const char *caller, JSON_Value *spl, const char *spid,
+                            const uint8_t *key, uint32_t key_len, const char *spaiktype) {
+  const tee_ptr<char> spaik(base64urlEncodeAddEndZero(key, key_len));
+  CHECK_AS(caller, spaik, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero pubkey fail");
+  json_ptr entry(json_value_init_object());
+  CHECK_AS(caller, entry, TEE_ERROR_OUT_OF_MEMORY,
+           "json_value_init_object teeaiklist_item_value fail");
+  JSON_Object *members = json_value_get_object(entry.get());
+  CHECK_AS(caller, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
+           "json_value_get_object teeaiklist_item_object fail");
+
+  const bool filled =
+      json_object_set_string(members, "spaik", spaik.get()) == JSONSuccess &&
+      json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
+      json_object_set_string(members, "spid", spid) == JSONSuccess &&
+      json_array_append_value(json_value_get_array(spl), entry.get()) == JSONSuccess;
+  CHECK_AS(caller, filled, TEE_ERROR_OUT_OF_MEMORY, "set dsi->spl fail");
+  (void)entry.release();  // the list owns it now
+  return TEE_SUCCESS;
+}
+
+static bool copy_text_member(JSON_Object *entry, const JSON_Object *record, const char *key) {
+  if (json_object_get_string(record, key) == nullptr) return true;
+  json_ptr copy(json_value_deep_copy(json_object_get_value(record, key)));
+  if (!copy || json_object_set_value(entry, key, copy.get()) != JSONSuccess) return false;
+  (void)copy.release();
+  return true;
+}
+
+TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Object *record) {
+  const bool named =
+      copy_text_member(entry, record, "name") && copy_text_member(entry, record, "spid");
+  const bool has_talist = json_object_get_array(record, "talist") != nullptr;
+  json_ptr talist;
+  if (named && has_talist) {
+    talist.reset(json_value_deep_copy(json_object_get_value(record, "talist")));
+  }
+  CHECK_AS(caller, talist && json_object_set_value(entry, "talist", talist.get()) == JSONSuccess,
+           TEE_ERROR_OUT_OF_MEMORY,
+           "json_value_deep_copy talist from sd object fail, no mem for copy");
+  (void)talist.release();
+  return TEE_SUCCESS;
+}
+
+// One AIK entry serves every SD of an SP.
+static TEE_Result dsi_init_sp(dsi_t *dsi, const char *spid) {
+  const TEE_Result judged = judge_sp_exist(dsi->spl, spid);
+  CHECK(judged != TEE_SUCCESS, TEE_SUCCESS, "judge_sp_exist %s", "exist");
+  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist %s", "execution error");
+
+  tee_ptr<uint8_t> key;
+  uint32_t key_len = 0;
+  const TEE_Result result = read_public_aik(spid, out(key), &key_len);
+  CHECK(result != OTRP_SP_NOT_FOUND, TEE_SUCCESS,
+        "init sp_info fail, return success to let tsm to updatesd to create new aik");
+  CHECK(result == TEE_SUCCESS && key && key_len != 0, result,
+        "read_public_aik fail error code 0x%x", result);
+  return append_aik_entry(__func__, dsi->spl, spid, key.get(), key_len, "RSA");
+}
+
+static TEE_Result dsi_init_sd_by_name(dsi_t *dsi, const char *sdname) {
+  json_ptr entry(json_parse_string(kSdEntryTemplate));
+  if (!entry) return TEE_ERROR_OUT_OF_MEMORY;
+  const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
+  CHECK(record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
+        sdname != nullptr ? sdname : "(null)");
+  const JSON_Object *members = json_value_get_object(record.get());
+  const char *spid = json_object_get_string(members, "spid");
+  CHECK(spid != nullptr, TEE_ERROR_GENERIC, "no spid in sd");
+
+  TRY(dsi_init_sp(dsi, spid));
+  TRY(fill_sd_entry(__func__, json_value_get_object(entry.get()), members));
+  if (json_array_append_value(json_value_get_array(dsi->sdl), entry.get()) != JSONSuccess) {
+    return TEE_ERROR_OUT_OF_MEMORY;
+  }
+  (void)entry.release();
+  return TEE_SUCCESS;
+}
+
+static TEE_Result dsi_init_from_pobj(dsi_t *dsi) {
+  json_ptr sd_list;
+  JSON_Object *object = nullptr;
+  JSON_Array *names = nullptr;
+  TRY_LOG(get_sd_list_json_array(&names, &object, out(sd_list)),
+          "get_sd_list_json_array error code: 0x%x");
+  dsi->sdl = json_value_init_array();
+  dsi->spl = json_value_init_array();
+  dsi->tal = json_value_init_array();
+  CHECK(dsi->sdl != nullptr && dsi->spl != nullptr && dsi->tal != nullptr, TEE_ERROR_OUT_OF_MEMORY,
+        "No memory for sdl %p spl %p tal %p", static_cast<void *>(dsi->sdl),
+        static_cast<void *>(dsi->spl), static_cast<void *>(dsi->tal));
+
+  const size_t num_names = json_array_get_count(names);
+  for (size_t i = 0; i < num_names; ++i) {
+    TRY(dsi_init_sd_by_name(dsi, json_array_get_string(names, i)));
+  }
+  return TEE_SUCCESS;
+}
+
+dsi_json_str_t *init_dsi() {
+  const dsi_ptr dsi(allocate_zeroed<dsi_t>());
+  CHECK(dsi, nullptr, "No memory for dsi\n");
+  dsi_text_ptr texts(allocate_zeroed<dsi_json_str_t>());
+  CHECK(texts, nullptr, "No memory for dsi_json_str_t\n");
+  if (dsi_init_from_pobj(dsi.get()) != TEE_SUCCESS) return nullptr;
+  if (dsi_2_dsi_json_str(dsi.get(), texts.get()) != TEE_SUCCESS) return nullptr;
+  return texts.release();
+}
+
+// ---- The document
+
+// A copy of `list` as a member of `into`; `-1`, the setter's status, when it cannot be set.
+static TEE_Result set_copy(const char *caller, JSON_Object *into, const char *key,
+                           const JSON_Value *list, const char *no_memory) {
+  json_ptr copy(json_value_deep_copy(list));
+  CHECK_AS(caller, copy, TEE_ERROR_OUT_OF_MEMORY, "%s", no_memory);
+  const JSON_Status set = json_object_set_value(into, key, copy.get());
+  if (set != JSONSuccess) return static_cast<TEE_Result>(set);
+  (void)copy.release();
+  return TEE_SUCCESS;
+}
+
+static TEE_Result fill_sdlist_info(JSON_Object *tee, const JSON_Value *sdl) {
+  JSON_Object *sdlist = json_object_get_object(tee, "sdlist");
+  const size_t num_sds = json_array_get_count(json_value_get_array(sdl));
+  const JSON_Status set = json_object_set_number(sdlist, "cnt", static_cast<double>(num_sds));
+  if (set != JSONSuccess) return static_cast<TEE_Result>(set);
+  return set_copy(__func__, sdlist, "sd", sdl, "No memory for dsi_sdl_copy");
+}
+
+static TEE_Result fill_teeaiklist_info(JSON_Object *tee, const JSON_Value *spl) {
+  const TEE_Result result =
+      set_copy(__func__, tee, "teeaiklist", spl, "fill_teeaiklist_info json_value_deep_copy fail");
+  CHECK(result == TEE_SUCCESS || result == TEE_ERROR_OUT_OF_MEMORY, TEE_ERROR_OUT_OF_MEMORY,
+        "fill_teeaiklist_info json_object_set_value teeaiklist fail");
+  return result;
+}
+
+JSON_Value *dsi_get_json_dsi(const dsi_json_str_t *dsi) {
+  json_ptr document(json_parse_string(kDsiTemplate));
+  JSON_Object *object = json_value_get_object(document.get());
+  const dsi_ptr working(allocate_zeroed<dsi_t>());
+  CHECK(document && object != nullptr && working, nullptr,
+        "malloc dsi_value %p dsi_object %p dsi %p\n", static_cast<void *>(document.get()),
+        static_cast<void *>(object), static_cast<void *>(working.get()));
+  TEE_Result result = dsi_json_str_2_dsi(dsi, working.get());
+  CHECK(result == TEE_SUCCESS, nullptr, "dsi_json_str_2_dsi error code: 0x%x", result);
+
+  JSON_Object *tee = json_object_get_object(json_object_get_object(object, "dsi"), "tee");
+  result = fill_sdlist_info(tee, working->sdl);
+  CHECK(result == TEE_SUCCESS, nullptr, "fill_sdlist_info faill 0x%x", result);
+  result = fill_teeaiklist_info(tee, working->spl);
+  CHECK(result == TEE_SUCCESS, nullptr, "fill_teeaiklist_info faill 0x%x", result);
+  return document.release();
+}
+
+JSON_Value *construct_dsi() {
+  JSON_Value *document = dsi_get_json_dsi(g_dsi);
+  CHECK(document != nullptr, nullptr, "dsi_get_json_dsi error");
+  if constexpr (TA_TRACE_LEVEL >= TEE_TRACE_DEBUG) {
+    const json_text dump(json_serialize_to_string_pretty(document));
+    tee_trace(__func__, __LINE__, TEE_TRACE_DEBUG, "dsi_json %s", dump ? dump.get() : "");
+  }
+  return document;
+}
+
+// ---- Its hash
+
+static char *dsi_serialize_to_json() {
+  const json_ptr document(dsi_get_json_dsi(g_dsi));
+  CHECK(document, nullptr, "dsi_get_json_dsi error");
+  return json_serialize_to_string(document.get());
+}
+
+static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
+  const char digits[] = "0123456789abcdef";
+  for (uint32_t i = 0; i < len; ++i) {
+    text[2 * i] = digits[bytes[i] >> 4];
+    text[2 * i + 1] = digits[bytes[i] & 15];
+  }
+}
+
+// The digest covers the base64 characters, not the document's text.
+static TEE_Result digest_dsi(const char *caller, uint8_t *digest, uint32_t digest_len) {
+  const json_text text(dsi_serialize_to_json());
+  CHECK_AS(caller, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");
+  const tee_ptr<char> encoded(base64EncodeAddEndZero(reinterpret_cast<const uint8_t *>(text.get()),
+                                                     static_cast<uint32_t>(strlen(text.get()))));
+  CHECK_AS(caller, encoded, TEE_ERROR_OUT_OF_MEMORY,
+           "base64EncodeAddEndZero error now_dsi_str error");
+  return do_digest_with_sha(TEE_ALG_SHA256, encoded.get(),
+                            static_cast<uint32_t>(strlen(encoded.get())), digest, &digest_len);
+}
+
+TEE_Result dsi_validate_dsi_hash(const dsi_json_str_t *dsi, const char *hash) {
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  working.reset();  // it was only to be seen that the texts parse
+
+  const tee_ptr<uint8_t> digest(allocate_bytes(kSha256Len));
+  CHECK(digest, TEE_ERROR_OUT_OF_MEMORY, "no memory for now_dsi_hash");
+  TRY(digest_dsi(__func__, digest.get(), kSha256Len));
+  const tee_ptr<uint8_t> now(allocate_bytes(kHashTextLen));
+  CHECK(now, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero now_dsi_hash error");
+  write_hex(digest.get(), kSha256Len, reinterpret_cast<char *>(now.get()));
+
+  const bool matches = hash != nullptr && strlen(hash) == kHashTextLen &&
+                       equal_in_constant_time(hash, now.get(), kHashTextLen);
+  return matches ? TEE_SUCCESS : TEE_ERROR_MAC_INVALID;
+}
+
+TEE_Result validate_dsihash(const char *hash) {
+  const TEE_Result result = dsi_validate_dsi_hash(g_dsi, hash);
+  if (result == TEE_SUCCESS) return TEE_SUCCESS;
+  return result == TEE_ERROR_MAC_INVALID ? OTRP_DSI_MISMATCH : OTRP_DSI_HASH_FAILED;
+}

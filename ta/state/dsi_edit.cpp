@@ -1,0 +1,126 @@
+// Edits of the DSI's entries.
+#include <string.h>
+
+#include "failure.h"
+#include "record_names.h"
+#include "state/dsi.h"
+#include "state/object_store.h"
+
+static TEE_Result close_dsi(const char *caller, const dsi_t *working, dsi_json_str_t *dsi) {
+  TRY_LOG_AS(caller, dsi_2_dsi_json_str(working, dsi), "dsi_2_dsi_json_str error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+// Finds the first entry whose member `key` is `value`; `*index` is the number of entries when
+// none is. OTRP_MISSING when an entry on the way is no object.
+static TEE_Result find_entry(const JSON_Array *entries, const char *key, const char *value,
+                             size_t *index) {
+  const size_t num_entries = json_array_get_count(entries);
+  for (size_t i = 0; i < num_entries; ++i) {
+    const JSON_Object *entry = json_array_get_object(entries, i);
+    if (entry == nullptr) return OTRP_MISSING;
+    const char *member = json_object_get_string(entry, key);
+    if (member != nullptr && value != nullptr && strcmp(member, value) == 0) {
+      *index = i;
+      return TEE_SUCCESS;
+    }
+  }
+  *index = num_entries;
+  return TEE_SUCCESS;
+}
+
+// ---- AIK entries
+
+TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,
+                          uint32_t key_len, const char *spaiktype) {
+  CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
+        TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
+
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  const TEE_Result judged = judge_sp_exist(working->spl, spid);
+  CHECK(judged != TEE_SUCCESS, TEE_SUCCESS, "judge_sp_exist %s", "exist");
+  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist %s", "execution error");
+  TRY(append_aik_entry(__func__, working->spl, spid, key, key_len, spaiktype));
+  return close_dsi(__func__, working.get(), dsi);
+}
+
+TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  JSON_Array *entries = json_value_get_array(working->spl);
+  size_t index = 0;
+  TRY(find_entry(entries, "spid", spid, &index));
+  (void)json_array_remove(entries, index);  // no entry of that index, nothing removed
+  return close_dsi(__func__, working.get(), dsi);
+}
+
+// ---- SD entries
+
+TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, uint32_t *found) {
+  *found = 0;
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  const JSON_Array *entries = json_value_get_array(working->sdl);
+  size_t index = 0;
+  TRY(find_entry(entries, "spid", spid, &index));
+  *found = index < json_array_get_count(entries) ? 1 : 0;
+  return TEE_SUCCESS;
+}
+
+TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
+  json_ptr entry(json_value_init_object());
+  CHECK(entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
+  JSON_Object *members = json_value_get_object(entry.get());
+  CHECK(members != nullptr, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_object\n");
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+
+  const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
+  CHECK(record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
+        sdname != nullptr ? sdname : "(null)");
+  TRY(fill_sd_entry(__func__, members, json_value_get_object(record.get())));
+  const JSON_Status appended =
+      json_array_append_value(json_value_get_array(working->sdl), entry.get());
+  if (appended != JSONSuccess) return static_cast<TEE_Result>(appended);
+  (void)entry.release();
+  return close_dsi(__func__, working.get(), dsi);
+}
+
+TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname) {
+  TRY_LOG(dsi_load_sd_by_name(g_dsi, sdname), "dsi_load_sd_by_name error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
+  dsi_ptr working;
+  TRY(open_dsi(__func__, g_dsi, OTRP_NO_MEMORY, &working));
+  JSON_Array *entries = json_value_get_array(working->sdl);
+  size_t index = 0;
+  TRY(find_entry(entries, "name", sdname, &index));
+  CHECK(index < json_array_get_count(entries), OTRP_MISSING, "delete dsi sd with name fail");
+  if (json_array_remove(entries, index) != JSONSuccess) return OTRP_NO_MEMORY;
+  return close_dsi(__func__, working.get(), g_dsi);
+}
+
+TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
+  dsi_ptr working;
+  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  JSON_Array *entries = json_value_get_array(working->sdl);
+  CHECK(entries != nullptr, TEE_ERROR_BAD_FORMAT, "get array from dsi->sdl is NULL");
+
+  const size_t num_entries = json_array_get_count(entries);
+  for (size_t i = 0; i < num_entries; ++i) {
+    const JSON_Object *entry = json_array_get_object(entries, i);
+    CHECK(entry != nullptr, OTRP_RESPONSE_FAILED, "json_array_get_object idx %u error",
+          static_cast<unsigned>(i));
+    const char *name = json_object_get_string(entry, "name");
+    CHECK(name != nullptr, OTRP_RESPONSE_FAILED, "json_object_get_string from sdl item is null");
+    if (sdname != nullptr && strcmp(name, sdname) == 0) {
+      CHECK(json_array_remove(entries, i) == JSONSuccess, OTRP_RESPONSE_FAILED,
+            "json array remove object fail");
+      break;
+    }
+  }
+  return close_dsi(__func__, working.get(), dsi);
+}

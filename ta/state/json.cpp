@@ -1,0 +1,398 @@
+#include "state/json.h"
+
+#include "state/json_node.h"
+
+// ---- Blocks
+
+namespace {
+
+struct block_header {
+  alignas(JSON_Value) uint32_t len;  // of the whole block
+};
+
+}  // namespace
+
+JSON_Value *new_block(const json_extent &extent, json_type type, json_room *room) {
+  const uint64_t nodes_len = extent.num_nodes * sizeof(JSON_Value) +
+                             extent.num_arrays * (sizeof(JSON_Array) - sizeof(JSON_Value));
+  const uint64_t len = sizeof(block_header) + nodes_len + extent.text_len;
+  if (len > UINT32_MAX) return nullptr;
+  uint8_t *block = allocate_bytes(static_cast<uint32_t>(len));
+  if (block == nullptr) return nullptr;
+  reinterpret_cast<block_header *>(block)->len = static_cast<uint32_t>(len);
+  room->nodes = block + sizeof(block_header);
+  room->texts = reinterpret_cast<char *>(room->nodes + nodes_len);
+  JSON_Value *first = new_node(room, type);
+  first->flags = kBeginsBlock;
+  return first;
+}
+
+JSON_Value *new_node(json_room *room, json_type type) {
+  auto *node = reinterpret_cast<JSON_Value *>(room->nodes);
+  node->type = type;
+  room->nodes += type == kJsonArray ? sizeof(JSON_Array) : sizeof(JSON_Value);
+  return node;
+}
+
+static void release_node(JSON_Value *node) {
+  if ((node->flags & kOwnsName) != 0) wipe_and_free_text(node->name);
+  if ((node->flags & kOwnsText) != 0) wipe_and_free_text(node->text);
+  if ((node->flags & kBeginsBlock) == 0) return;
+  auto *block = reinterpret_cast<block_header *>(node) - 1;
+  wipe(block, block->len);
+  TEE_Free(block);
+}
+
+// Children go before their parent, so that a block goes after everything that hangs from it.
+void json_value_free(JSON_Value *value) {
+  if (value == nullptr || value->next != nullptr) return;
+  for (JSON_Value *at = value;;) {
+    while (has_children(at)) at = at->first;
+    for (bool last = true; last;) {
+      JSON_Value *next = at->next;
+      last = is_last_child(at);
+      const bool done = at == value;
+      release_node(at);
+      if (done) return;
+      at = next;
+    }
+  }
+}
+
+static JSON_Value *new_single(json_type type) {
+  json_room room;
+  return new_block({1, type == kJsonArray ? 1u : 0u, 0}, type, &room);
+}
+
+JSON_Value *json_value_init_object() {
+  return new_single(kJsonObject);
+}
+
+JSON_Value *json_value_init_array() {
+  return new_single(kJsonArray);
+}
+
+// ---- Copies
+
+static json_extent measure_tree(const JSON_Value *root) {
+  json_extent extent = {};
+  for (const JSON_Value *at = root;;) {
+    ++extent.num_nodes;
+    if (at->type == kJsonArray) ++extent.num_arrays;
+    if (at->type == kJsonString) extent.text_len += uint64_t{at->count} + 1;
+    if (at != root && at->name != nullptr) extent.text_len += strlen(at->name) + 1;
+    if (has_children(at)) {
+      at = at->first;
+      continue;
+    }
+    while (at != root && is_last_child(at)) at = at->next;
+    if (at == root) return extent;
+    at = at->next;
+  }
+}
+
+static void copy_content(const JSON_Value *from, JSON_Value *to, json_room *room) {
+  if (from->type == kJsonNumber) to->number = from->number;
+  if (from->type != kJsonString) return;
+  to->text = new_text(room, from->text, from->count);
+  to->count = from->count;
+}
+
+static JSON_Value *copy_child(const JSON_Value *from, JSON_Value *parent, JSON_Value *last,
+                              json_room *room) {
+  JSON_Value *child = new_node(room, from->type);
+  if (from->name != nullptr) {
+    child->name = new_text(room, from->name, static_cast<uint32_t>(strlen(from->name)));
+    child->name_mark = from->name_mark;
+  }
+  copy_content(from, child, room);
+  append_child(parent, last, child);
+  return child;
+}
+
+JSON_Value *json_value_deep_copy(const JSON_Value *value) {
+  if (value == nullptr) return nullptr;
+  json_room room;
+  JSON_Value *to = new_block(measure_tree(value), value->type, &room);
+  if (to == nullptr) return nullptr;
+  copy_content(value, to, &room);
+  for (const JSON_Value *from = value;;) {
+    if (has_children(from)) {
+      from = from->first;
+      to = copy_child(from, to, nullptr, &room);
+      continue;
+    }
+    // What has just been copied is a last child; its `next` is its parent.
+    for (; from != value && is_last_child(from); from = from->next) to = to->next;
+    if (from == value) return to;
+    from = from->next;
+    to = copy_child(from, to->next, to, &room);
+  }
+}
+
+// ---- Views
+
+JSON_Object *json_value_get_object(const JSON_Value *value) {
+  if (value == nullptr || value->type != kJsonObject) return nullptr;
+  return reinterpret_cast<JSON_Object *>(const_cast<JSON_Value *>(value));
+}
+
+JSON_Array *json_value_get_array(const JSON_Value *value) {
+  if (value == nullptr || value->type != kJsonArray) return nullptr;
+  return reinterpret_cast<JSON_Array *>(const_cast<JSON_Value *>(value));
+}
+
+static const char *value_text(const JSON_Value *value) {
+  return value != nullptr && value->type == kJsonString ? value->text : nullptr;
+}
+
+// Length, first and last character tell most names apart without looking at them.
+static uint16_t mark_of(const char *name, uint32_t len) {
+  if (len == 0) return 0;
+  const uint32_t first = static_cast<uint8_t>(name[0]);
+  const uint32_t last = static_cast<uint8_t>(name[len - 1]);
+  return static_cast<uint16_t>((len << 8) ^ (first << 4) ^ last);
+}
+
+void set_name(JSON_Value *member, char *name, uint32_t len) {
+  member->name = name;
+  member->name_mark = mark_of(name, len);
+}
+
+JSON_Value *find_member(const JSON_Value *object, const char *name, uint32_t len,
+                        JSON_Value **last) {
+  const uint16_t mark = mark_of(name, len);
+  *last = nullptr;
+  JSON_Value *at = object->first;
+  for (uint32_t i = 0; i < object->count; ++i, at = at->next) {
+    if (at->name_mark == mark && strcmp(at->name, name) == 0) return at;
+    *last = at;
+  }
+  return nullptr;
+}
+
+JSON_Value *json_object_get_value(const JSON_Object *object, const char *name) {
+  if (object == nullptr || name == nullptr) return nullptr;
+  JSON_Value *last;
+  return find_member(&object->node, name, static_cast<uint32_t>(strlen(name)), &last);
+}
+
+const char *json_object_get_string(const JSON_Object *object, const char *name) {
+  return value_text(json_object_get_value(object, name));
+}
+
+JSON_Object *json_object_get_object(const JSON_Object *object, const char *name) {
+  return json_value_get_object(json_object_get_value(object, name));
+}
+
+JSON_Array *json_object_get_array(const JSON_Object *object, const char *name) {
+  return json_value_get_array(json_object_get_value(object, name));
+}
+
+size_t json_array_get_count(const JSON_Array *array) {
+  return array != nullptr ? array->node.count : 0;
+}
+
+// The element at `index`, which must be there. Starts from where the last walk ended, if it can.
+static JSON_Value *walk_to(const JSON_Array *array, uint32_t index) {
+  if (array->walked_to == nullptr || array->walked_index > index) {
+    array->walked_to = array->node.first;
+    array->walked_index = 0;
+  }
+  for (; array->walked_index < index; ++array->walked_index) {
+    array->walked_to = array->walked_to->next;
+  }
+  return array->walked_to;
+}
+
+static JSON_Value *element(const JSON_Array *array, size_t index) {
+  if (index >= json_array_get_count(array)) return nullptr;
+  return walk_to(array, static_cast<uint32_t>(index));
+}
+
+const char *json_array_get_string(const JSON_Array *array, size_t index) {
+  return value_text(element(array, index));
+}
+
+JSON_Object *json_array_get_object(const JSON_Array *array, size_t index) {
+  return json_value_get_object(element(array, index));
+}
+
+// ---- Edits
+
+// RFC 3629: no overlong forms, no surrogates, nothing above U+10FFFF.
+static bool is_utf8(const char *text) {
+  const auto *at = reinterpret_cast<const uint8_t *>(text);
+  const uint8_t *end = at + strlen(text);
+  while (at != end) {
+    if (end - at >= 8 && (load_eight(reinterpret_cast<const char *>(at)) & kHighBits) == 0) {
+      at += 8;
+      continue;
+    }
+    const uint8_t lead = *at++;
+    if (lead < 0x80) continue;
+    if (lead < 0xC2 || lead > 0xF4) return false;
+    // The second byte alone tells overlong forms, surrogates and what lies beyond the last plane.
+    const uint8_t low = lead == 0xE0 ? 0xA0 : lead == 0xF0 ? 0x90 : 0x80;
+    const uint8_t high = lead == 0xED ? 0x9F : lead == 0xF4 ? 0x8F : 0xBF;
+    if (*at < low || *at > high) return false;
+    ++at;
+    for (int more = lead < 0xE0 ? 0 : lead < 0xF0 ? 1 : 2; more > 0; --more, ++at) {
+      if ((*at & 0xC0) != 0x80) return false;
+    }
+  }
+  return true;
+}
+
+// A value in a block of its own, together with its name and its text, where it has them.
+static JSON_Value *new_value(json_type type, const char *name, const char *text) {
+  const size_t name_len = name != nullptr ? strlen(name) : 0;
+  const size_t text_len = text != nullptr ? strlen(text) : 0;
+  json_extent extent = {1, 0, 0};
+  if (name != nullptr) extent.text_len += uint64_t{name_len} + 1;
+  if (text != nullptr) extent.text_len += uint64_t{text_len} + 1;
+  json_room room;
+  JSON_Value *value = new_block(extent, type, &room);
+  if (value == nullptr) return nullptr;
+  if (name != nullptr) {
+    const auto len = static_cast<uint32_t>(name_len);
+    set_name(value, new_text(&room, name, len), len);
+  }
+  if (text != nullptr) {
+    value->count = static_cast<uint32_t>(text_len);
+    value->text = new_text(&room, text, value->count);
+  }
+  return value;
+}
+
+// Whether `container` is `value` or lies in it: a tree must not be hung into itself.
+static bool holds(const JSON_Value *value, const JSON_Value *container) {
+  if (!has_children(value)) return value == container;
+  const JSON_Value *at = container;
+  while (at->next != nullptr && at != value) at = at->next;
+  return at == value;
+}
+
+namespace {
+
+// Where a member of some name goes: in place of `old`, or, when that is NULL, behind `last`.
+struct member_place {
+  JSON_Value *old;
+  JSON_Value *last;  // the member before `old`, or the last one; NULL when there is none
+};
+
+}  // namespace
+
+// False when the object is full.
+static bool find_place(const JSON_Object *object, const char *name, member_place *place) {
+  place->old = find_member(&object->node, name, static_cast<uint32_t>(strlen(name)), &place->last);
+  return place->old != nullptr || object->node.count < kMaxMembers;
+}
+
+static void detach_and_free(JSON_Value *child) {
+  child->next = nullptr;
+  json_value_free(child);
+}
+
+// `child` comes behind `before`, which is NULL for the first place, and before `next`.
+static void link_child(JSON_Value *parent, JSON_Value *before, JSON_Value *child) {
+  (before != nullptr ? before->next : parent->first) = child;
+}
+
+static void put_member(JSON_Object *object, const member_place &place, JSON_Value *member) {
+  JSON_Value *parent = &object->node;
+  if (place.old == nullptr) {
+    append_child(parent, place.last, member);
+    return;
+  }
+  if (is_last_child(place.old)) {
+    make_last(parent, member);
+  } else {
+    lead_to(member, place.old->next);
+  }
+  link_child(parent, place.last, member);
+  detach_and_free(place.old);
+}
+
+JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Value *value) {
+  if (object == nullptr || name == nullptr || value == nullptr) return JSONFailure;
+  member_place place;
+  if (value->next != nullptr || holds(value, &object->node)) return JSONFailure;
+  if (!find_place(object, name, &place)) return JSONFailure;
+
+  const size_t len = strlen(name);
+  if (len >= UINT32_MAX) return JSONFailure;
+  auto *copy = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(len) + 1));
+  if (copy == nullptr) return JSONFailure;
+  memcpy(copy, name, len);
+  set_name(value, copy, static_cast<uint32_t>(len));
+  value->flags |= kOwnsName;
+  put_member(object, place, value);
+  return JSONSuccess;
+}
+
+JSON_Status json_object_set_string(JSON_Object *object, const char *name, const char *string) {
+  if (object == nullptr || name == nullptr || string == nullptr) return JSONFailure;
+  member_place place;
+  if (!is_utf8(string) || !find_place(object, name, &place)) return JSONFailure;
+  JSON_Value *member = new_value(kJsonString, name, string);
+  if (member == nullptr) return JSONFailure;
+  put_member(object, place, member);
+  return JSONSuccess;
+}
+
+JSON_Status json_object_set_number(JSON_Object *object, const char *name, double number) {
+  if (object == nullptr || name == nullptr || number - number != 0) return JSONFailure;
+  member_place place;
+  if (!find_place(object, name, &place)) return JSONFailure;
+  JSON_Value *member = new_value(kJsonNumber, name, nullptr);
+  if (member == nullptr) return JSONFailure;
+  member->number = number;
+  put_member(object, place, member);
+  return JSONSuccess;
+}
+
+static void append(JSON_Array *array, JSON_Value *value) {
+  const uint32_t count = array->node.count;
+  append_child(&array->node, count != 0 ? walk_to(array, count - 1) : nullptr, value);
+}
+
+JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value) {
+  if (array == nullptr || value == nullptr || array->node.count == kMaxElements) return JSONFailure;
+  if (value->next != nullptr || holds(value, &array->node)) return JSONFailure;
+  append(array, value);
+  return JSONSuccess;
+}
+
+JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
+  if (array == nullptr || string == nullptr || array->node.count == kMaxElements)
+    return JSONFailure;
+  if (!is_utf8(string)) return JSONFailure;
+  JSON_Value *value = new_value(kJsonString, nullptr, string);
+  if (value == nullptr) return JSONFailure;
+  append(array, value);
+  return JSONSuccess;
+}
+
+JSON_Status json_array_remove(JSON_Array *array, size_t index) {
+  if (index >= json_array_get_count(array)) return JSONFailure;
+  const auto at = static_cast<uint32_t>(index);
+  const uint32_t last_index = array->node.count - 1;
+  JSON_Value *before = at != 0 ? walk_to(array, at - 1) : nullptr;
+  JSON_Value *removed = walk_to(array, at);
+  if (at == last_index) {
+    if (before != nullptr) make_last(&array->node, before);
+  } else {
+    JSON_Value *end = walk_to(array, last_index - 1);
+    JSON_Value *last = end->next;
+    if (end != removed) {
+      make_last(&array->node, end);
+      lead_to(last, removed->next);
+    }
+    link_child(&array->node, before, last);
+  }
+  --array->node.count;
+  array->walked_to = nullptr;
+  detach_and_free(removed);
+  return JSONSuccess;
+}

@@ -1,0 +1,90 @@
+/// The JSON document model: every document that is stored, hashed, signed, encrypted or sent is
+/// parsed, built, edited and serialized here.
+///
+/// An object keeps its members in the order in which they were first added; names are unique in it.
+/// A value belongs to the caller until it is set into an object or appended to an array; from then
+/// on it lives and dies with that document. Pointers to it stay valid over that, and until it is
+/// removed, replaced or freed. What json_*_get_* returns is borrowed.
+///
+/// Texts are NUL-terminated. A failure is NULL or JSONFailure, whatever it is due to: no memory, a
+/// NULL argument, a limit; it changes nothing and is not logged. An edit needs no memory but for
+/// the value that it adds. All memory is wiped before it is freed.
+///
+/// Limits: a parsed value lies at most 19 containers deep; an object holds at most 960 members, an
+/// array at most 122880 elements. No function needs stack that grows with a document.
+#ifndef JSON_H
+#define JSON_H
+
+#include <stddef.h>
+
+#include "ownership.h"
+
+struct JSON_Value;
+struct JSON_Object;
+struct JSON_Array;
+
+enum JSON_Status : int { JSONSuccess = 0, JSONFailure = -1 };
+
+/// Parses the value that `text` starts with, white space aside; what comes after it is ignored.
+JSON_Value *json_parse_string(const char *text);
+
+JSON_Value *json_value_init_object();
+JSON_Value *json_value_init_array();
+
+/// A document of its own, also when `value` is a part of one.
+JSON_Value *json_value_deep_copy(const JSON_Value *value);
+
+/// Frees a whole document. NULL is accepted.
+void json_value_free(JSON_Value *value);
+
+using json_ptr = owned<JSON_Value *, json_value_free>;
+
+// ---- Views: NULL when the value is of another type or not there
+
+JSON_Object *json_value_get_object(const JSON_Value *value);
+JSON_Array *json_value_get_array(const JSON_Value *value);
+
+JSON_Value *json_object_get_value(const JSON_Object *object, const char *name);
+const char *json_object_get_string(const JSON_Object *object, const char *name);
+JSON_Object *json_object_get_object(const JSON_Object *object, const char *name);
+JSON_Array *json_object_get_array(const JSON_Object *object, const char *name);
+
+/// 0 for NULL.
+size_t json_array_get_count(const JSON_Array *array);
+
+/// A walk by ascending index takes constant time per step.
+const char *json_array_get_string(const JSON_Array *array, size_t index);
+JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
+
+// ---- Edits
+
+/// A member of that name is replaced where it stands; a new one goes to the end.
+///
+/// json_object_set_value takes `value` over only when it succeeds. It refuses one that is part of
+/// a document already, or that holds `object`. A string must be well-formed UTF-8, a number finite.
+[[nodiscard]] JSON_Status json_object_set_value(JSON_Object *object, const char *name,
+                                                JSON_Value *value);
+[[nodiscard]] JSON_Status json_object_set_string(JSON_Object *object, const char *name,
+                                                 const char *string);
+[[nodiscard]] JSON_Status json_object_set_number(JSON_Object *object, const char *name,
+                                                 double number);
+
+/// The same for the end of an array.
+[[nodiscard]] JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value);
+[[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
+
+/// Frees an element; the last element takes its place.
+[[nodiscard]] JSON_Status json_array_remove(JSON_Array *array, size_t index);
+
+// ---- Texts
+
+/// A new text without white space outside strings. Slashes are escaped, control characters that
+/// have no letter of their own and bytes above 0x7F stand as they are.
+char *json_serialize_to_string(const JSON_Value *value);
+
+/// The same, one member or element a line, indented by four spaces a level.
+char *json_serialize_to_string_pretty(const JSON_Value *value);
+
+using json_text = secret_text;
+
+#endif

@@ -1,0 +1,162 @@
+/// Inside of the JSON document model: how a document lies in memory.
+///
+/// A value is a node. A container points at its first child, each child at the next one, and the
+/// last child back at its parent, so that a walk over a tree of any depth needs no stack:
+///
+///     parent --first--> child --next--> child --next--> last child --next--> parent
+///
+/// Nodes and texts are made in blocks: a parsed or copied document is one, a value that is set
+/// later another. The block of a value that moves into another document stays what it is, and is
+/// freed with the node that begins it.
+///
+///     length | node that begins it | more nodes | texts
+#ifndef JSON_NODE_H
+#define JSON_NODE_H
+
+#include "state/json.h"
+
+constexpr uint32_t kMaxDepth = 19;  // containers that a parsed value may lie in
+constexpr uint32_t kMaxMembers = 960;
+constexpr uint32_t kMaxElements = 122880;
+
+enum json_type : uint8_t {
+  kJsonNull,
+  kJsonFalse,
+  kJsonTrue,
+  kJsonNumber,
+  kJsonString,
+  kJsonArray,
+  kJsonObject,
+};
+
+enum json_flag : uint8_t {
+  kLastChild = 1,
+  kBeginsBlock = 2,
+  kOwnsName = 4,  // the name, or the text, is an allocation of its own
+  kOwnsText = 8,
+};
+
+struct JSON_Value {
+  JSON_Value *next;  // NULL: part of no document
+  char *name;        // NULL: not a member
+  union {
+    double number;
+    char *text;
+    JSON_Value *first;
+  };
+  uint32_t count;      // children, or bytes of the text
+  uint16_t name_mark;  // names with different marks differ
+  json_type type;
+  uint8_t flags;
+};
+static_assert(sizeof(JSON_Value) <= 32);
+
+struct JSON_Object {
+  JSON_Value node;
+};
+
+struct JSON_Array {
+  JSON_Value node;
+  mutable JSON_Value *walked_to;  // the element that was asked for last; NULL: none
+  mutable uint32_t walked_index;
+};
+static_assert(alignof(JSON_Array) == alignof(JSON_Value));
+
+inline bool is_container(const JSON_Value *value) {
+  return value->type >= kJsonArray;
+}
+inline bool has_children(const JSON_Value *value) {
+  return is_container(value) && value->count != 0;
+}
+inline bool is_last_child(const JSON_Value *value) {
+  return (value->flags & kLastChild) != 0;
+}
+
+// ---- Blocks
+
+/// What a block is to hold.
+struct json_extent {
+  uint64_t num_nodes;
+  uint64_t num_arrays;  // of the nodes
+  uint64_t text_len;    // all texts and names, with their NULs
+};
+
+/// What of a block is not used yet.
+struct json_room {
+  uint8_t *nodes;
+  char *texts;
+};
+
+/// A new block; its first node is a value that belongs to no document. NULL: no memory.
+JSON_Value *new_block(const json_extent &extent, json_type type, json_room *room);
+
+JSON_Value *new_node(json_room *room, json_type type);
+
+/// The copy is NUL-terminated.
+inline char *new_text(json_room *room, const char *text, uint32_t len) {
+  char *copy = room->texts;
+  memcpy(copy, text, len);
+  copy[len] = 0;
+  room->texts += len + 1;
+  return copy;
+}
+
+// ---- Trees
+
+void set_name(JSON_Value *member, char *name, uint32_t len);
+
+/// `*last` receives the member before the one that is found, or else the object's last member; NULL
+/// when that is none.
+JSON_Value *find_member(const JSON_Value *object, const char *name, uint32_t len,
+                        JSON_Value **last);
+
+inline void make_last(JSON_Value *parent, JSON_Value *child) {
+  child->next = parent;
+  child->flags |= kLastChild;
+}
+
+inline void lead_to(JSON_Value *child, JSON_Value *sibling) {
+  child->next = sibling;
+  child->flags &= static_cast<uint8_t>(~kLastChild);
+}
+
+/// `last` is the parent's last child so far; NULL when it has none.
+inline void append_child(JSON_Value *parent, JSON_Value *last, JSON_Value *child) {
+  make_last(parent, child);
+  ++parent->count;
+  if (last != nullptr) {
+    lead_to(last, child);
+  } else {
+    parent->first = child;
+  }
+}
+
+// ---- Characters
+
+/// Eight characters at a time, whatever the byte order.
+constexpr uint64_t kEachByte = 0x0101010101010101;
+constexpr uint64_t kHighBits = 0x8080808080808080;
+
+inline uint64_t load_eight(const char *at) {
+  uint64_t word;
+  memcpy(&word, at, sizeof word);
+  return word;
+}
+
+// x - 1 borrows into the high bit of a byte only when the byte, or one that precedes it, is zero.
+inline uint64_t zero_bytes(uint64_t word) {
+  return word - kEachByte;
+}
+
+/// Whether any of them is a control character, a quote or a backslash.
+inline bool any_special(uint64_t word) {
+  const uint64_t found = (word - kEachByte * 0x20) | zero_bytes(word ^ (kEachByte * '"')) |
+                         zero_bytes(word ^ (kEachByte * '\\'));
+  return (found & ~word & kHighBits) != 0;
+}
+
+inline bool is_special(char c) {
+  return static_cast<uint8_t>(c) < 0x20 || c == '"' || c == '\\';
+}
+
+#endif

@@ -1,0 +1,415 @@
+#include "failure.h"
+#include "state/json_node.h"
+
+namespace {
+
+struct parser {
+  const char *at;
+  const char *end;  // its NUL
+  json_room room;
+};
+
+struct decoded_string {
+  char *text;  // in the block, or `own`
+  uint32_t len;
+  secret_text own;
+};
+
+}  // namespace
+
+static bool is_space(char c) {
+  return c == ' ' || (c >= '\t' && c <= '\r');
+}
+
+static const char *skip_space(const char *at) {
+  while (is_space(*at)) ++at;
+  return at;
+}
+
+// ---- First pass: what the document needs
+//
+// It reads no grammar. On a text that is no JSON it may count anything, but the second pass stops
+// at the first fault, and up to there every node and every text has been counted.
+
+// From behind the opening quote to behind the closing one; NULL when there is none.
+static const char *measure_string(const char *at, const char *end, json_extent *extent) {
+  for (;;) {
+    const char *start = at;
+    while (end - at >= 8 && !any_special(load_eight(at))) at += 8;
+    while (!is_special(*at)) ++at;
+    extent->text_len += static_cast<uint64_t>(at - start) + 1;
+    if (*at == '"') return at + 1;
+    if (*at != '\\' || at[1] == 0) return nullptr;
+    at += 2;
+  }
+}
+
+static bool measure(const char *at, const char *end, json_extent *extent) {
+  *extent = {1, 0, 0};
+  uint32_t depth = 0;
+  do {
+    switch (*at++) {
+      case '"':
+        at = measure_string(at, end, extent);
+        if (at == nullptr) return false;
+        break;
+      case '[':
+        ++extent->num_arrays;
+        [[fallthrough]];
+      case '{':
+        ++depth;
+        at = skip_space(at);
+        if (*at == ']' || *at == '}') break;
+        if (depth > kMaxDepth) return false;
+        ++extent->num_nodes;
+        break;
+      case ',':
+        ++extent->num_nodes;
+        break;
+      case ']':
+      case '}':
+        if (depth-- == 0) return false;
+        break;
+      case 0:
+        return false;
+    }
+  } while (depth != 0);
+  return true;
+}
+
+// ---- Strings
+
+static bool take_code_unit(parser *in, uint32_t *unit) {
+  if (in->at[0] != '\\' || in->at[1] != 'u') return false;
+  in->at += 2;
+  *unit = 0;
+  for (int i = 0; i < 4; ++i) {
+    const char c = *in->at++;
+    const char lower = static_cast<char>(c | 0x20);
+    if (c >= '0' && c <= '9') {
+      *unit = *unit * 16 + static_cast<uint32_t>(c - '0');
+    } else if (lower >= 'a' && lower <= 'f') {
+      *unit = *unit * 16 + static_cast<uint32_t>(lower - 'a' + 10);
+    } else {
+      return false;
+    }
+  }
+  return true;
+}
+
+static char *put_utf8(char *to, uint32_t code) {
+  if (code < 0x80) {
+    *to++ = static_cast<char>(code);
+    return to;
+  }
+  const int num_more = code < 0x800 ? 1 : code < 0x10000 ? 2 : 3;
+  const uint32_t lead = code < 0x800 ? 0xC0 : code < 0x10000 ? 0xE0 : 0xF0;
+  *to++ = static_cast<char>(lead | (code >> (6 * num_more)));
+  for (int i = num_more - 1; i >= 0; --i) {
+    *to++ = static_cast<char>(0x80 | ((code >> (6 * i)) & 0x3F));
+  }
+  return to;
+}
+
+static bool take_unicode_escape(parser *in, char **to) {
+  uint32_t code = 0;
+  if (!take_code_unit(in, &code)) return false;
+  if (code >= 0xDC00 && code <= 0xDFFF) return false;
+  if (code >= 0xD800 && code <= 0xDBFF) {
+    uint32_t low = 0;
+    if (!take_code_unit(in, &low) || low < 0xDC00 || low > 0xDFFF) return false;
+    code = 0x10000 + ((code - 0xD800) << 10) + (low - 0xDC00);
+  }
+  *to = put_utf8(*to, code);
+  return true;
+}
+
+static char escaped_character(char letter) {
+  switch (letter) {
+    case '"':
+    case '\\':
+    case '/':
+      return letter;
+    case 'b':
+      return '\b';
+    case 'f':
+      return '\f';
+    case 'n':
+      return '\n';
+    case 'r':
+      return '\r';
+    case 't':
+      return '\t';
+    default:
+      return 0;
+  }
+}
+
+static bool take_escape(parser *in, char **to) {
+  if (in->at[1] == 'u') return take_unicode_escape(in, to);
+  const char c = escaped_character(in->at[1]);
+  if (c == 0) return false;
+  *(*to)++ = c;
+  in->at += 2;
+  return true;
+}
+
+static char *take_plain(parser *in, char *to) {
+  const char *at = in->at;
+  for (; in->end - at >= 8; at += 8, to += 8) {
+    const uint64_t word = load_eight(at);
+    if (any_special(word)) break;
+    memcpy(to, &word, sizeof word);
+  }
+  while (!is_special(*at)) *to++ = *at++;
+  in->at = at;
+  return to;
+}
+
+// Decodes a string, from behind its opening quote, into the block. One that shrinks to half of its
+// raw size moves out, and leaves its place in the block to the next.
+static bool process_string(parser *in, decoded_string *string) {
+  const char *raw = in->at;
+  char *text = in->room.texts;
+  char *to = take_plain(in, text);
+  const bool has_escapes = *in->at == '\\';
+  while (*in->at == '\\') {
+    if (!take_escape(in, &to)) return false;
+    to = take_plain(in, to);
+  }
+  if (*in->at != '"') return false;
+  *to = 0;
+  string->text = text;
+  // An escaped NUL ends the text.
+  string->len = static_cast<uint32_t>(has_escapes ? strlen(text) : static_cast<size_t>(to - text));
+
+  const auto initial_size = static_cast<uint64_t>(in->at++ - raw) + 1;
+  const uint32_t final_size = string->len + 1;
+  CHECK(final_size <= initial_size, false,
+        "%s: Unexpected case. Final size(%d) > initial_size(%d)\n", __func__,
+        static_cast<int>(final_size), static_cast<int>(initial_size));
+  if (final_size > initial_size / 2) {
+    in->room.texts += final_size;
+    return true;
+  }
+  string->own.reset(reinterpret_cast<char *>(allocate_bytes(final_size)));
+  CHECK(string->own, false, "%s: bad malloc. Final size(%d) initial_size(%d)", __func__,
+        static_cast<int>(final_size), static_cast<int>(initial_size));
+  memcpy(string->own.get(), text, final_size);
+  string->text = string->own.get();
+  return true;
+}
+
+// ---- Numbers
+
+static constexpr double kPowersOfTen[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,
+                                          1e8,  1e9,  1e10, 1e11, 1e12, 1e13, 1e14, 1e15,
+                                          1e16, 1e17, 1e18, 1e19, 1e20, 1e21, 1e22};
+static constexpr int64_t kLastPower = 22;  // the last that a double holds exactly
+
+// Exact when `digits` has at most 15 digits and the exponent is in the table.
+static double scale(uint64_t digits, int64_t exponent) {
+  auto value = static_cast<double>(digits);
+  if (digits == 0 || exponent < -400) return 0;  // beyond the range of a double
+  if (exponent > 400) exponent = 400;
+  for (; exponent > kLastPower; exponent -= kLastPower) value *= kPowersOfTen[kLastPower];
+  for (; exponent < -kLastPower; exponent += kLastPower) value /= kPowersOfTen[kLastPower];
+  return exponent < 0 ? value / kPowersOfTen[-exponent] : value * kPowersOfTen[exponent];
+}
+
+namespace {
+
+struct decimal {
+  uint64_t digits;
+  int64_t exponent;
+};
+
+}  // namespace
+
+static bool is_digit(char c) {
+  return c >= '0' && c <= '9';
+}
+
+// Digits that no double can tell apart any more only move the point.
+static const char *take_digits(const char *at, bool fraction, decimal *number) {
+  for (; is_digit(*at); ++at) {
+    const bool kept = number->digits < 1000000000000000000;
+    if (kept) number->digits = number->digits * 10 + static_cast<uint64_t>(*at - '0');
+    if (kept && fraction) --number->exponent;
+    if (!kept && !fraction) ++number->exponent;
+  }
+  return at;
+}
+
+// `at` is returned unchanged when there is no complete exponent.
+static const char *take_exponent(const char *at, decimal *number) {
+  if ((*at | 0x20) != 'e') return at;
+  const bool negative = at[1] == '-';
+  const char *digit = negative || at[1] == '+' ? at + 2 : at + 1;
+  if (!is_digit(*digit)) return at;
+  int64_t exponent = 0;
+  for (; is_digit(*digit); ++digit) {
+    if (exponent < INT64_MAX / 20) exponent = exponent * 10 + (*digit - '0');
+  }
+  number->exponent += negative ? -exponent : exponent;
+  return digit;
+}
+
+static bool take_number(parser *in, double *value) {
+  const bool negative = *in->at == '-';
+  const char *start = negative ? in->at + 1 : in->at;
+  decimal number = {};
+  const char *at = take_digits(start, false, &number);
+  const bool has_point = *at == '.';
+  if (has_point) at = take_digits(at + 1, true, &number);
+  if (at - start == (has_point ? 1 : 0)) return false;
+  at = take_exponent(at, &number);
+
+  const bool leading_zero = *start == '0' && at - start > 1 && start[1] != '.';
+  if (leading_zero || (*at | 0x20) == 'x') return false;
+  const double magnitude = scale(number.digits, number.exponent);
+  if (magnitude - magnitude != 0) return false;  // too large for a double
+  *value = negative ? -magnitude : magnitude;
+  in->at = at;
+  return true;
+}
+
+// ---- Second pass: the document
+
+static bool take_literal(parser *in, const char *literal) {
+  const size_t len = strlen(literal);
+  if (strncmp(in->at, literal, len) != 0) return false;
+  in->at += len;
+  return true;
+}
+
+// The type of the value that starts with `c`; false when none does.
+static bool type_at(char c, json_type *type) {
+  switch (c) {
+    case '{':
+      *type = kJsonObject;
+      return true;
+    case '[':
+      *type = kJsonArray;
+      return true;
+    case '"':
+      *type = kJsonString;
+      return true;
+    case 't':
+      *type = kJsonTrue;
+      return true;
+    case 'f':
+      *type = kJsonFalse;
+      return true;
+    case 'n':
+      *type = kJsonNull;
+      return true;
+    default:
+      *type = kJsonNumber;
+      return c == '-' || is_digit(c);
+  }
+}
+
+static bool take_string(parser *in, JSON_Value *value) {
+  ++in->at;
+  decoded_string string;
+  if (!process_string(in, &string)) return false;
+  value->text = string.text;
+  value->count = string.len;
+  if (string.own.release() != nullptr) value->flags |= kOwnsText;
+  return true;
+}
+
+// Takes a whole value, of a container only the opening bracket.
+static bool take_value(parser *in, JSON_Value *value) {
+  switch (value->type) {
+    case kJsonNull:
+      return take_literal(in, "null");
+    case kJsonFalse:
+      return take_literal(in, "false");
+    case kJsonTrue:
+      return take_literal(in, "true");
+    case kJsonNumber:
+      return take_number(in, &value->number);
+    case kJsonString:
+      return take_string(in, value);
+    default:
+      in->at = skip_space(in->at + 1);
+      return true;
+  }
+}
+
+// The next child's node, and for a member its name; NULL on a fault or beyond a limit.
+static JSON_Value *add_element(parser *in, JSON_Value *array, JSON_Value *last) {
+  json_type type;
+  if (array->count == kMaxElements || !type_at(*in->at, &type)) return nullptr;
+  JSON_Value *element = new_node(&in->room, type);
+  append_child(array, last, element);
+  return element;
+}
+
+static JSON_Value *add_member(parser *in, JSON_Value *object) {
+  if (object->count == kMaxMembers || *in->at != '"') return nullptr;
+  ++in->at;
+  decoded_string name;
+  if (!process_string(in, &name)) return nullptr;
+  JSON_Value *last;
+  if (find_member(object, name.text, name.len, &last) != nullptr) return nullptr;
+  in->at = skip_space(in->at);
+  if (*in->at != ':') return nullptr;
+  in->at = skip_space(in->at + 1);
+
+  json_type type;
+  if (!type_at(*in->at, &type)) return nullptr;
+  JSON_Value *member = new_node(&in->room, type);
+  set_name(member, name.text, name.len);
+  if (name.own.release() != nullptr) member->flags |= kOwnsName;
+  append_child(object, last, member);
+  return member;
+}
+
+static JSON_Value *add_child(parser *in, JSON_Value *parent, JSON_Value *last) {
+  return parent->type == kJsonArray ? add_element(in, parent, last) : add_member(in, parent);
+}
+
+static bool take_closing(parser *in, const JSON_Value *container) {
+  if (*in->at != (container->type == kJsonArray ? ']' : '}')) return false;
+  ++in->at;
+  return true;
+}
+
+// The tree is whole after every step, so that it can be freed at any.
+static bool take_document(parser *in, JSON_Value *root) {
+  for (JSON_Value *value = root; value != nullptr;) {
+    if (!take_value(in, value)) return false;
+    if (is_container(value) && !take_closing(in, value)) {
+      value = add_child(in, value, nullptr);
+      continue;
+    }
+    // What is complete is the last child so far: its `next` is its parent.
+    for (;;) {
+      if (value == root) return true;
+      JSON_Value *parent = value->next;
+      in->at = skip_space(in->at);
+      if (*in->at == ',') {
+        in->at = skip_space(in->at + 1);
+        value = add_child(in, parent, value);
+        break;
+      }
+      if (!take_closing(in, parent)) return false;
+      value = parent;
+    }
+  }
+  return false;
+}
+
+JSON_Value *json_parse_string(const char *text) {
+  if (text == nullptr) return nullptr;
+  parser in = {skip_space(text), text + strlen(text), {}};
+  json_extent extent;
+  json_type type;
+  if (!type_at(*in.at, &type) || !measure(in.at, in.end, &extent)) return nullptr;
+  json_ptr document(new_block(extent, type, &in.room));
+  if (!document || !take_document(&in, document.get())) return nullptr;
+  return document.release();
+}

@@ -1,0 +1,137 @@
+#include "state/object_store.h"
+
+#include <string.h>
+
+#include "failure.h"
+#include "little_endian.h"
+#include "ownership.h"
+#include "platform.h"
+#include "record_names.h"
+
+namespace {
+constexpr uint32_t kLengthLen = 4;
+}
+
+static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id_len,
+                                 bool overwrite, stored_object *object) {
+  TEE_Result result = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
+                                               TEE_DATA_FLAG_ACCESS_WRITE, out(*object));
+  if (result == TEE_ERROR_ITEM_NOT_FOUND) {
+    trace_error(caller, __LINE__, "Item not exist. Try to create one");
+    // Platforms refuse the overwrite flag in an open call, where it means nothing.
+    const uint32_t flags = TEE_DATA_FLAG_ACCESS_WRITE | (overwrite ? TEE_DATA_FLAG_OVERWRITE : 0);
+    result = TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, id, id_len, flags, TEE_HANDLE_NULL,
+                                        nullptr, 0, out(*object));
+  }
+  CHECK_AS(caller, result == TEE_SUCCESS, result,
+           "Failed to create persistent object: 0x%x overwrite: %d", result, overwrite ? 1 : 0);
+  return TEE_SUCCESS;
+}
+
+TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const char *id,
+                                          uint32_t id_len, bool overwrite) {
+  CHECK(id_len <= TEE_OBJECT_ID_MAX_LEN, TEE_ERROR_BAD_PARAMETERS, "pobj_id length too large\n");
+
+  stored_object object;
+  TRY(open_or_create(__func__, id, id_len, overwrite, &object));
+  uint8_t prefix[kLengthLen];
+  put_u32(prefix, len);
+  TRY_LOG(TEE_WriteObjectData(object.get(), prefix, kLengthLen), "Failed to write data size: 0x%x");
+  TRY_LOG(TEE_WriteObjectData(object.get(), data, len), "Failed to write data: 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_t id_len,
+                                                         uint8_t **data, uint32_t *len) {
+  CHECK(id_len != 0 && id_len <= TEE_OBJECT_ID_MAX_LEN && data != nullptr && len != nullptr,
+        TEE_ERROR_BAD_PARAMETERS,
+        "pobj_id length too large, or pobj_id_size is zero, or NULL parameter pobj_id_length %u "
+        "data_buf %p length %p\n",
+        id_len, static_cast<void *>(data), static_cast<void *>(len));
+  *data = nullptr;
+  *len = 0;
+
+  stored_object object;
+  TEE_Result result =
+      TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
+                               TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_SHARE_READ, out(object));
+  CHECK(result == TEE_SUCCESS, result, "pobj with id: %.*s doestn't exist, error code 0x%x\n",
+        static_cast<int>(id_len), id, result);
+
+  uint8_t prefix[kLengthLen];
+  tee_length count = 0;
+  TRY_LOG(TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count),
+          "Failed to read data size, error code 0x%x\n");
+  if (count < kLengthLen) {
+    *len = static_cast<uint32_t>(count);
+    FAIL(TEE_SUCCESS, "Unexpected data size\n");
+  }
+
+  const uint32_t stored_len = get_u32(prefix);
+  secret_bytes buffer;
+  if (stored_len < UINT32_MAX) buffer.data = allocate_bytes(stored_len + 1);
+  CHECK(buffer.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",
+        stored_len);
+  buffer.len = stored_len;
+  TRY_LOG(TEE_ReadObjectData(object.get(), buffer.data, stored_len, &count),
+          "Failed to read data, error code 0x%x\n");
+  *data = buffer.release();
+  *len = static_cast<uint32_t>(count);
+  return TEE_SUCCESS;
+}
+
+TEE_Result delete_persistent_object(const char *id, uint32_t id_len) {
+  stored_object object;
+  TRY_LOG(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len, TEE_DATA_FLAG_ACCESS_WRITE_META,
+                                   out(object)),
+          "TEE_OpenPersistentObject fails %x");
+  // The handle is gone afterwards, whatever the result.
+  TRY_LOG(TEE_CloseAndDeletePersistentObject1(object.release()),
+          "Delete the persistent object fail %x");
+  return TEE_SUCCESS;
+}
+
+// ---- Records
+
+void concat_pobj_name(const char *prefix, const char *name, char **id) {
+  *id = nullptr;
+  if (prefix == nullptr || name == nullptr) return;
+  const size_t prefix_len = strlen(prefix);
+  const size_t name_len = strlen(name);
+  if (prefix_len + name_len >= UINT32_MAX) return;
+  auto *text =
+      reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(prefix_len + name_len + 1)));
+  if (text == nullptr) return;
+  memcpy(text, prefix, prefix_len);
+  memcpy(text + prefix_len, name, name_len + 1);
+  *id = text;
+}
+
+JSON_Value *get_json_by_name(const char *prefix, const char *name) {
+  tee_ptr<char> id;
+  concat_pobj_name(prefix, name, out(id));
+  CHECK(id, nullptr, "No memory for sd_pobj_name");
+  secret_bytes data;
+  const TEE_Result result = allocate_and_load_data_from_persistent_object(
+      id.get(), static_cast<uint32_t>(strlen(id.get())), &data.data, &data.len);
+  if (result != TEE_SUCCESS || data.data == nullptr) return nullptr;
+  return json_parse_string(reinterpret_cast<const char *>(data.data));
+}
+
+static TEE_Result read_record(const char *prefix, const char *name, TEE_Result missing,
+                              JSON_Value **value) {
+  *value = get_json_by_name(prefix, name);
+  return *value != nullptr ? TEE_SUCCESS : missing;
+}
+
+TEE_Result get_ta_info_persistent_object_to_json_value(const char *taid, JSON_Value **value) {
+  return read_record(TA_INFO_PREFIX, taid, OTRP_NOT_FOUND, value);
+}
+
+TEE_Result get_sd_info_persistent_object_to_json_value(const char *sdname, JSON_Value **value) {
+  return read_record(SD_INFO_PREFIX, sdname, OTRP_NOT_FOUND, value);
+}
+
+TEE_Result get_sp_info_persistent_object_to_json_value(const char *spid, JSON_Value **value) {
+  return read_record(SP_INFO_PREFIX, spid, OTRP_SP_NOT_FOUND, value);
+}

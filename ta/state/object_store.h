@@ -1,0 +1,49 @@
+/// The agent's persistent objects: save, load, delete, and the reader of JSON records.
+///
+/// An object's data stream is
+///
+///     length N (4 bytes, little-endian) | N bytes of payload | leftovers of a longer payload
+///
+/// An existing object is rewritten from its start and not truncated, so readers go by N alone.
+/// Every operation opens, uses and closes its object. No other code opens persistent objects.
+/// IDs have at most 64 bytes; codes of the platform are passed through.
+#ifndef OBJECT_STORE_H
+#define OBJECT_STORE_H
+
+#include <stdint.h>
+#include <tee_internal_api.h>
+
+#include "state/json.h"
+
+/// Creates the object or writes it over. `overwrite` is the flag of that name in the creation
+/// call; an existing object is opened and written over either way.
+[[nodiscard]] TEE_Result save_data_to_persistent_object(const void *data, uint32_t len,
+                                                        const char *id, uint32_t id_len,
+                                                        bool overwrite);
+
+/// The payload in a new buffer, with a NUL behind it that is not counted. `*len` is less than the
+/// stored length when the object is shorter than it says. An object without a whole length prefix
+/// is no failure: `*data` is NULL then.
+[[nodiscard]] TEE_Result allocate_and_load_data_from_persistent_object(const char *id,
+                                                                       uint32_t id_len,
+                                                                       uint8_t **data,
+                                                                       uint32_t *len);
+
+/// TEE_ERROR_ITEM_NOT_FOUND when there is no such object.
+[[nodiscard]] TEE_Result delete_persistent_object(const char *id, uint32_t id_len);
+
+/// `*id` receives a new text, prefix followed by name; NULL when either is NULL or memory ran out.
+void concat_pobj_name(const char *prefix, const char *name, char **id);
+
+/// The record `prefix` + `name` as a new JSON value; NULL when there is none that parses.
+JSON_Value *get_json_by_name(const char *prefix, const char *name);
+
+/// The same for one kind of record. OTRP_NOT_FOUND (OTRP_SP_NOT_FOUND for an SP) with NULL.
+[[nodiscard]] TEE_Result get_ta_info_persistent_object_to_json_value(const char *taid,
+                                                                     JSON_Value **value);
+[[nodiscard]] TEE_Result get_sd_info_persistent_object_to_json_value(const char *sdname,
+                                                                     JSON_Value **value);
+[[nodiscard]] TEE_Result get_sp_info_persistent_object_to_json_value(const char *spid,
+                                                                     JSON_Value **value);
+
+#endif

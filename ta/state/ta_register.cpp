@@ -1,0 +1,141 @@
+#include "state/ta_register.h"
+
+#include <string.h>
+
+#include "failure.h"
+#include "little_endian.h"
+#include "ownership.h"
+#include "record_names.h"
+#include "state/object_store.h"
+
+namespace {
+
+constexpr uint32_t kTaidLen = 32;
+constexpr uint32_t kDigestLen = 32;
+constexpr uint32_t kRowLen = kTaidLen + kDigestLen;
+constexpr uint32_t kCountLen = 4;
+
+constexpr uint32_t kDigestLenOffset = 16;
+constexpr uint32_t kDigestOffset = 20;
+static_assert(kDigestOffset + kDigestLen == kTaImageHeaderLen);
+
+constexpr uint32_t kRegisterIdLen = sizeof(TA_REGISTER_ID) - 1;
+
+struct table {
+  secret_bytes payload;
+  uint32_t num_rows = 0;
+
+  const uint8_t *row(uint32_t i) const { return payload.data + kCountLen + i * kRowLen; }
+};
+
+}  // namespace
+
+// A new copy of the digest in the image's header, or NULL.
+static uint8_t *read_ta_bin_ta_hash(const uint8_t *ta_image) {
+  const uint16_t len = get_u16(ta_image + kDigestLenOffset);
+  CHECK(len == kDigestLen, nullptr, "read ta hash size should be 32, but hash size is %d", len);
+  uint8_t *digest = allocate_bytes(kDigestLen);
+  CHECK(digest != nullptr, nullptr, "malloc ta mem get NULL");
+  memcpy(digest, ta_image + kDigestOffset, kDigestLen);
+  return digest;
+}
+
+// ---- The stored table
+
+// `payload->data` stays NULL when the table is missing or empty.
+static TEE_Result load_payload(const char *caller, secret_bytes *payload) {
+  const TEE_Result result = allocate_and_load_data_from_persistent_object(
+      TA_REGISTER_ID, kRegisterIdLen, &payload->data, &payload->len);
+  if (result == TEE_SUCCESS && payload->data != nullptr && payload->len != 0) return TEE_SUCCESS;
+  trace_error(caller, __LINE__, "read persistent object error, error code: %x", result);
+  payload->reset();
+  // Only a table that is not there may be created: any other failure would lose every row.
+  return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
+}
+
+static TEE_Result load_or_create_payload(const char *caller, secret_bytes *payload) {
+  TRY(load_payload(caller, payload));
+  if (payload->data != nullptr) return TEE_SUCCESS;
+  trace_error(caller, __LINE__, "no persistent object named %s, creating it", TA_REGISTER_ID);
+  const uint8_t no_rows[kCountLen] = {};
+  const TEE_Result saved =
+      save_data_to_persistent_object(no_rows, kCountLen, TA_REGISTER_ID, kRegisterIdLen, true);
+  CHECK_AS(caller, saved == TEE_SUCCESS, saved, "can not init ta_register_info %s", TA_REGISTER_ID);
+  TRY(load_payload(caller, payload));
+  return payload->data != nullptr ? TEE_SUCCESS : TEE_ERROR_ITEM_NOT_FOUND;
+}
+
+static TEE_Result load_table(const char *caller, table *rows) {
+  TRY(load_or_create_payload(caller, &rows->payload));
+  const uint32_t len = rows->payload.len;
+  const uint32_t num_rows = len < kCountLen ? UINT32_MAX : get_u32(rows->payload.data);
+  CHECK_AS(caller, len >= kCountLen && num_rows <= (len - kCountLen) / kRowLen,
+           TEE_ERROR_BAD_FORMAT, "ta_register_info holds %u bytes, not %u rows", len, num_rows);
+  rows->num_rows = num_rows;
+  return TEE_SUCCESS;
+}
+
+// The last row of `taid`, or num_rows when there is none.
+static uint32_t find_row(const table &rows, const char *taid) {
+  for (uint32_t i = rows.num_rows; i > 0; --i) {
+    if (memcmp(rows.row(i - 1), taid, kTaidLen) == 0) return i - 1;
+  }
+  return rows.num_rows;
+}
+
+// ---- Operations
+
+// Saves the first `num_before` rows, then the row of `taid` with `digest` unless that is NULL,
+// then the rows from `rest` on.
+static TEE_Result save_table(const char *caller, const table &rows, uint32_t num_before,
+                             const char *taid, const uint8_t *digest, uint32_t rest,
+                             const char *not_saved) {
+  const uint32_t num_new = digest != nullptr ? 1 : 0;
+  const uint32_t num_after = rows.num_rows - rest;
+  const uint32_t num_rows = num_before + num_new + num_after;
+  const uint32_t len = kCountLen + num_rows * kRowLen;
+  const tee_ptr<uint8_t> data(allocate_bytes(len));
+  CHECK_AS(caller, data, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
+
+  put_u32(data.get(), num_rows);
+  uint8_t *at = data.get() + kCountLen;
+  memcpy(at, rows.row(0), num_before * kRowLen);
+  at += num_before * kRowLen;
+  if (digest != nullptr) {
+    memcpy(at, taid, kTaidLen);
+    memcpy(at + kTaidLen, digest, kDigestLen);
+    at += kRowLen;
+  }
+  memcpy(at, rows.row(rest), num_after * kRowLen);
+
+  const TEE_Result saved =
+      save_data_to_persistent_object(data.get(), len, TA_REGISTER_ID, kRegisterIdLen, false);
+  CHECK_AS(caller, saved == TEE_SUCCESS, saved, not_saved, TA_REGISTER_ID);
+  return TEE_SUCCESS;
+}
+
+TEE_Result save_ta_register_info(const char *taid, const uint8_t *ta_image,
+                                 int32_t operation_code) {
+  tee_ptr<uint8_t> digest;
+  if (ta_image != nullptr) {
+    digest.reset(read_ta_bin_ta_hash(ta_image));
+    CHECK(digest, OTRP_MISSING, "read ta_decrypted tahash get NULL");
+  }
+  const bool valid = taid != nullptr && strlen(taid) == kTaidLen && operation_code >= kRegisterTa &&
+                     operation_code <= kUnregisterTa && (digest || operation_code == kUnregisterTa);
+  CHECK(valid, OTRP_MISSING, "input format not valid!");
+
+  table rows;
+  TRY(load_table(__func__, &rows));
+  const uint32_t row = find_row(rows, taid);
+  const bool listed = row < rows.num_rows;
+  if (operation_code == kRegisterTa) {
+    CHECK(!listed, OTRP_TA_EXISTS, "this ta %s has been installed", taid);
+    return save_table(__func__, rows, rows.num_rows, taid, digest.get(), rows.num_rows,
+                      "can not init ta_register_info %s");
+  }
+  CHECK(listed, OTRP_NOT_FOUND, "this ta %s has not been installed", taid);
+  const uint8_t *new_digest = operation_code == kUpdateTa ? digest.get() : nullptr;
+  return save_table(__func__, rows, row, taid, new_digest, row + 1,
+                    "can not init ta_register_info %s, create_sd function fail");
+}

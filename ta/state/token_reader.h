@@ -1,0 +1,53 @@
+/// The token reader: picks values out of request texts without building a tree.
+///
+/// It hands out slices of the text itself, as they stand there, escape sequences included. The
+/// text must outlive every slice and object that comes from it; freeing those leaves it alone.
+///
+/// A lookup takes the token that follows the first string equal to the key, in text order and at
+/// any depth, be that string a member's name or a value. So the first of two members wins, inner
+/// members are seen from outside, and a value that looks like a name counts as one.
+#ifndef TOKEN_READER_H
+#define TOKEN_READER_H
+
+#include <stdint.h>
+
+#include "ownership.h"
+
+struct jsmn_token;
+
+struct jsmn_string {
+  const char *data;  // not NUL-terminated; NULL: no such value
+  uint32_t len;
+};
+
+struct jsmn_object {
+  jsmn_token *tokens;  // in text order; the first is the object itself
+  uint32_t count;
+  jsmn_string *text;
+};
+
+/// A new empty slice, for the caller to point at a text; NULL: no memory.
+jsmn_string *jsmn_init_string();
+
+/// A new object over the text of `slice`, up to a NUL in it. NULL, and a line in the log, when the
+/// text is no JSON whose first value is an object, or memory ran out.
+jsmn_object *jsmn_init_object(const jsmn_string *slice);
+
+/// A new slice of the value that follows `key`, without the quotes of a string. Its `data` is NULL
+/// when there is no such value; that of an empty string is not. NULL: no memory.
+jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key);
+
+/// A new object over the value that follows `key`; NULL when there is none or it is no object.
+jsmn_object *jsmn_object_get_object(const jsmn_object *object, const char *key);
+
+/// Both accept NULL.
+void jsmn_free_string(jsmn_string *slice);
+void jsmn_free_object(jsmn_object *object);
+
+/// A new NUL-terminated copy of `len` characters; NULL when `data` is, or memory ran out.
+char *jsmn_string_dup(const char *data, uint32_t len);
+
+using slice_ptr = owned<jsmn_string *, jsmn_free_string>;
+using token_object_ptr = owned<jsmn_object *, jsmn_free_object>;
+
+#endif
