@@ -1,0 +1,166 @@
+// Known answers of others, and what the wrappers add: padding, truncation, refusals.
+#include "crypto/symmetric.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "ownership.h"
+#include "support/inside_agent.h"
+
+namespace otrp_test {
+namespace {
+
+class Symmetric : public InsideAgent {};
+
+TEST_F(Symmetric, AesCbcAnswersSp800_38a) {
+  // NIST SP 800-38A, F.2.1; the fifth block is our padding.
+  const std::string key = hex("2b7e151628aed2a6abf7158809cf4f3c");
+  const std::string iv = hex("000102030405060708090a0b0c0d0e0f");
+  const std::string plain =
+      hex("6bc1bee22e409f96e93d7e117393172aae2d8a571e03ac9c9eb76fac45af8e51"
+          "30c81c46a35ce411e5fbc1191a0a52eff69f2445df4f9b17ad2b417be66c3710");
+  const std::string expected =
+      hex("7649abac8119b246cee98e9b12e9197d5086cb9b507219ee95db113a917678b2"
+          "73bed6b8e3c1743b7116e69e222295163ff1caa1681fac09120eca307586e1a7");
+  secret_bytes cipher;
+  ASSERT_EQ(aes_cbc_encrypt(u8(key), 16, u8(iv), 16, u8(plain), 64, &cipher.data, &cipher.len),
+            TEE_SUCCESS);
+  ASSERT_EQ(cipher.len, 80u);
+  EXPECT_EQ(str(cipher).substr(0, 64), expected);
+
+  secret_bytes back;
+  ASSERT_EQ(aes_cbc_decrypt(u8(key), 16, u8(iv), 16, cipher.data, 80, &back.data, &back.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(back), plain);
+
+  uint8_t *in_place = cipher.release();
+  ASSERT_EQ(aes_cbc_decrypt_with_update_block(u8(key), 16, u8(iv), 16, in_place, 80, &cipher.data,
+                                              &cipher.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(cipher.data, in_place);
+  EXPECT_EQ(str(cipher), plain);
+}
+
+TEST_F(Symmetric, AesGcmAnswersTheGcmProposal) {
+  // McGrew and Viega, test case 4.
+  const std::string key = hex("feffe9928665731c6d6a8f9467308308");
+  const std::string iv = hex("cafebabefacedbaddecaf888");
+  const std::string aad = hex("feedfacedeadbeeffeedfacedeadbeefabaddad2");
+  const std::string plain =
+      hex("d9313225f88406e5a55909c5aff5269a86a7a9531534f7da2e4c303d8a318a72"
+          "1c3c0c95956809532fcf0e2449a6b525b16aedf5aa0de657ba637b39");
+  secret_bytes cipher;
+  secret_bytes tag;
+  ASSERT_EQ(aes_gcm_encrypt(u8(key), 16, u8(iv), 12, u8(aad), 20, u8(plain), 60, &cipher.data,
+                            &cipher.len, &tag.data, &tag.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(cipher), hex("42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
+                             "21d514b25466931c7d8f6a5aac84aa051ba30b396a0aac973d58e091"));
+  EXPECT_EQ(str(tag), hex("5bc94fbc3221a5db94fae95ae7121a47"));
+
+  secret_bytes back;
+  const auto decrypt = [&](uint32_t tag_len) {
+    back.reset();
+    return aes_gcm_decrypt(u8(key), 16, u8(iv), 12, u8(aad), 20, tag.data, tag_len, cipher.data,
+                           cipher.len, &back.data, &back.len);
+  };
+  ASSERT_EQ(decrypt(16), TEE_SUCCESS);
+  EXPECT_EQ(str(back), plain);
+  EXPECT_EQ(decrypt(4), TEE_ERROR_MAC_INVALID);
+  tag.data[15] ^= 1;
+  EXPECT_EQ(decrypt(16), TEE_ERROR_MAC_INVALID);
+  EXPECT_EQ(back.data, nullptr);
+}
+
+TEST_F(Symmetric, HmacAnswersRfc4231) {
+  struct {
+    std::string key, data, mac;
+  } const cases[] = {
+      // Test cases 1 and 3.
+      {std::string(20, 0x0b), "Hi There",
+       "b0344c61d8db38535ca8afceaf0bf12b881dc200c9833da726e9376c2e32cff7"},
+      {std::string(20, '\xaa'), std::string(50, '\xdd'),
+       "773ea91e36800e46854db8ebd09181a72959098b3ef8c122d9635514ced565fe"},
+  };
+  for (const auto &c : cases) {
+    secret_bytes mac;
+    const auto key_len = static_cast<uint32_t>(c.key.size());
+    const auto data_len = static_cast<uint32_t>(c.data.size());
+    ASSERT_EQ(Compute_HmacSha256(u8(c.data), data_len, u8(c.key), key_len, &mac.data, &mac.len),
+              TEE_SUCCESS);
+    EXPECT_EQ(mac.len, 16u);
+    EXPECT_EQ(std::string(reinterpret_cast<char *>(mac.data), 32), hex(c.mac));
+    const auto verify = [&](const std::string &claimed) {
+      return Verify_HmacSha256(u8(c.data), data_len, u8(c.key), key_len, u8(claimed),
+                               static_cast<uint32_t>(claimed.size()));
+    };
+    EXPECT_EQ(verify(hex(c.mac).substr(0, 16)), TEE_SUCCESS);
+    EXPECT_EQ(verify(hex(c.mac)), TEE_SUCCESS);
+    EXPECT_EQ(verify(hex(c.mac) + "x"), TEE_ERROR_MAC_INVALID);
+    std::string changed = hex(c.mac).substr(0, 16);
+    changed[15] = static_cast<char>(changed[15] ^ 0x80);
+    EXPECT_EQ(verify(changed), TEE_ERROR_MAC_INVALID);
+  }
+}
+
+TEST_F(Symmetric, PaddingIsWholeOrRefused) {
+  const struct {
+    const char *name;
+    std::string data;
+    TEE_Result result;
+    uint32_t unpadded;
+  } cases[] = {
+      {"one byte", "abc\1", TEE_SUCCESS, 3},
+      {"whole block", std::string(16, 16), TEE_SUCCESS, 0},
+      {"nothing", "", TEE_ERROR_BAD_FORMAT, 0},
+      {"zero", std::string("abc\0", 4), TEE_ERROR_BAD_FORMAT, 0},
+      {"seventeen", std::string(32, 17), TEE_ERROR_BAD_FORMAT, 0},
+      {"uneven", "\3\3\2", TEE_ERROR_BAD_FORMAT, 0},
+      {"longer than the data", "\4\4\4", TEE_ERROR_BAD_FORMAT, 0},
+  };
+  for (const auto &c : cases) {
+    uint32_t unpadded = 0;
+    // On the heap, exactly as long as it is.
+    const std::vector<uint8_t> data(c.data.begin(), c.data.end());
+    EXPECT_EQ(remove_pkcs_pading_length(data.data(), static_cast<uint32_t>(data.size()), &unpadded),
+              c.result)
+        << c.name;
+    EXPECT_EQ(unpadded, c.unpadded) << c.name;
+  }
+}
+
+TEST_F(Symmetric, LengthsThatASenderGetsWrongAreRefusedAndTheBufferFreed) {
+  const std::string key(16, 'k');
+  const std::string iv(17, 'i');
+  for (const uint32_t iv_len : {1u, 15u, 17u}) {
+    secret_bytes out;
+    EXPECT_EQ(aes_cbc_decrypt(u8(key), 16, u8(iv), iv_len, u8(key), 16, &out.data, &out.len),
+              TEE_ERROR_BAD_PARAMETERS);
+    EXPECT_EQ(aes_cbc_decrypt_with_update_block(u8(key), 16, u8(iv), iv_len, allocate_bytes(16), 16,
+                                                &out.data, &out.len),
+              TEE_ERROR_BAD_PARAMETERS);
+  }
+  for (const uint32_t len : {0u, 1u, 17u}) {
+    secret_bytes out;
+    const std::string cipher(len, 'c');
+    EXPECT_EQ(aes_cbc_decrypt(u8(key), 16, u8(iv), 16, u8(cipher), len, &out.data, &out.len),
+              TEE_ERROR_BAD_FORMAT);
+    EXPECT_EQ(aes_cbc_decrypt_with_update_block(u8(key), 16, u8(iv), 16, allocate_bytes(len), len,
+                                                &out.data, &out.len),
+              TEE_ERROR_BAD_FORMAT);
+  }
+}
+
+TEST_F(Symmetric, ADigestOfPartsIsTheDigestOfAll) {
+  const data_part parts[] = {{"ab", 2}, {"", 0}, {"c", 1}};
+  uint8_t digest[32];
+  uint32_t len = sizeof digest;
+  ASSERT_EQ(compute_string_array_digest_with_update(TEE_ALG_SHA256, parts, 3, digest, &len),
+            TEE_SUCCESS);
+  // FIPS 180-2, B.1
+  EXPECT_EQ(std::string(reinterpret_cast<char *>(digest), len),
+            hex("ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad"));
+}
+
+}  // namespace
+}  // namespace otrp_test
