@@ -14,6 +14,8 @@
 #include <utility>
 #include <vector>
 
+#include "../support/published_vectors.h"
+
 using Bytes = std::vector<uint8_t>;
 
 inline Bytes from_hex(const std::string &hex) {
@@ -83,31 +85,20 @@ inline Operation make_operation(uint32_t algorithm, uint32_t mode, uint32_t max_
   return Operation(operation);
 }
 
-/// The key of RFC 7515, appendix A.2, without its CRT components.
-inline AttributeList rfc7515_public() {
-  return {
-      {TEE_ATTR_RSA_MODULUS,
-       from_base64url("ofgWCuLjybRlzo0tZWJjNiuSfb4p4fAkd_wWJcyQoTbji9k0l8W26mPddxHmfHQp-Vaw-"
-                      "4qPCJrcS2mJPMEzP1Pt0"
-                      "Bm4d4QlL-yRT-SFd2lZS-pCgNMsD1W_YpRPEwOWvG6b32690r2jZ47soMZo9wGzjb_7OMg0LOL-"
-                      "bSf63kpaSHSXndS"
-                      "5z5rexMdbBYUsLA9e-KXBdQOS-"
-                      "UTo7WTBEMa2R2CapHg665xsmtdVMTBQY4uDZlxvb3qCo5ZwKh9kG4LT6_I5IhlJH"
-                      "7aGhyxXFvUK-DWNmoudF8NAco9_h9iaGNj8q2ethFkMLs91kzk2PAcDTW9gb54h4FRWyuXpoQ")},
-      {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}}};
+/// A published key pair without its CRT components.
+inline AttributeList published_key(const char *modulus, const char *private_exponent) {
+  return {{TEE_ATTR_RSA_MODULUS, from_base64url(modulus)},
+          {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}},
+          {TEE_ATTR_RSA_PRIVATE_EXPONENT, from_base64url(private_exponent)}};
 }
 
 inline AttributeList rfc7515_private() {
-  AttributeList key = rfc7515_public();
-  key.emplace_back(
-      TEE_ATTR_RSA_PRIVATE_EXPONENT,
-      from_base64url("Eq5xpGnNCivDflJsRQBXHx1hdR1k6Ulwe2JZD50LpXyWPEAeP88vLNO97IjlA7_"
-                     "GQ5sLKMgvfTeXZx9SE-7YwVol2"
-                     "NXOoAJe46sui395IW_GO-pWJ1O0BkTGoVEn2bKVRUCgu-"
-                     "GjBVaYLU6f3l9kJfFNS3E0QbVdxzubSu3Mkqzjkn439X0"
-                     "M_V51gfpRLI9JYanrC4D4qAdGcopV_"
-                     "0ZHHzQlBjudU2QvXt4ehNYTCBr6XCLQUShb1juUO1ZdiYoFaFQT5Tw8bGUl_"
-                     "x_jTj3ccPDVZFD9pIuhLhBOneufuBiB4cS98l2SR_RQyGWSeWjnczT0QU91p1DhOVRuOopznQ"));
+  return published_key(rfc7515_a2::kModulus, rfc7515_a2::kPrivateExponent);
+}
+
+inline AttributeList rfc7515_public() {
+  AttributeList key = rfc7515_private();
+  key.pop_back();
   return key;
 }
 

@@ -260,11 +260,7 @@ TEST_F(Crypto, GcmTagSizes) {
 // RFC 7515, appendix A.2
 const Bytes kSignedDigest =
     from_hex("c88a34847b4ffb12a9326e540f144b3dcc4d5515f18701e7d6e0ee7866c9c705");
-const Bytes kSignature = from_base64url(
-    "cC4hiUPoj9Eetdgtv3hF80EGrhuB__dzERat0XF9g2VtQgr9PJbu3XOiZj5RZmh7AAuHIm4Bh-0Qc_lF5YKt_O8W2Fp5ju"
-    "jGbds9uJdbF9CUAr7t1dnZcAcQjbKBYNX4BAynRFdiuB--f_nZLgrnbyTyWzO75vRK5h6xBArLIARNPvkSjtQBMHlb1L07"
-    "Qe7K0GarZRmB_eSN9383LcOLn6_dO--xi12jzDwusC-eOkHWEsqtFZESc6BfI7noOPqvhJ1phCnvWh6IeYI2w9QOYEUipU"
-    "TI8np6LbgGY9Fs98rqVt5AXLIhWkWywlVmtVrBp0igcN_IoypGlUPQGe77Rw");
+const Bytes kSignature = from_base64url(rfc7515_a2::kSignature);
 
 TEE_Result verify(const Operation &operation, const Bytes &signature) {
   return TEE_AsymmetricVerifyDigest(operation.get(), nullptr, 0, kSignedDigest.data(), 32,
@@ -301,35 +297,10 @@ TEST_F(Crypto, RsaVerificationRefusesWhatIsNotGenuine) {
 }
 
 // RFC 7516, appendix A.2
-AttributeList rfc7516_private() {
-  return {
-      {TEE_ATTR_RSA_MODULUS,
-       from_base64url(
-           "sXchDaQebHnPiGvyDOAT4saGEUetSyo9MKLOoWFsueri23bOdgWp4Dy1WlUzewbgBHod5pcM9H95GQRV3JDXb"
-           "oIRROSBigeC5yjU1hGzHHyXss8UDprecbAYxknTcQkhslANGRUZmdTOQ5qTRsLAt6BTYuyvVRdhS8exSZEy_c"
-           "4gs_7svlJJQ4H9_NxsiIoLwAEk7-Q3UXERGYw_75IDrGA84-lA_-Ct4eTlXHBIY2EaV7t7LjJaynVJCpkv4LK"
-           "jTTAumiGUIuQhrNhZLuF_RJLqHpM2kgWFLU7-VTdL1VbC2tejvcI2BlMkEpk1BzBZI0KQB0GaDWFLN-aEAw3v"
-           "Rw")},
-      {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}},
-      {TEE_ATTR_RSA_PRIVATE_EXPONENT,
-       from_base64url(
-           "VFCWOqXr8nvZNyaaJLXdnNPXZKRaWCjkU5Q2egQQpTBMwhprMzWzpR8Sxq1OPThh_J6MUD8Z35wky9b8eEO0p"
-           "wNS8xlh1lOFRRBoNqDIKVOku0aZb-rynq8cxjDTLZQ6Fz7jSjR1Klop-YKaUHc9GsEofQqYruPhzSA-QgajZG"
-           "PbE_0ZaVDJHfyd7UUBUKunFMScbflYAAOYJqVIVwaYR5zWEEceUjNnTNo_CVSj-VvXLO5VZfCUAVLgW4dpf1S"
-           "rtZjSt34YLsRarSb127reG_DUwg9Ch-KyvjT1SkHgUWRVGcyly7uvVGRSDwsXypdrNinPA4jlhoNdizK2zF2C"
-           "WQ")}};
-}
-
 TEST_F(Crypto, RsaDecryptionKnownAnswer) {
-  const Key key = make_key(TEE_TYPE_RSA_KEYPAIR, 2048, rfc7516_private());
-  Bytes wrapped = from_base64url(
-      "UGhIOguC7IuEvf_NPVaXsGMoLOmwvc1GyqlIKOK1nN94nHPoltGRhWhw7Zx0-kFm1NJn8LE9XShH59_"
-      "i8J0PH5ZZyNfGy"
-      "2xGdULU7sHNF6Gp2vPLgNZ__deLKxGHZ7PcHALUzoOegEI-8E66jX2E4zyJKx-YxzZIItRzC5hlRirb6Y5Cl_p-"
-      "ko3Yvk"
-      "kysZIFNPccxRU7qve1WYPxqbb2Yw8kZqa2rMWI5ng8OtvzlV7elprCbuPhcCdZ6XDP0_F8rkXds2vE4X-"
-      "ncOIM8hAYHHi"
-      "29NX0mcKiRaD0-D-ljQTP-cFPgwCp6X-nZZd9OHBv-B3oWh2TbqmScqXMR4gp_A");
+  const Key key = make_key(TEE_TYPE_RSA_KEYPAIR, 2048,
+                           published_key(rfc7516_a2::kModulus, rfc7516_a2::kPrivateExponent));
+  Bytes wrapped = from_base64url(rfc7516_a2::kEncryptedKey);
   const Operation decrypt = make_operation(TEE_ALG_RSAES_PKCS1_V1_5, TEE_MODE_DECRYPT, 2048, key);
   Bytes cek(32);
   uint32_t len = 31;
@@ -340,8 +311,7 @@ TEST_F(Crypto, RsaDecryptionKnownAnswer) {
   EXPECT_EQ(run(), TEE_ERROR_SHORT_BUFFER);
   EXPECT_EQ(len, 32u);
   EXPECT_EQ(run(), TEE_SUCCESS);
-  const Bytes expected =
-      from_hex("04d31fc5549dfcfe0b649dfa3faa6ace6b7cd42d6f6b09dbc8b100f08f9c2ccf");
+  const Bytes expected = from_hex(rfc7516_a2::kCek);
   EXPECT_EQ(cek, expected);
 
   // Bad padding is refused or answered with other bytes, as OpenSSL's version has it.

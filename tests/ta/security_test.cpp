@@ -1,0 +1,181 @@
+// Signatures and encrypted contents against vectors of the standards, and what the agent refuses.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "crypto/rsa.h"
+#include "crypto/symmetric.h"
+#include "otrp_result.h"
+#include "security/jwe.h"
+#include "security/jws.h"
+#include "security/tsm_trust.h"
+#include "support/inside_agent.h"
+#include "support/published_vectors.h"
+
+namespace otrp_test {
+namespace {
+
+class Security : public InsideAgent {};
+
+std::string unbase64url(const std::string &text) {
+  return tools::base64url_decode(text).value();
+}
+
+uint32_t len_of(const std::string &bytes) {
+  return static_cast<uint32_t>(bytes.size());
+}
+
+// The agent makes its keys from boxes.
+key_object key_pair(const char *modulus, const char *private_exponent) {
+  const std::string n = unbase64url(modulus);
+  const std::string e("\1\0\1", 3);
+  const std::string d = unbase64url(private_exponent);
+  const box_ptr box(tlv_box_create());
+  EXPECT_EQ(tlv_box_put_int(box.get(), kRsaKeySize, 2048), 0);
+  EXPECT_EQ(tlv_box_put_bytes(box.get(), kRsaModulus, u8(n), len_of(n)), 0);
+  EXPECT_EQ(tlv_box_put_bytes(box.get(), kRsaPublicExponent, u8(e), len_of(e)), 0);
+  EXPECT_EQ(tlv_box_put_bytes(box.get(), kRsaPrivateExponent, u8(d), len_of(d)), 0);
+  key_object key(deserialize_rsa_key_from_tlv(box.get()));
+  EXPECT_TRUE(key);
+  return key;
+}
+
+TEST_F(Security, SignaturesAnswerRfc7515) {
+  namespace known = rfc7515_a2;
+  const key_object key = key_pair(known::kModulus, known::kPrivateExponent);
+  const jsmn_string payload = {known::kPayload, sizeof known::kPayload - 1};
+  const jsmn_string protect = {known::kProtect, sizeof known::kProtect - 1};
+  jsmn_string signature = {known::kSignature, sizeof known::kSignature - 1};
+  EXPECT_TRUE(verify_signature(key.get(), &payload, &protect, &signature));
+  EXPECT_FALSE(verify_signature(key.get(), &protect, &payload, &signature));
+  signature.len -= 2;
+  EXPECT_FALSE(verify_signature(key.get(), &payload, &protect, &signature));
+  signature.len = 0;
+  EXPECT_FALSE(verify_signature(key.get(), &payload, &protect, &signature));
+
+  secret_bytes own;
+  ASSERT_EQ(sign_with_spaik_key(&payload, &protect, &own.data, &own.len, key.get()), TEE_SUCCESS);
+  EXPECT_EQ(tools::base64url_encode(str(own)), known::kSignature);
+}
+
+TEST_F(Security, AuthenticationTagsAnswerRfc7518) {
+  namespace known = rfc7518_b1;
+  const std::string cek = hex(known::kCek);
+  const std::string iv = hex(known::kIv);
+  const std::string expected = hex(known::kCiphertext);
+  secret_bytes cipher;
+  ASSERT_EQ(aes_cbc_encrypt(get_aes_key_from_cek(u8(cek)), 16, u8(iv), 16, u8(known::kPlaintext),
+                            sizeof known::kPlaintext - 1, &cipher.data, &cipher.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(cipher), expected);
+
+  const uint32_t aad_len = sizeof known::kAad - 1;
+  secret_bytes tag;
+  ASSERT_EQ(compute_jwe_auth_tag(u8(cek), 32, u8(known::kAad), aad_len, cipher.data, cipher.len,
+                                 u8(iv), 16, &tag.data, &tag.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(tag), hex(known::kTag));
+  const auto verify = [&](std::string aad, uint32_t tag_len) {
+    return verify_jwe_auth_tag(u8(cek), 32, u8(aad), len_of(aad), cipher.data, cipher.len, u8(iv),
+                               16, tag.data, tag_len);
+  };
+  EXPECT_EQ(verify(known::kAad, 16), TEE_SUCCESS);
+  EXPECT_EQ(verify("The second principle of Auguste Kerckhoff.", 16), TEE_ERROR_MAC_INVALID);
+}
+
+TEST_F(Security, KeyUnwrappingAnswersRfc7516) {
+  namespace known = rfc7516_a2;
+  const key_object key = key_pair(known::kModulus, known::kPrivateExponent);
+  const std::string wrapped = unbase64url(known::kEncryptedKey);
+  secret_bytes cek;
+  ASSERT_EQ(rsa_decrypt(key.get(), u8(wrapped), len_of(wrapped), &cek.data, &cek.len), TEE_SUCCESS);
+  EXPECT_EQ(str(cek), hex(known::kCek));
+
+  const std::string iv = unbase64url(known::kIv);
+  const std::string cipher = unbase64url(known::kCiphertext);
+  const std::string tag = unbase64url(known::kTag);
+  EXPECT_EQ(verify_jwe_auth_tag(cek.data, cek.len, u8(known::kProtect), sizeof known::kProtect - 1,
+                                u8(cipher), len_of(cipher), u8(iv), 16, u8(tag), 16),
+            TEE_SUCCESS);
+  secret_bytes plain;
+  ASSERT_EQ(aes_cbc_decrypt(get_aes_key_from_cek(cek.data), 16, u8(iv), 16, u8(cipher),
+                            len_of(cipher), &plain.data, &plain.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(plain), known::kPlaintext);
+}
+
+struct ContentCase {
+  const char *path;  // of the member that is changed
+  const char *value;
+};
+
+TEST_F(Security, ContentsOpenUnchangedOrNotAtAll) {
+  const key_object key = key_pair(rfc7516_a2::kModulus, rfc7516_a2::kPrivateExponent);
+  const json_ptr secret(json_parse_string(R"({"a":"\/","n":[1,2.5]})"));
+  const ContentCase cases[] = {{"protect", "eyJhbGciOiJub25lIn0"},
+                               {"iv", "AAAAAAAAAAAAAAAA"},
+                               {"iv", "AAAA"},
+                               {"ciphertext", "AAAA"},
+                               {"ciphertext", ""},
+                               {"tag", "AAAAAAAAAAAAAAAAAAAAAA"},
+                               {"encrypted_key", "AAAA"}};
+  for (const char *header : {JWE_HEADER_A128CBC_HS256, JWE_HEADER_A128GCM}) {
+    const json_ptr jwe(encrypt_json(key.get(), secret.get(), header));
+    ASSERT_TRUE(jwe);
+    const json_ptr opened(decrypt_json(key.get(), jwe.get()));
+    const json_text text(json_serialize_to_string(opened.get()));
+    EXPECT_STREQ(text.get(), R"({"a":"\/","n":[1,2.500000]})");
+    for (const ContentCase &c : cases) {
+      SCOPED_TRACE(std::string(c.path) + " " + c.value);
+      const json_ptr changed(json_value_deep_copy(jwe.get()));
+      JSON_Object *members = json_value_get_object(changed.get());
+      if (c.path == std::string("encrypted_key")) {
+        members = json_array_get_object(json_object_get_array(members, "recipients"), 0);
+      }
+      ASSERT_EQ(json_object_set_string(members, c.path, c.value), JSONSuccess);
+      EXPECT_EQ(decrypt_json(key.get(), changed.get()), nullptr);
+    }
+  }
+  EXPECT_EQ(encrypt_json(key.get(), secret.get(), "{}"), nullptr);
+}
+
+TEST_F(Security, KeyBoxesGiveBackTheKeyTheyWereMadeOf) {
+  key_object key;
+  ASSERT_EQ(allocate_rsa_key_object(512, out(key)), TEE_SUCCESS);
+  box_ptr box;
+  ASSERT_EQ(serialize_rsa_key_to_tlv(key.get(), out(box)), TEE_SUCCESS);
+  ASSERT_EQ(tlv_box_serialize(box.get()), 0);
+  const box_ptr parsed(tlv_box_parse(tlv_box_get_buffer(box.get()), tlv_box_get_size(box.get())));
+  const key_object same(deserialize_rsa_key_from_tlv(parsed.get()));
+  ASSERT_TRUE(same);
+  secret_bytes wrapped;
+  secret_bytes plain;
+  ASSERT_EQ(rsa_encrypt(key.get(), u8("secret"), 6, &wrapped.data, &wrapped.len), TEE_SUCCESS);
+  ASSERT_EQ(rsa_decrypt(same.get(), wrapped.data, wrapped.len, &plain.data, &plain.len),
+            TEE_SUCCESS);
+  EXPECT_EQ(str(plain), "secret");
+}
+
+TEST_F(Security, EncodedPublicKeysMustHoldWhatTheyClaim) {
+  const std::string encoded("\2\0\0\0nn\1\0\0\0e", 11);
+  const auto read = [](const std::string &bytes, std::string *n, std::string *e) {
+    secret_bytes modulus;
+    secret_bytes exponent;
+    const TEE_Result result = read_pubkey_buf_to_n_and_e(
+        u8(bytes), len_of(bytes), &modulus.data, &modulus.len, &exponent.data, &exponent.len);
+    if (result != TEE_SUCCESS) return result;
+    *n = str(modulus);
+    *e = str(exponent);
+    return result;
+  };
+  std::string n;
+  std::string e;
+  ASSERT_EQ(read(encoded, &n, &e), TEE_SUCCESS);
+  EXPECT_EQ(n + "|" + e, "nn|e");
+  for (size_t len = 0; len < encoded.size(); ++len) {
+    EXPECT_EQ(read(encoded.substr(0, len), &n, &e), OTRP_NO_MEMORY) << len;
+  }
+  EXPECT_EQ(read(std::string("\xFF\xFF\xFF\xFFn", 5), &n, &e), OTRP_NO_MEMORY);
+}
+
+}  // namespace
+}  // namespace otrp_test
