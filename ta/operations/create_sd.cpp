@@ -8,6 +8,7 @@
 #include "operations/operations.h"
 #include "record_names.h"
 #include "state/dsi.h"
+#include "state/object_store.h"
 #include "state/records.h"
 
 namespace {
@@ -66,6 +67,24 @@ static TEE_Result check_sp_record(const char *caller, const char *spid, const ch
   return TEE_SUCCESS;
 }
 
+// An AIK that could not be read, for want of memory or by a failing storage, must not be replaced.
+static TEE_Result check_sp_has_no_aik(const char *caller, const char *spid) {
+  if (spid == nullptr) return TEE_SUCCESS;
+  tee_ptr<char> id;
+  concat_pobj_name(SP_INFO_PREFIX, spid, out(id));
+  CHECK_AS(caller, id, OTRP_NO_MEMORY, "no memory for sp_info_name");
+  const auto id_len = static_cast<uint32_t>(strlen(id.get()));
+  secret_bytes record;
+  const TEE_Result loaded =
+      allocate_and_load_data_from_persistent_object(id.get(), id_len, &record.data, &record.len);
+  if (loaded == TEE_ERROR_ITEM_NOT_FOUND || loaded == TEE_ERROR_BAD_PARAMETERS) return TEE_SUCCESS;
+  if (loaded != TEE_SUCCESS) return loaded;
+  box_ptr box;
+  CHECK_AS(caller, get_aik_tlv_box_by_spid(spid, out(box)) != TEE_SUCCESS, OTRP_NO_MEMORY,
+           "create sd fail, the aik could not be read");
+  return TEE_SUCCESS;
+}
+
 // Creates security domain `sdname` for SP `spid`; an SP without an AIK gets one.
 //
 // `spcert` is stored only with a new SP. `*pubkey` receives the encoded AIK public key.
@@ -95,6 +114,7 @@ static TEE_Result create_sd(const char *spid, const char *sdname, const char *sp
   if (found == TEE_SUCCESS && box) {
     TRY(read_public_half(__func__, box.get(), out(key), &key_len));
   } else {
+    TRY(check_sp_has_no_aik(__func__, spid));
     TRY(check_sp_record(__func__, spid, spcert));
     TRY(make_aik(__func__, &box, out(key), &key_len));
     TRY(announce_aik(__func__, spid, key.get(), key_len));

@@ -28,17 +28,44 @@ static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id
   return TEE_SUCCESS;
 }
 
+// The length prefix of an object that exists; false when there is none to read.
+static bool read_prefix(const char *id, uint32_t id_len, uint8_t *prefix) {
+  stored_object object;
+  const TEE_Result opened =
+      TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
+                               TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_SHARE_READ, out(object));
+  if (opened != TEE_SUCCESS) return false;
+  tee_length count = 0;
+  return TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count) == TEE_SUCCESS &&
+         count == kLengthLen;
+}
+
+static void put_prefix_back(const char *id, uint32_t id_len, const uint8_t *prefix) {
+  stored_object object;
+  const TEE_Result opened = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
+                                                     TEE_DATA_FLAG_ACCESS_WRITE, out(object));
+  if (opened == TEE_SUCCESS) (void)TEE_WriteObjectData(object.get(), prefix, kLengthLen);
+}
+
 TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const char *id,
                                           uint32_t id_len, bool overwrite) {
   CHECK(id_len <= TEE_OBJECT_ID_MAX_LEN, TEE_ERROR_BAD_PARAMETERS, "pobj_id length too large\n");
 
+  uint8_t old_prefix[kLengthLen];
+  const bool has_old = read_prefix(id, id_len, old_prefix);
   stored_object object;
   TRY(open_or_create(__func__, id, id_len, overwrite, &object));
   uint8_t prefix[kLengthLen];
   put_u32(prefix, len);
   TRY_LOG(TEE_WriteObjectData(object.get(), prefix, kLengthLen), "Failed to write data size: 0x%x");
-  TRY_LOG(TEE_WriteObjectData(object.get(), data, len), "Failed to write data: 0x%x");
-  return TEE_SUCCESS;
+  const TEE_Result written = TEE_WriteObjectData(object.get(), data, len);
+  if (written == TEE_SUCCESS) return TEE_SUCCESS;
+
+  // The new length before the old payload would cut a record short, and with it the device off.
+  trace_error(__func__, __LINE__, "Failed to write data: 0x%x", written);
+  object.reset();
+  if (has_old) put_prefix_back(id, id_len, old_prefix);
+  return written;
 }
 
 TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_t id_len,

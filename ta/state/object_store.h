@@ -16,14 +16,15 @@
 #include "state/json.h"
 
 /// Creates the object or writes it over. `overwrite` is the flag of that name in the creation
-/// call; an existing object is opened and written over either way.
+/// call; an existing object is opened and written over either way. When its payload cannot be
+/// written, its old length is put back, so that it still gives its old payload.
 [[nodiscard]] TEE_Result save_data_to_persistent_object(const void *data, uint32_t len,
                                                         const char *id, uint32_t id_len,
                                                         bool overwrite);
 
 /// The payload in a new buffer, with a NUL behind it that is not counted. `*len` is less than the
 /// stored length when the object is shorter than it says. An object without a whole length prefix
-/// is no failure: `*data` is NULL then.
+/// is no failure: `*data` is NULL then, and `*len` the number of its bytes, 0 for an empty object.
 [[nodiscard]] TEE_Result allocate_and_load_data_from_persistent_object(const char *id,
                                                                        uint32_t id_len,
                                                                        uint8_t **data,

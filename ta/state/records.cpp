@@ -45,8 +45,10 @@ static TEE_Result load_sd_list(const char *caller, secret_bytes *data) {
       SD_LIST_ID, text_len(SD_LIST_ID), &data->data, &data->len);
   if (result == TEE_SUCCESS && data->len != 0 && data->data != nullptr) return TEE_SUCCESS;
   trace_error(caller, __LINE__, "read persistent object error, error code: %x", result);
+  const bool cut_short = data->data == nullptr && data->len != 0;
   data->reset();
   // Only a list that is not there may get its default: any other failure would lose every SD.
+  if (result == TEE_SUCCESS && cut_short) return TEE_ERROR_BAD_FORMAT;
   return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
 }
 

@@ -48,8 +48,10 @@ static TEE_Result load_payload(const char *caller, secret_bytes *payload) {
       TA_REGISTER_ID, kRegisterIdLen, &payload->data, &payload->len);
   if (result == TEE_SUCCESS && payload->data != nullptr && payload->len != 0) return TEE_SUCCESS;
   trace_error(caller, __LINE__, "read persistent object error, error code: %x", result);
+  const bool cut_short = payload->data == nullptr && payload->len != 0;
   payload->reset();
   // Only a table that is not there may be created: any other failure would lose every row.
+  if (result == TEE_SUCCESS && cut_short) return TEE_ERROR_BAD_FORMAT;
   return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
 }
 

@@ -49,6 +49,11 @@ HostDevice::HostDevice() {
   tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
 }
 
+AgentDevice::AgentDevice(const Snapshot &snapshot) {
+  for (const auto &[id, data] : snapshot.agent) host_.put_object(kAgentUuid, id, data);
+  for (const auto &[id, data] : snapshot.key_service) host_.put_object(kCorvelUuid, id, data);
+}
+
 bool AgentDevice::open(TEEC_Result *result) {
   if (is_open_) return true;
   uint32_t origin = 0;
@@ -112,7 +117,7 @@ Reply AgentDevice::send(uint32_t message_id, std::string_view text, size_t capac
 std::optional<std::string> AgentDevice::record(const std::string &id) const {
   const auto all = objects();
   const auto found = all.find(id);
-  if (found == all.end()) return std::nullopt;
+  if (found == all.end() || found->second.size() < 4) return std::nullopt;
   return found->second.substr(4, word_at(found->second, 0));
 }
 

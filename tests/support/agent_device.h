@@ -41,9 +41,16 @@ struct HostDevice : tee::test::Device {
   HostDevice();
 };
 
+/// What a device keeps: the objects of the agent and of the key service.
+struct Snapshot {
+  std::map<std::string, std::string> agent;
+  std::map<std::string, std::string> key_service;
+};
+
 class AgentDevice {
  public:
   AgentDevice() = default;
+  explicit AgentDevice(const Snapshot &snapshot);
   ~AgentDevice() { close(); }
   AgentDevice(const AgentDevice &) = delete;
   AgentDevice &operator=(const AgentDevice &) = delete;
@@ -68,6 +75,7 @@ class AgentDevice {
   std::optional<std::string> record(const std::string &id) const;
   void put_record(const std::string &id, std::string_view payload);
   std::map<std::string, std::string> objects() const { return host_.objects(kAgentUuid); }
+  Snapshot snapshot() const { return {objects(), host_.objects(kCorvelUuid)}; }
 
   tee_heap_stats stats();
 

@@ -60,6 +60,13 @@ Scene::Scene(const std::string &tsmid) : info(info_of(device.door())), tsm_(&tsm
   EXPECT_TRUE(device.open());
 }
 
+Scene::Scene(const Scene &other, const Snapshot &snapshot)
+    : device(snapshot),
+      info(other.info),
+      dsi_text(other.dsi_text),
+      dsi(other.dsi),
+      tsm_(other.tsm_) {}
+
 std::string Scene::dsihash() const {
   return tsm::dsi_hash_of_text(dsi_text);
 }
