@@ -120,6 +120,10 @@ class TraceSink {
   std::unique_ptr<Impl> impl_;
 };
 
+/// RSA keys are slow to make. From here on the first `count` keys that are generated of a size
+/// serve again and again, in turn, in this process; 0 makes every key a new one again.
+void reuse_generated_keys(unsigned count);
+
 /// Names the folder from which TA images are loaded, before the places that programs look in.
 void set_ta_directory(const std::string &directory);
 

@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <bit>
+#include <mutex>
 
 #include "instance.h"
 
@@ -122,7 +123,29 @@ SharedKey import_rsa_key(const Attributes &attributes) {
   return made ? share(key) : nullptr;
 }
 
-SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent) {
+namespace {
+
+// See reuse_generated_keys().
+struct KeyPool {
+  std::mutex lock;
+  size_t limit = 0;  // of keys for each size
+  std::map<uint32_t, std::vector<SharedKey>> keys;
+  size_t next = 0;
+
+  SharedKey take(uint32_t size) {
+    const std::lock_guard guard(lock);
+    const std::vector<SharedKey> &known = keys[size];
+    return limit != 0 && known.size() == limit ? known[next++ % limit] : nullptr;
+  }
+
+  void keep(uint32_t size, const SharedKey &key) {
+    const std::lock_guard guard(lock);
+    if (keys[size].size() < limit) keys[size].push_back(key);
+  }
+};
+KeyPool key_pool;
+
+SharedKey make_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent) {
   const QuietErrors quiet;
   const KeyContext context = rsa_context();
   if (!context || EVP_PKEY_keygen_init(context.get()) != 1 ||
@@ -136,6 +159,23 @@ SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exp
   }
   EVP_PKEY *key = nullptr;
   return EVP_PKEY_generate(context.get(), &key) == 1 ? share(key) : nullptr;
+}
+
+}  // namespace
+
+void reuse_generated_keys(size_t limit) {
+  const std::lock_guard guard(key_pool.lock);
+  key_pool.limit = limit;
+  key_pool.keys.clear();
+}
+
+SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent) {
+  if (!public_exponent.empty()) return make_rsa_key(size, public_exponent);
+  SharedKey key = key_pool.take(size);
+  if (key != nullptr) return key;
+  key = make_rsa_key(size, {});
+  if (key != nullptr) key_pool.keep(size, key);
+  return key;
 }
 
 Attributes export_rsa_key(const EVP_PKEY &key) {

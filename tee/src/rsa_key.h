@@ -30,6 +30,10 @@ SharedKey import_rsa_key(const Attributes &attributes);
 /// A new key pair; an empty exponent stands for 65537. NULL when OpenSSL refuses.
 SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponent);
 
+/// For tests: once `limit` keys of a size have been generated they are handed out again, in turn.
+/// 0, as at the start, makes every key a new one. Keys with an exponent on order are always new.
+void reuse_generated_keys(size_t limit);
+
 /// All eight attributes of a generated key, without leading zeros.
 Attributes export_rsa_key(const EVP_PKEY &key);
 

@@ -6,6 +6,7 @@
 #include "error.h"
 #include "host_device.h"
 #include "power_switch.h"
+#include "rsa_key.h"
 
 namespace tee::test {
 
@@ -113,6 +114,10 @@ void Device::remove_object(const TEE_UUID &uuid, const std::string &id) {
 uint64_t Device::durable_writes() const {
   const std::lock_guard guard(impl_->device->lock);
   return impl_->power->durable_writes();
+}
+
+void reuse_generated_keys(unsigned count) {
+  tee::reuse_generated_keys(count);
 }
 
 struct InsideTa::Impl {

@@ -238,6 +238,7 @@ constexpr uint32_t kSdNotListed = 0xDEAD000E;
 }  // namespace
 
 unsigned sweep(const Scenario &scenario, const FaultKind &kind) {
+  tee::test::reuse_generated_keys(7);
   return Sweep(scenario, kind).run();
 }
 
