@@ -221,7 +221,7 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index) {
 // ---- Edits
 
 // RFC 3629: no overlong forms, no surrogates, nothing above U+10FFFF.
-static bool is_utf8(const char *text) {
+bool json_is_utf8(const char *text) {
   const auto *at = reinterpret_cast<const uint8_t *>(text);
   const uint8_t *end = at + strlen(text);
   while (at != end) {
@@ -334,7 +334,7 @@ JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Va
 JSON_Status json_object_set_string(JSON_Object *object, const char *name, const char *string) {
   if (object == nullptr || name == nullptr || string == nullptr) return JSONFailure;
   member_place place;
-  if (!is_utf8(string) || !find_place(object, name, &place)) return JSONFailure;
+  if (!json_is_utf8(string) || !find_place(object, name, &place)) return JSONFailure;
   JSON_Value *member = new_value(kJsonString, name, string);
   if (member == nullptr) return JSONFailure;
   put_member(object, place, member);
@@ -367,7 +367,7 @@ JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value) {
 JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
   if (array == nullptr || string == nullptr || array->node.count == kMaxElements)
     return JSONFailure;
-  if (!is_utf8(string)) return JSONFailure;
+  if (!json_is_utf8(string)) return JSONFailure;
   JSON_Value *value = new_value(kJsonString, nullptr, string);
   if (value == nullptr) return JSONFailure;
   append(array, value);

@@ -78,6 +78,9 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
 
 // ---- Texts
 
+/// Whether a string can be set: well-formed UTF-8.
+[[nodiscard]] bool json_is_utf8(const char *string);
+
 /// A new text without white space outside strings. Slashes are escaped, control characters that
 /// have no letter of their own and bytes above 0x7F stand as they are.
 char *json_serialize_to_string(const JSON_Value *value);

@@ -30,6 +30,7 @@ static TEE_Result save_text(const char *text, const char *id) {
 
 bool can_be_stored(const char *text) {
   if (text == nullptr) return true;
+  if (!json_is_utf8(text)) return false;
   for (; *text != 0; ++text) {
     const auto c = static_cast<unsigned char>(*text);
     if (c < 0x20 && strchr("\b\t\n\f\r", c) == nullptr) return false;

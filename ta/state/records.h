@@ -15,8 +15,9 @@
 
 #include "state/json.h"
 
-/// False for a text with control characters that the compact form writes raw, so that the record
-/// would not parse when it is read back. A missing text (NULL) is not the business of this check.
+/// False for a text that is no UTF-8, which no record takes, or that has control characters which
+/// the compact form writes raw, so that the record would not parse when it is read back. A missing
+/// text (NULL) is not the business of this check.
 [[nodiscard]] bool can_be_stored(const char *text);
 
 // ---- SD list

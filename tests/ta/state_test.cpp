@@ -111,6 +111,19 @@ TEST_F(State, TheRegisterKeepsItsRowsInOrder) {
   EXPECT_EQ(object("OTRP_TA_REGISTER_INFO").substr(4, rows.size()), rows);
 }
 
+TEST_F(State, OnlyTextsThatComeBackCanBeStored) {
+  for (const char *text : {"", "plain", "\b\t\n\f\r\"\\/", "\x7F", "\u00e9\u20ac\U0001F600"}) {
+    EXPECT_TRUE(can_be_stored(text)) << text;
+    ASSERT_EQ(save_sd_info(text, "tsm", "sd"), TEE_SUCCESS);
+    const json_ptr record(get_json_by_name("SD_INFO_", "sd"));
+    EXPECT_STREQ(json_object_get_string(json_value_get_object(record.get()), "spid"), text);
+  }
+  for (const char *text : {"\x01", "a\x1F", "\x0B", "\xFF", "\xC3", "\xED\xA0\x80", "\xC0\xAF"}) {
+    EXPECT_FALSE(can_be_stored(text)) << text;
+  }
+  EXPECT_TRUE(can_be_stored(nullptr));
+}
+
 TEST_F(State, AnEmptyDeviceHasTheKnownHash) {
   start();
   EXPECT_THAT(device.objects({}), ElementsAre(Pair("SD_LIST_ID", word(14) + R"({"sd_list":[]})")));
