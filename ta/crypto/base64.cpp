@@ -113,7 +113,9 @@ struct decoder {
   uint8_t *to;
 
   void take_blocks();
-  void take_quartet();
+  int gather(uint32_t *bits);
+  bool take_group();
+  void take_rest();
 };
 
 }  // namespace
@@ -163,11 +165,11 @@ void decoder<Also>::take_blocks() {
   }
 }
 
-// The next four values, or as many as there are, however far apart they stand.
+// The next four values, or as many as there are, however far apart they stand. Returns how many.
 template <const alphabet &Also>
-void decoder<Also>::take_quartet() {
-  uint32_t bits = 0;
+int decoder<Also>::gather(uint32_t *bits) {
   int num_values = 0;
+  *bits = 0;
   while (num_values < 4 && at != end) {
     const auto left = static_cast<size_t>(end - at);
     const uint32_t len = left < kNumCharacters ? static_cast<uint32_t>(left) : kNumCharacters;
@@ -177,10 +179,31 @@ void decoder<Also>::take_quartet() {
     uint32_t used = 0;
     for (; used < len && num_values < 4; ++used) {
       if (distances[used] == 0) continue;
-      bits |= static_cast<uint32_t>(text[used] + distances[used]) << (18 - 6 * num_values++);
+      *bits |= static_cast<uint32_t>(text[used] + distances[used]) << (18 - 6 * num_values++);
     }
     at += used;
   }
+  return num_values;
+}
+
+// False, and nothing taken, when there are fewer than four values.
+template <const alphabet &Also>
+bool decoder<Also>::take_group() {
+  const char *start = at;
+  uint32_t bits = 0;
+  if (gather(&bits) < 4) {
+    at = start;
+    return false;
+  }
+  for (int i = 0; i < 3; ++i) *to++ = static_cast<uint8_t>(bits >> (16 - 8 * i));
+  return true;
+}
+
+// Fewer than four values; a last one alone gives no byte.
+template <const alphabet &Also>
+void decoder<Also>::take_rest() {
+  uint32_t bits = 0;
+  const int num_values = gather(&bits);
   for (int i = 0; i < num_values - 1; ++i) *to++ = static_cast<uint8_t>(bits >> (16 - 8 * i));
 }
 
@@ -193,10 +216,9 @@ static uint32_t decode(const char *caller, const char *text, uint32_t len, uint3
   *bytes = allocate_bytes(len / 4 * 3 + rest / 4 + rest % 4 + spare);
   CHECK_AS(caller, *bytes != nullptr, 0, "decode base64 but not memory");
   decoder<Also> in = {text, text + len, *bytes};
-  while (in.at != in.end) {
-    in.take_blocks();
-    in.take_quartet();
-  }
+  do in.take_blocks();
+  while (in.take_group());
+  in.take_rest();
   return static_cast<uint32_t>(in.to - *bytes);
 }
 
@@ -218,4 +240,20 @@ uint32_t base64urlDecodeStringRemoveEndZeroV2(const char *text, uint32_t len, ui
 
 uint32_t base64urlDecodeStringAddEndZeroV2(const char *text, uint32_t len, uint8_t **bytes) {
   return decode<kUrl>(__func__, text, len, 1, bytes);
+}
+
+uint32_t base64urlDecodePiece(char *text, uint32_t *len, bool is_last, uint8_t *to) {
+  decoder<kUrl> in = {text, text + *len, to};
+  do in.take_blocks();
+  while (in.take_group());
+  *len = 0;
+  if (is_last) {
+    in.take_rest();
+    return static_cast<uint32_t>(in.to - to);
+  }
+  for (; in.at != in.end; ++in.at) {
+    const characters one = {*in.at};
+    if (distances_of<kUrl>(one)[0] != 0) text[(*len)++] = *in.at;
+  }
+  return static_cast<uint32_t>(in.to - to);
 }

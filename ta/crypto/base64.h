@@ -27,4 +27,11 @@ uint32_t base64urlDecodeStringRemoveEndZeroV2(const char *text, uint32_t len, ui
 /// The same with a NUL behind the bytes, which is not counted: for bytes that are a text.
 uint32_t base64urlDecodeStringAddEndZeroV2(const char *text, uint32_t len, uint8_t **bytes);
 
+/// One piece of a URL text that comes in pieces. Decodes all whole groups of four characters to
+/// `to` and moves what is left over, three characters at most, to the front of `text`, as the
+/// beginning of the next piece; of the last piece the rest is decoded, too. `*len` is the length of
+/// the piece with what was left over before it, and then of what is left over now. Returns the
+/// number of bytes.
+uint32_t base64urlDecodePiece(char *text, uint32_t *len, bool is_last, uint8_t *to);
+
 #endif

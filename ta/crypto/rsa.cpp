@@ -275,3 +275,13 @@ TEE_Result sha_verify_signature(TEE_ObjectHandle key, const data_part *parts, ui
   return TEE_AsymmetricVerifyDigest(rsa.get(), nullptr, 0, digest.get(), digest_len, signature,
                                     signature_len);
 }
+
+TEE_Result sha_verify_digest(TEE_ObjectHandle key, const uint8_t *digest, uint32_t digest_len,
+                             const uint8_t *signature, uint32_t signature_len) {
+  uint32_t bits = 0;
+  TRY(key_bits(key, &bits));
+  operation rsa;
+  TRY(start_rsa(key, bits, TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_VERIFY, &rsa));
+  return TEE_AsymmetricVerifyDigest(rsa.get(), nullptr, 0, digest, digest_len, signature,
+                                    signature_len);
+}

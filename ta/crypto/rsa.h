@@ -73,4 +73,9 @@ TEE_ObjectHandle deserialize_rsa_key_from_tlv(const tlv_box *box);
                                               uint32_t num_parts, const uint8_t *signature,
                                               uint32_t signature_len);
 
+/// The same for a SHA-256 digest that the caller has computed.
+[[nodiscard]] TEE_Result sha_verify_digest(TEE_ObjectHandle key, const uint8_t *digest,
+                                           uint32_t digest_len, const uint8_t *signature,
+                                           uint32_t signature_len);
+
 #endif

@@ -6,8 +6,10 @@
 #include "crypto/base64.h"
 #include "crypto/corvel_client.h"
 #include "crypto/rsa.h"
+#include "crypto/symmetric.h"
 #include "failure.h"
 #include "ownership.h"
+#include "platform.h"
 #include "security/tsm_trust.h"
 
 namespace {
@@ -60,22 +62,91 @@ static TEE_Result read_envelope(const char *caller, const request_context *conte
   return TEE_SUCCESS;
 }
 
-static TEE_Result decode_payload(const char *caller, const jsmn_string *payload,
-                                 secret_bytes *decoded) {
-  decoded->len = base64urlDecodeStringAddEndZeroV2(payload->data, payload->len, &decoded->data);
-  CHECK_AS(caller, decoded->len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
+// Admits the TSM keys of a GetDeviceState payload, which has not been verified yet.
+static TEE_Result admit_key_chain(const char *caller, const jsmn_string *payload) {
+  secret_bytes decoded;
+  decoded.len = base64urlDecodeStringAddEndZeroV2(payload->data, payload->len, &decoded.data);
+  CHECK_AS(caller, decoded.len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
+  TRY_LOG_AS(caller, handle_tsm_key_chain(reinterpret_cast<const char *>(decoded.data)),
+             "handle_tsm_key_chain error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+// ---- The signing input
+//
+// It lies in memory that the normal world shares. A piece at a time is fetched from there, once, so
+// that what is hashed is what is decoded.
+
+static constexpr uint32_t kPieceLen = 4096;
+static constexpr uint32_t kLeftOverLen = 3;  // characters between two pieces
+
+namespace {
+
+struct signing_input {
+  operation sha;
+  tee_ptr<char> piece;  // what is left over, and then what is fetched
+
+  void hash_text(const jsmn_string &text);
+  void hash_and_decode(const jsmn_string &text, secret_bytes *decoded);
+  uint32_t fetch(const jsmn_string &text, uint32_t offset, uint32_t left_over);
+};
+
+}  // namespace
+
+// Returns the number of characters.
+uint32_t signing_input::fetch(const jsmn_string &text, uint32_t offset, uint32_t left_over) {
+  const uint32_t rest = text.len - offset;
+  const uint32_t len = rest < kPieceLen ? rest : kPieceLen;
+  memcpy(piece.get() + left_over, text.data + offset, len);
+  TEE_DigestUpdate(sha.get(), piece.get() + left_over, len);
+  return len;
+}
+
+void signing_input::hash_text(const jsmn_string &text) {
+  for (uint32_t offset = 0; offset < text.len;) offset += fetch(text, offset, 0);
+}
+
+void signing_input::hash_and_decode(const jsmn_string &text, secret_bytes *decoded) {
+  uint32_t left_over = 0;
+  for (uint32_t offset = 0; offset < text.len;) {
+    const uint32_t len = fetch(text, offset, left_over);
+    offset += len;
+    left_over += len;
+    decoded->len += base64urlDecodePiece(piece.get(), &left_over, offset == text.len,
+                                         decoded->data + decoded->len);
+  }
+}
+
+static TEE_Result digest_signing_input(const char *caller, const jsmn_string *payload,
+                                       const jsmn_string *protect, secret_bytes *decoded,
+                                       uint8_t digest[kSha256Len]) {
+  // Three bytes for four characters, what two or three more give, and a NUL.
+  decoded->data = allocate_bytes(payload->len / 4 * 3 + 3);
+  signing_input input;
+  input.piece.reset(reinterpret_cast<char *>(allocate_bytes(kLeftOverLen + kPieceLen)));
+  CHECK_AS(caller, decoded->data != nullptr && input.piece, TEE_ERROR_OUT_OF_MEMORY,
+           "decode base64 but not memory");
+  TRY_LOG_AS(caller, TEE_AllocateOperation(out(input.sha), TEE_ALG_SHA256, TEE_MODE_DIGEST, 0),
+             "TEE_AllocateOperation failed: %08x\n");
+  input.hash_text(*protect);
+  TEE_DigestUpdate(input.sha.get(), kDot.data, kDot.len);
+  input.hash_and_decode(*payload, decoded);
+  tee_length digest_len = kSha256Len;
+  TRY_LOG_AS(caller, TEE_DigestDoFinal(input.sha.get(), nullptr, 0, digest, &digest_len),
+             "TEE_DigestDoFinal failed: %08x\n");
   return TEE_SUCCESS;
 }
 
 bool verify_signature(TEE_ObjectHandle key, const jsmn_string *payload, const jsmn_string *protect,
-                      const jsmn_string *signature) {
-  secret_bytes decoded;
-  decoded.len =
-      base64urlDecodeStringRemoveEndZeroV2(signature->data, signature->len, &decoded.data);
-  CHECK(decoded.len != 0, false, "base64urlDecodeStringRemoveEndZero decode length 0");
-  const data_part parts[] = {{protect->data, protect->len}, kDot, {payload->data, payload->len}};
-  const TEE_Result result =
-      sha_verify_signature(key, parts, kNumSignedParts, decoded.data, decoded.len);
+                      const jsmn_string *signature, secret_bytes *decoded) {
+  secret_bytes bytes;
+  bytes.len = base64urlDecodeStringRemoveEndZeroV2(signature->data, signature->len, &bytes.data);
+  CHECK(bytes.len != 0, false, "base64urlDecodeStringRemoveEndZero decode length 0");
+  uint8_t digest[kSha256Len];
+  TEE_Result result = digest_signing_input(__func__, payload, protect, decoded, digest);
+  if (result == TEE_SUCCESS) {
+    result = sha_verify_digest(key, digest, kSha256Len, bytes.data, bytes.len);
+  }
   CHECK(result == TEE_SUCCESS, false, "sha_verify_signature error");
   return true;
 }
@@ -102,20 +173,18 @@ TEE_Result verify_decode_by_name(request_context *context) {
 
   // A TSM's first GetDeviceState is verified with a key that it delivers itself: the chain has to
   // be admitted first, which each of its keys earns by the CA-TSM key's signature alone.
-  secret_bytes payload;
   if (strcmp(context->request_name, kGetDeviceStateRequest) == 0) {
-    TRY(decode_payload(__func__, parts.payload.get(), &payload));
-    TRY_LOG(handle_tsm_key_chain(reinterpret_cast<const char *>(payload.data)),
-            "handle_tsm_key_chain error code: 0x%x");
+    TRY(admit_key_chain(__func__, parts.payload.get()));
   }
 
   key_object key;
   const TEE_Result found = get_tsm_pubkey_by_tsmid(tsmid.get(), out(key));
   CHECK(found == TEE_SUCCESS && key, found, "get tsm pubkey error, error code: 0x%x", found);
-  CHECK(
-      verify_signature(key.get(), parts.payload.get(), parts.protect.get(), parts.signature.get()),
-      OTRP_BAD_REQUEST, "Fail to pass signature verification\n");
-  if (payload.data == nullptr) TRY(decode_payload(__func__, parts.payload.get(), &payload));
+  secret_bytes payload;
+  CHECK(verify_signature(key.get(), parts.payload.get(), parts.protect.get(), parts.signature.get(),
+                         &payload),
+        OTRP_BAD_REQUEST, "Fail to pass signature verification\n");
+  CHECK(payload.len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
 
   context->payload_len = payload.len;
   context->payload = payload.release();

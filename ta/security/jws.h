@@ -16,6 +16,7 @@
 #include <tee_internal_api.h>
 
 #include "message.h"
+#include "ownership.h"
 #include "state/json.h"
 #include "state/token_reader.h"
 
@@ -30,9 +31,12 @@
 /// (an empty record), TEE_SUCCESS and no payload.
 [[nodiscard]] TEE_Result verify_decode_by_name(request_context *context);
 
-/// `payload`, `protect` and `signature` are base64url, as received.
+/// `payload`, `protect` and `signature` are base64url, as received, and may lie in memory that the
+/// normal world changes meanwhile. `*decoded` receives the payload that was signed, decoded from
+/// the very characters that were hashed, with a NUL behind it; it is for use only after success.
 [[nodiscard]] bool verify_signature(TEE_ObjectHandle key, const jsmn_string *payload,
-                                    const jsmn_string *protect, const jsmn_string *signature);
+                                    const jsmn_string *protect, const jsmn_string *signature,
+                                    secret_bytes *decoded);
 
 /// The envelope of a response as a new text, or NULL. `header` replaces the generated one and is
 /// taken over on success, unless it is NULL; without `key` the device's TEE key signs.

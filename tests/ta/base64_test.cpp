@@ -172,5 +172,32 @@ TEST_F(Base64, NullAndNoMemory) {
                                "base64DecodeStringRemoveEndZero: decode base64 but not memory"}));
 }
 
+TEST_F(Base64, PiecesGiveWhatTheWholeGives) {
+  std::mt19937 random(7);
+  const std::string characters = "ABCDwxyz0189-_+/=.\n ";
+  for (int i = 0; i < 2000; ++i) {
+    std::string text;
+    for (size_t n = random() % 120; n > 0; --n) text += characters[random() % characters.size()];
+    secret_bytes whole;
+    whole.len = base64urlDecodeStringRemoveEndZeroV2(
+        text.data(), static_cast<uint32_t>(text.size()), &whole.data);
+
+    std::string bytes(text.size() + 3, 0);
+    uint32_t num_bytes = 0;
+    std::string piece;
+    for (size_t offset = 0; offset < text.size();) {
+      const size_t taken = std::min<size_t>(1 + random() % 40, text.size() - offset);
+      piece += text.substr(offset, taken);
+      offset += taken;
+      auto len = static_cast<uint32_t>(piece.size());
+      num_bytes += base64urlDecodePiece(piece.data(), &len, offset == text.size(),
+                                        reinterpret_cast<uint8_t *>(bytes.data()) + num_bytes);
+      ASSERT_LE(len, 3u);
+      piece.resize(len);
+    }
+    EXPECT_EQ(bytes.substr(0, num_bytes), str(whole)) << text;
+  }
+}
+
 }  // namespace
 }  // namespace otrp_test

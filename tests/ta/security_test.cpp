@@ -45,12 +45,21 @@ TEST_F(Security, SignaturesAnswerRfc7515) {
   const jsmn_string payload = {known::kPayload, sizeof known::kPayload - 1};
   const jsmn_string protect = {known::kProtect, sizeof known::kProtect - 1};
   jsmn_string signature = {known::kSignature, sizeof known::kSignature - 1};
-  EXPECT_TRUE(verify_signature(key.get(), &payload, &protect, &signature));
-  EXPECT_FALSE(verify_signature(key.get(), &protect, &payload, &signature));
+  const auto verify = [&key](const jsmn_string &payload_text, const jsmn_string &protect_text,
+                             const jsmn_string &signature_text, secret_bytes *decoded) {
+    decoded->reset();
+    return verify_signature(key.get(), &payload_text, &protect_text, &signature_text, decoded);
+  };
+  secret_bytes decoded;
+  ASSERT_TRUE(verify(payload, protect, signature, &decoded));
+  EXPECT_EQ(str(decoded), unbase64url(known::kPayload));
+  EXPECT_EQ(decoded.data[decoded.len], 0);
+  EXPECT_FALSE(verify(protect, payload, signature, &decoded));
   signature.len -= 2;
-  EXPECT_FALSE(verify_signature(key.get(), &payload, &protect, &signature));
+  EXPECT_FALSE(verify(payload, protect, signature, &decoded));
   signature.len = 0;
-  EXPECT_FALSE(verify_signature(key.get(), &payload, &protect, &signature));
+  EXPECT_FALSE(verify(payload, protect, signature, &decoded));
+  decoded.reset();
 
   secret_bytes own;
   ASSERT_EQ(sign_with_spaik_key(&payload, &protect, &own.data, &own.len, key.get()), TEE_SUCCESS);
