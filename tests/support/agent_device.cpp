@@ -54,6 +54,10 @@ AgentDevice::AgentDevice(const Snapshot &snapshot) {
   for (const auto &[id, data] : snapshot.key_service) host_.put_object(kCorvelUuid, id, data);
 }
 
+HostDevice::HostDevice(const std::string &state_directory) : Device(state_directory) {
+  tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
+}
+
 bool AgentDevice::open(TEEC_Result *result) {
   if (is_open_) return true;
   uint32_t origin = 0;

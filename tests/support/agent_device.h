@@ -39,6 +39,7 @@ struct Reply {
 /// Finds the TA images of this build.
 struct HostDevice : tee::test::Device {
   HostDevice();
+  explicit HostDevice(const std::string &state_directory);
 };
 
 /// What a device keeps: the objects of the agent and of the key service.
@@ -51,6 +52,8 @@ class AgentDevice {
  public:
   AgentDevice() = default;
   explicit AgentDevice(const Snapshot &snapshot);
+  /// With its objects on disk.
+  explicit AgentDevice(const std::string &state_directory) : host_(state_directory) {}
   ~AgentDevice() { close(); }
   AgentDevice(const AgentDevice &) = delete;
   AgentDevice &operator=(const AgentDevice &) = delete;

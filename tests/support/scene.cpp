@@ -60,6 +60,11 @@ Scene::Scene(const std::string &tsmid) : info(info_of(device.door())), tsm_(&tsm
   EXPECT_TRUE(device.open());
 }
 
+Scene::Scene(const std::string &tsmid, const std::string &state_directory)
+    : device(state_directory), info(info_of(device.door())), tsm_(&tsm_named(tsmid)) {
+  EXPECT_TRUE(device.open());
+}
+
 Scene::Scene(const Scene &other, const Snapshot &snapshot)
     : device(snapshot),
       info(other.info),

@@ -51,6 +51,8 @@ std::string taid(const std::string &name);
 class Scene {
  public:
   explicit Scene(const std::string &tsmid = "tsm1");
+  /// A device with its objects in a state directory.
+  Scene(const std::string &tsmid, const std::string &state_directory);
   /// A device in the state of `other`, as its TSM knows it; no session is open yet.
   Scene(const Scene &other, const Snapshot &snapshot);
 
