@@ -22,6 +22,10 @@ struct Case {
   const FaultKind *kind;
 };
 
+std::ostream &operator<<(std::ostream &out, const Case &c) {
+  return out << c.scenario->name << ", " << c.kind->name;
+}
+
 std::vector<Case> all_cases() {
   std::vector<Case> cases;
   for (const Scenario &scenario : scenarios()) {
