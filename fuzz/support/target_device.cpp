@@ -42,14 +42,24 @@ bool wiped_or_untouched(std::string_view bytes) {
   return end == std::string_view::npos || untouched(bytes.substr(end));
 }
 
-void require_verified(std::string_view response, const tsm::RsaKey &tee_key) {
+tsm::Envelope verified(std::string_view response, const tsm::RsaKey &tee_key) {
   try {
-    const tsm::Envelope envelope = tsm::parse_envelope(response);
-    if (envelope.message->id == tsm::MessageId::kGetTaInfo) return;  // an AIK signs it
-    require(tsm::signature_verifies(envelope, tee_key), "a response's signature verifies");
+    tsm::Envelope envelope = tsm::parse_envelope(response);
+    // An AIK signs what GetTAInfo answers.
+    require(envelope.message->id == tsm::MessageId::kGetTaInfo ||
+                tsm::signature_verifies(envelope, tee_key),
+            "a response's signature verifies");
+    return envelope;
   } catch (const tsm::NotVerified &error) {
     require(false, error.what());
+    throw;
   }
+}
+
+bool says_pass(const tsm::Envelope &envelope) {
+  const tsm::Json *tbs = tsm::find_object(envelope.payload, envelope.message->tbs_response);
+  const std::string *status = tbs == nullptr ? nullptr : tsm::find_string(*tbs, "status");
+  return status != nullptr && *status == "pass";
 }
 
 // `response` becomes what is to be verified.
@@ -95,6 +105,18 @@ void require_query_answer(const device::Reply &reply) {
       text.starts_with(reply.result == TEEC_SUCCESS ? R"({"status":"0",)" : R"({"status":"-1",)"),
       "an answer's text says what its result does");
   require(untouched(output.substr(reply.size)), "nothing stands behind the answer");
+}
+
+// The entries of a list, sorted: a new instance has them in the order in which they are stored.
+std::string in_any_order(const char *list) {
+  const std::optional<tsm::Json> entries = tsm::parse_json(list);
+  if (!entries) return list;
+  std::vector<std::string> texts;
+  for (const tsm::Json &entry : *entries) texts.push_back(entry.dump());
+  std::ranges::sort(texts);
+  std::string sorted;
+  for (const std::string &text : texts) sorted += text + "\n";
+  return sorted;
 }
 
 void require_clean(device::Device &door) {
@@ -153,13 +175,14 @@ device::Reply TargetDevice::run(uint32_t command, std::string_view input, uint32
 
 void TargetDevice::require_message_answer(const device::Reply &reply) {
   const std::string_view output = reply.output.bytes();
+  passed_ = false;
   if (reply.result != TEEC_SUCCESS) {
     require_refusal(reply, output);
     return;
   }
   std::string_view response;
   require_answer(reply, output, &response);
-  if (!response.empty()) require_verified(response, tee_key());
+  if (!response.empty()) passed_ = says_pass(verified(response, tee_key()));
 }
 
 // The key service makes it when it is first asked.
@@ -175,8 +198,11 @@ void TargetDevice::store(const Objects &objects) {
 
 void TargetDevice::restore() {
   if (host_.durable_writes() == writes_ && state() == first_state_) return;
+  const std::string known = in_any_order(g_dsi->sdl_json_str);
   close();
   require(open(), "the agent starts with what it has stored");
+  require(!passed_ || in_any_order(g_dsi->sdl_json_str) == known,
+          "a new instance knows the same security domains");
   close();
   store(first_);
   require(open() && state() == first_state_, "the agent starts as it did at first");

@@ -37,7 +37,8 @@ class TargetDevice {
   void store(const Objects &objects);
 
   /// Gives an open device the objects and the instance back that it began with, if any have
-  /// changed. Whatever it holds, the agent must be able to start with that.
+  /// changed. The agent must be able to start with what is stored then, and after a request that
+  /// passed the new instance must know the same security domains.
   void restore();
 
   Objects agent_objects() const;
@@ -56,6 +57,7 @@ class TargetDevice {
   std::string first_state_;
   uint64_t writes_ = 0;
   std::optional<tsm::RsaKey> tee_key_;
+  bool passed_ = false;  // the latest message, as its response says
   std::unique_ptr<device::Session> session_;
 };
 
