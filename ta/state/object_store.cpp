@@ -108,6 +108,9 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
 }
 
 TEE_Result delete_persistent_object(const char *id, uint32_t id_len) {
+  // An open call with such an ID would make the platform panic.
+  CHECK(id_len <= TEE_OBJECT_ID_MAX_LEN, TEE_ERROR_BAD_PARAMETERS,
+        "TEE_OpenPersistentObject fails %x", TEE_ERROR_BAD_PARAMETERS);
   stored_object object;
   TRY_LOG(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len, TEE_DATA_FLAG_ACCESS_WRITE_META,
                                    out(object)),

@@ -30,7 +30,8 @@
                                                                        uint8_t **data,
                                                                        uint32_t *len);
 
-/// TEE_ERROR_ITEM_NOT_FOUND when there is no such object.
+/// TEE_ERROR_ITEM_NOT_FOUND when there is no such object, TEE_ERROR_BAD_PARAMETERS when there can
+/// be none of that ID.
 [[nodiscard]] TEE_Result delete_persistent_object(const char *id, uint32_t id_len);
 
 /// `*id` receives a new text, prefix followed by name; NULL when either is NULL or memory ran out.

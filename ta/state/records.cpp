@@ -216,7 +216,7 @@ static TEE_Result delete_record(const char *caller, const char *prefix, const ch
                                 const char *no_memory, const char *failed) {
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
-  CHECK_AS(caller, id, OTRP_NO_MEMORY, no_memory);
+  CHECK_AS(caller, id, OTRP_NO_MEMORY, "%s", no_memory);
   TRY_LOG_AS(caller, delete_persistent_object(id.get(), text_len(id.get())), failed);
   return TEE_SUCCESS;
 }

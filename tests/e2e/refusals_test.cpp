@@ -240,6 +240,12 @@ const RefusalCase kRefusals[] = {
      {},
      TEEC_ERROR_ITEM_NOT_FOUND,
      kWithoutIds},
+    {"DeleteTaTooLongForARecord",
+     kDeleteTa,
+     [](Options &o) { o.taid = std::string(57, 'a'); },
+     {},
+     TEEC_ERROR_BAD_PARAMETERS,
+     kWithoutIds},
 };
 
 class Refusal : public testing::TestWithParam<RefusalCase> {};

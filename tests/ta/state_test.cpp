@@ -62,6 +62,7 @@ TEST_F(State, AShorterPayloadLeavesTheTailOfALongerOne) {
   ASSERT_EQ(delete_persistent_object("id", 2), TEE_SUCCESS);
   EXPECT_EQ(delete_persistent_object("id", 2), TEE_ERROR_ITEM_NOT_FOUND);
   EXPECT_EQ(save(std::string(65, 'i'), "x"), TEE_ERROR_BAD_PARAMETERS);
+  EXPECT_EQ(delete_persistent_object(std::string(65, 'i').data(), 65), TEE_ERROR_BAD_PARAMETERS);
   EXPECT_EQ(save(std::string(64, 'i'), "x"), TEE_SUCCESS);
 }
 

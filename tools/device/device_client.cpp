@@ -20,7 +20,6 @@ constexpr uint32_t kDeviceIdCommand = 2;
 constexpr uint32_t kPublicIdentityCommand = 0x100;  // of the key service
 
 constexpr size_t kWordLen = 4;
-constexpr size_t kAnswerHeaderLen = kWordLen + kWordLen;
 constexpr uint32_t kImageDidNotFit = 0xDEAD1002;  // as a status beside a response
 
 constexpr uint32_t kQueryCapacity = 256;  // answers are texts of about 50 characters

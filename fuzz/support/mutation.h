@@ -1,0 +1,34 @@
+/// Mutations of texts, for the targets' own mutators.
+#ifndef FUZZ_MUTATION_H
+#define FUZZ_MUTATION_H
+
+#include <random>
+#include <string>
+#include <string_view>
+
+#include "tsm/json.h"
+
+namespace fuzz {
+
+class Random {
+ public:
+  explicit Random(unsigned seed) : engine_(seed) {}
+  size_t below(size_t end) { return engine_() % end; }
+  bool one_in(size_t n) { return below(n) == 0; }
+
+ private:
+  std::minstd_rand engine_;
+};
+
+/// What the fuzzer itself does to bytes.
+std::string mutate_bytes(std::string_view bytes, size_t max_len);
+
+/// Changes one thing about a JSON text: its bytes, or a member, an element, a name or a value.
+std::string mutate_json(std::string_view text, size_t max_len, Random &random);
+
+/// Hands a mutator's work to the fuzzer. What is too long is cut.
+size_t give(std::string_view bytes, uint8_t *data, size_t max_size);
+
+}  // namespace fuzz
+
+#endif

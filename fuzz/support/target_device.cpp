@@ -1,0 +1,224 @@
+#include "support/target_device.h"
+
+#include <ta_config.h>
+
+#include <algorithm>
+#include <cstring>
+
+#include "state/dsi.h"
+#include "support/corvel_entry_points.h"
+#include "support/require.h"
+#include "tsm/response.h"
+
+namespace fuzz {
+namespace {
+
+constexpr size_t kWordLen = 4;
+constexpr size_t kHeaderLen = kWordLen + kWordLen;
+constexpr uint32_t kDsiBlocks = 4;  // the structure and its three texts
+
+const TEE_UUID kAgent = TA_UUID;
+const TEE_UUID kKeyService = CORVEL_UUID;
+
+uint32_t word_at(std::string_view bytes, size_t offset) {
+  uint32_t word = 0;
+  for (size_t i = kWordLen; i-- > 0;) word = word << 8 | static_cast<uint8_t>(bytes[offset + i]);
+  return word;
+}
+
+// Compares the bytes with themselves one further on: these are long, and looked at in every run.
+bool all_alike(std::string_view bytes) {
+  return bytes.empty() || std::memcmp(bytes.data(), bytes.data() + 1, bytes.size() - 1) == 0;
+}
+
+bool untouched(std::string_view bytes) {
+  return all_alike(bytes) &&
+         (bytes.empty() || static_cast<uint8_t>(bytes.front()) == device::kUntouched);
+}
+
+// Where the payload stood there are zeros, up to where it ended.
+bool wiped_or_untouched(std::string_view bytes) {
+  const size_t end = bytes.find_first_not_of('\0');
+  return end == std::string_view::npos || untouched(bytes.substr(end));
+}
+
+tsm::Envelope verified(std::string_view response, const tsm::RsaKey &tee_key) {
+  try {
+    tsm::Envelope envelope = tsm::parse_envelope(response);
+    // An AIK signs what GetTAInfo answers.
+    require(envelope.message->id == tsm::MessageId::kGetTaInfo ||
+                tsm::signature_verifies(envelope, tee_key),
+            "a response's signature verifies");
+    return envelope;
+  } catch (const tsm::NotVerified &error) {
+    require(false, error.what());
+    throw;
+  }
+}
+
+bool says_pass(const tsm::Envelope &envelope) {
+  const tsm::Json *tbs = tsm::find_object(envelope.payload, envelope.message->tbs_response);
+  const std::string *status = tbs == nullptr ? nullptr : tsm::find_string(*tbs, "status");
+  return status != nullptr && *status == "pass";
+}
+
+// `response` becomes what is to be verified.
+void require_answer(const device::Reply &reply, std::string_view output,
+                    std::string_view *response) {
+  require(output.size() >= kHeaderLen && reply.size >= kHeaderLen, "an answer has a header");
+  const uint32_t status = word_at(output, 0);
+  const size_t response_len = word_at(output, kWordLen);
+  require(response_len <= output.size() - kHeaderLen, "a response fits");
+  size_t end = kHeaderLen + response_len;
+  require(reply.size >= end, "the size covers the response");
+  *response = output.substr(kHeaderLen, response_len);
+  if (status == TEE_SUCCESS) {
+    require(response_len != 0, "a success has a response");
+    require(reply.size <= output.size(), "a success fits");
+    if (reply.size != end) {
+      require(reply.size > end + kWordLen, "an image has a length and is not empty");
+      require(word_at(output, end) == reply.size - end - kWordLen, "an image's length is right");
+      end = reply.size;
+    }
+  }
+  require(wiped_or_untouched(output.substr(end)), "nothing stands behind the answer");
+}
+
+void require_refusal(const device::Reply &reply, std::string_view output) {
+  require(reply.size == output.size(), "a refused frame leaves the size");
+  if (untouched(output)) return;
+  require(output.size() >= kHeaderLen && word_at(output, 0) == reply.result &&
+              word_at(output, kWordLen) == 0,
+          "a refused frame is answered by its code, or not at all");
+  require(untouched(output.substr(kHeaderLen)), "a refused frame has no other answer");
+}
+
+void require_query_answer(const device::Reply &reply) {
+  const std::string_view output = reply.output.bytes();
+  if (untouched(output)) return;
+  require(reply.result != TEEC_ERROR_SHORT_BUFFER, "nothing is written where it does not fit");
+  require(reply.size >= kHeaderLen && reply.size <= output.size(), "an answer fits");
+  require(word_at(output, 0) == reply.result, "an answer repeats the result");
+  require(word_at(output, kWordLen) == reply.size - kHeaderLen, "an answer's length is right");
+  const std::string_view text = output.substr(kHeaderLen, reply.size - kHeaderLen);
+  require(
+      text.starts_with(reply.result == TEEC_SUCCESS ? R"({"status":"0",)" : R"({"status":"-1",)"),
+      "an answer's text says what its result does");
+  require(untouched(output.substr(reply.size)), "nothing stands behind the answer");
+}
+
+// The entries of a list, sorted: a new instance has them in the order in which they are stored.
+std::string in_any_order(const char *list) {
+  const std::optional<tsm::Json> entries = tsm::parse_json(list);
+  if (!entries) return list;
+  std::vector<std::string> texts;
+  for (const tsm::Json &entry : *entries) texts.push_back(entry.dump());
+  std::ranges::sort(texts);
+  std::string sorted;
+  for (const std::string &text : texts) sorted += text + "\n";
+  return sorted;
+}
+
+void require_clean(device::Device &door) {
+  tee_heap_stats now{};
+  const TEEC_Result found = tee_inspect_stats(door.context(), &device::kAgentUuid, &now);
+  require(found == TEEC_SUCCESS, "the instance lives on");
+  require(now.live_blocks == kDsiBlocks, "only the state document is left on the heap");
+  require(now.open_objects == 0 && now.open_operations == 0 && now.open_sessions == 0,
+          "no handle is left open");
+}
+
+}  // namespace
+
+uint32_t capacity_of(std::string_view frame) {
+  const uint32_t word = frame.size() < kWordLen ? 0 : word_at(frame, 0);
+  return word == 0 ? kMaxCapacity : std::min(word, kMaxCapacity);
+}
+
+TargetDevice::TargetDevice(const Objects &agent, const Objects &key_service)
+    : door_(host_.name()), first_(agent) {
+  host_.register_ta({.uuid = kAgent},
+                    {TA_CreateEntryPoint, TA_DestroyEntryPoint, TA_OpenSessionEntryPoint,
+                     TA_CloseSessionEntryPoint, TA_InvokeCommandEntryPoint});
+  host_.register_ta({.uuid = kKeyService},
+                    {corvel_create, corvel_destroy, corvel_open, corvel_close, corvel_invoke});
+  for (const auto &[id, data] : key_service) host_.put_object(kKeyService, id, data);
+  store(first_);
+  require(open(), "the agent starts");
+  first_state_ = state();
+  writes_ = host_.durable_writes();
+}
+
+bool TargetDevice::open() {
+  try {
+    session_ = std::make_unique<device::Session>(door_, device::kAgentUuid);
+  } catch (const device::Error &) {
+    return false;
+  }
+  require_clean(door_);
+  return true;
+}
+
+void TargetDevice::close() {
+  session_.reset();
+}
+
+device::Reply TargetDevice::run(uint32_t command, std::string_view input, uint32_t capacity) {
+  device::Reply reply = session_->invoke(
+      {.command_id = command, .input = device::Buffer(input), .capacity = capacity});
+  if (command == kMessageCommand) require_message_answer(reply);
+  if (command == kQueryCommand) require_query_answer(reply);
+  require_clean(door_);
+  log_.clear();
+  return reply;
+}
+
+void TargetDevice::require_message_answer(const device::Reply &reply) {
+  const std::string_view output = reply.output.bytes();
+  passed_ = false;
+  if (reply.result != TEEC_SUCCESS) {
+    require_refusal(reply, output);
+    return;
+  }
+  std::string_view response;
+  require_answer(reply, output, &response);
+  if (!response.empty()) passed_ = says_pass(verified(response, tee_key()));
+}
+
+// The key service makes it when it is first asked.
+const tsm::RsaKey &TargetDevice::tee_key() {
+  if (!tee_key_) tee_key_ = tee_key_of(key_service_objects());
+  return *tee_key_;
+}
+
+void TargetDevice::store(const Objects &objects) {
+  for (const auto &[id, data] : agent_objects()) host_.remove_object(kAgent, id);
+  for (const auto &[id, data] : objects) host_.put_object(kAgent, id, data);
+}
+
+void TargetDevice::restore() {
+  if (host_.durable_writes() == writes_ && state() == first_state_) return;
+  const std::string known = in_any_order(g_dsi->sdl_json_str);
+  close();
+  require(open(), "the agent starts with what it has stored");
+  require(!passed_ || in_any_order(g_dsi->sdl_json_str) == known,
+          "a new instance knows the same security domains");
+  close();
+  store(first_);
+  require(open() && state() == first_state_, "the agent starts as it did at first");
+  writes_ = host_.durable_writes();
+}
+
+Objects TargetDevice::agent_objects() const {
+  return host_.objects(kAgent);
+}
+
+Objects TargetDevice::key_service_objects() const {
+  return host_.objects(kKeyService);
+}
+
+std::string TargetDevice::state() const {
+  return std::string(g_dsi->sdl_json_str) + g_dsi->spl_json_str + g_dsi->tal_json_str;
+}
+
+}  // namespace fuzz
