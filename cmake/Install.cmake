@@ -22,6 +22,7 @@ foreach(program otrp-device otrp-tsm)
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME ${program})
 endforeach()
 install(FILES LICENSE NOTICE README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR} RENAME copyright)  # where Debian looks
 
 # ---- For clients: find_package(otrp-tee) and pkg-config otrp-tee
 
@@ -42,9 +43,9 @@ set(CPACK_PACKAGE_VENDOR "OTrP device side authors")
 set(CPACK_PACKAGE_CONTACT "OTrP device side authors")
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "Device side of the Open Trust Protocol")
 set(CPACK_PACKAGE_DESCRIPTION
-"An OTrP agent for GlobalPlatform TEEs, a TEE to run it on any Linux machine, a
-key service, and command lines for the device and for a Trusted Service Manager.
-It is for development and simulation: the TEE isolates nothing.")
+"An OTrP agent for GlobalPlatform TEEs, a TEE to run it on any Linux machine,
+a key service, and command lines for the device and for a Trusted Service
+Manager. It is for development and simulation: the TEE isolates nothing.")
 set(CPACK_PACKAGE_CHECKSUM SHA256)
 set(CPACK_STRIP_FILES ON)
 set(CPACK_VERBATIM_VARIABLES ON)
