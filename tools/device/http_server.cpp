@@ -3,6 +3,9 @@
 #include <httplib.h>
 #include <pthread.h>
 
+#include <algorithm>
+#include <atomic>
+#include <cctype>
 #include <csignal>
 #include <thread>
 
@@ -32,17 +35,21 @@ void write_answer(const HttpAnswer &answer, httplib::Response &response) {
   response.set_content(answer.body, answer.type);
 }
 
-/// Other types are those that a web page may send to any address without being asked.
-bool is_json(const httplib::Request &request) {
+/// Other types are those that a web page may send to any address without being asked. What is
+/// compressed would not tell its length before it is read.
+bool is_plain_json(const httplib::Request &request) {
   std::string type = request.get_header_value("Content-Type");
   type = type.substr(0, type.find_first_of("; "));
-  return type == kOtrpType || type == "application/json";
+  std::ranges::transform(type, type.begin(), [](unsigned char c) { return std::tolower(c); });
+  return (type == kOtrpType || type == "application/json") &&
+         !request.has_header("Content-Encoding");
 }
 
 void answer_message(HttpService &service, const httplib::Request &request,
                     httplib::Response &response, const httplib::ContentReader &read_content) {
-  if (!is_json(request)) {
-    return write_answer(http_failure(415, "expected a Content-Type of " + std::string(kOtrpType)),
+  if (!is_plain_json(request)) {
+    return write_answer(http_failure(415, "expected a Content-Type of " + std::string(kOtrpType) +
+                                              " and no Content-Encoding"),
                         response);
   }
   std::string body;
@@ -162,17 +169,20 @@ void run_http_server(Device &device, const Endpoint &endpoint, size_t max_body_l
   listen(server, endpoint);
 
   const pthread_t waiting = pthread_self();
-  bool stopped_by_signal = true;
+  std::atomic<bool> has_ended = false;
   std::jthread serving([&] {
-    if (server.listen_after_bind()) return;
-    stopped_by_signal = false;
+    server.listen_after_bind();
+    has_ended = true;
     pthread_kill(waiting, SIGTERM);
   });
   int signal = 0;
   sigwait(&signals, &signal);
+  const bool was_stopped = !has_ended;
+  // A server that does not run yet would not notice.
+  while (!server.is_running() && !has_ended) std::this_thread::yield();
   server.stop();
   serving.join();
-  if (!stopped_by_signal) throw std::runtime_error("the server stopped listening");
+  if (!was_stopped) throw std::runtime_error("the server stopped listening");
 }
 
 }  // namespace device
