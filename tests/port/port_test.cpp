@@ -1,6 +1,5 @@
-// A device behind any TEE Client API, as a TSM meets it. Where the device is real, it is left as it
-// was found, but for the TSM that makes itself known; docs/porting.md says how to point this at
-// one.
+// A device behind any TEE Client API, as a TSM meets it. A real device is left as it was found, but
+// for the TSM that makes itself known and a row in the register of images.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
