@@ -1,6 +1,6 @@
 # otrp_generate_ca_tsm_key(PEM HEADER): writes the modulus of a 2048-bit RSA key as a C++ constant.
 function(otrp_generate_ca_tsm_key pem header)
-  find_program(OPENSSL_PROGRAM openssl REQUIRED)
+  find_program(OPENSSL_PROGRAM openssl NO_CMAKE_FIND_ROOT_PATH REQUIRED)
   foreach(form "-pubin" "")
     execute_process(
       COMMAND ${OPENSSL_PROGRAM} rsa ${form} -in ${pem} -noout -text

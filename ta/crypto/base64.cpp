@@ -147,7 +147,7 @@ static inline void store_big_endian(uint32_t bits, uint8_t *to) {
 // The usual case: stops before the first block that has something to skip in it.
 template <const alphabet &Also>
 void decoder<Also>::take_blocks() {
-  for (; end - at >= kNumCharacters; at += kNumCharacters, to += kBlockLen) {
+  for (; static_cast<size_t>(end - at) >= kNumCharacters; at += kNumCharacters, to += kBlockLen) {
     characters text;
     memcpy(&text, at, sizeof text);
     const characters distances = distances_of<Also>(text);

@@ -27,15 +27,23 @@ Error bad_image(const fs::path &file, const std::string &why) {
 
 // ---- Finding
 
+// Where this library was loaded from; empty when it is unknown.
+fs::path own_path() {
+  Dl_info library;
+  if (::dladdr(reinterpret_cast<const void *>(&load_program), &library) == 0) return {};
+  std::error_code error;
+  const fs::path path = fs::canonical(library.dli_fname, error);
+  return error ? fs::path() : path;
+}
+
 std::vector<fs::path> search_path() {
   std::vector<fs::path> folders;
   if (!g_test_directory.empty()) folders.emplace_back(g_test_directory);
   std::error_code error;
   const fs::path program = fs::read_symlink("/proc/self/exe", error);
   if (!error) folders.push_back(program.parent_path().parent_path() / "ta");
-#ifdef TEE_INSTALLED_TA_DIR
-  folders.emplace_back(TEE_INSTALLED_TA_DIR);
-#endif
+  const fs::path library = own_path();
+  if (!library.empty()) folders.push_back(library.parent_path() / "otrp" / "ta");
   if (const char *folder = std::getenv("OTRP_TA_DIR"); folder != nullptr && *folder != '\0') {
     folders.emplace_back(folder);
   }

@@ -1,8 +1,8 @@
 /// Finds and loads TA images.
 ///
 /// An image is the file UUID.so, the UUID in lower case, in the first of these folders that has
-/// it: the one that a test named; "../ta" beside the folder of the running program; the installed
-/// one; $OTRP_TA_DIR.
+/// it: the one that a test named; "../ta" beside the folder of the running program; "otrp/ta"
+/// beside this library, where installing puts them; $OTRP_TA_DIR.
 #ifndef TEE_LOADER_H
 #define TEE_LOADER_H
 

@@ -2,12 +2,12 @@
 
 #include <cstdio>
 #include <iostream>
-#include <nlohmann/json.hpp>
 #include <optional>
 
-#include "common/encoding.h"
 #include "common/files.h"
 #include "device/device_client.h"
+#include "device/http_server.h"
+#include "device/info_json.h"
 #include "device/inspect.h"
 #include "device/object_id.h"
 #include "device/raw_session.h"
@@ -70,6 +70,8 @@ const Message &message_of(const Arguments &arguments) {
   throw tools::UsageError("unknown message \"" + arguments.message + "\": expected one of" + names);
 }
 
+constexpr uint32_t kMaxServedLen = 1u << 30;  // what a request and its answer can have at once
+
 uint32_t capacity_of(const Arguments &arguments) {
   if (arguments.capacity.empty()) return kDefaultCapacity;
   return parse_number("--capacity", arguments.capacity);
@@ -89,11 +91,7 @@ void write_image(const Arguments &arguments, const Answer &answer) {
 void print_info(const Arguments &arguments) {
   Device device(arguments.state_directory);
   const StatsAtEnd stats(arguments, device);
-  const Info info = read_info(device);
-  const nlohmann::ordered_json document = {
-      {"device_id", info.device_id},
-      {"tee_public_key", tools::base64url_encode(info.tee_public_key)}};
-  print(document.dump() + "\n");
+  print(info_json(read_info(device)));
 }
 
 void send_request(const Arguments &arguments) {
@@ -166,6 +164,13 @@ void obey_session(const Arguments &arguments) {
   std::optional<Session> agent;
   const StatsAtEnd stats(arguments, device);
   run_session(device, std::cin, agent);
+}
+
+void serve(const Arguments &arguments) {
+  const Endpoint endpoint = parse_endpoint(arguments.endpoint);
+  const uint32_t max_body_len = parse_number("--max-body", arguments.max_body, kMaxServedLen);
+  Device device(arguments.state_directory);
+  run_http_server(device, endpoint, max_body_len);
 }
 
 }  // namespace device

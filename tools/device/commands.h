@@ -25,6 +25,8 @@ struct Arguments {
   std::string input_file;
   std::string output_file;
   std::string types;
+  std::string endpoint = "127.0.0.1:8080";
+  std::string max_body = "8388608";
 };
 
 void print_info(const Arguments &arguments);
@@ -37,6 +39,7 @@ void put_object(const Arguments &arguments);
 void remove_object(const Arguments &arguments);
 void invoke_once(const Arguments &arguments);
 void obey_session(const Arguments &arguments);
+void serve(const Arguments &arguments);
 
 }  // namespace device
 

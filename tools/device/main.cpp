@@ -93,6 +93,18 @@ const Command kCommands[] = {
      "Empty lines are passed over. A line that cannot be obeyed ends the program with exit 2, a\n"
      "session that cannot be opened with exit 1.\n",
      "session < lines.txt"},
+    {"serve",
+     device::serve,
+     "Answer over HTTP, until SIGTERM or SIGINT",
+     {{"--listen", "ADDRESS:PORT", &Arguments::endpoint,
+       "Where to listen (default: 127.0.0.1:8080; port 0: any that is free)"},
+      {"--max-body", "BYTES", &Arguments::max_body,
+       "Longest request that is read (default: 8 MiB)"}},
+     "Prints its URL when it listens. A request of type application/otrp+json gets the signed\n"
+     "response; where there is a TA image, the header OTrP-TA-Image names its path:\n"
+     "  POST /otrp/MESSAGE    GET /images/NUMBER    GET /info    GET /query/TAID\n"
+     "Whoever reaches the address can use the device.\n",
+     "serve --listen 127.0.0.1:8080"},
 };
 
 const Command kObjectCommands[] = {
@@ -164,6 +176,7 @@ void run(int argc, char **argv) {
       footer("Standard output carries only the result; \"-\" names standard input or output.\n"
              "Exit: 0 success, 1 the device answered with a failure, 2 wrong usage.\n",
              "info > device.json"));
+  app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
   app.add_option("--state", arguments.state_directory, "State directory of the device")
       ->required()
       ->type_name("DIR");
@@ -172,8 +185,8 @@ void run(int argc, char **argv) {
 
   try {
     app.parse(argc, argv);
-  } catch (const CLI::Success &help) {
-    app.exit(help);
+  } catch (const CLI::Success &wanted) {  // help or version
+    app.exit(wanted);
     return;
   } catch (const CLI::ParseError &error) {
     throw tools::UsageError(usage_text(app, error));

@@ -259,13 +259,14 @@ int parse_and_run(std::span<char *> words) {
       "Exit codes: 0 done, 1 the device refused, 2 wrong input, 3 a response that does not "
       "verify.");
   Arguments arguments;
+  app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
   app.add_option("--home", arguments.home, "This TSM's home directory")->capture_default_str();
   RunFunction run = nullptr;
   add_commands(&app, &arguments, &run);
   try {
     app.parse(static_cast<int>(words.size()), words.data());
   } catch (const CLI::ParseError &error) {
-    if (error.get_exit_code() == 0) return app.exit(error);  // help
+    if (error.get_exit_code() == 0) return app.exit(error);  // help or version
     throw tools::UsageError(explain(error, app));
   }
   return run(arguments);

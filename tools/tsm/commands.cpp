@@ -34,7 +34,9 @@ std::string default_ca_file() {
   const std::filesystem::path program = std::filesystem::read_symlink("/proc/self/exe", failure);
   const std::filesystem::path installed =
       program.parent_path().parent_path() / "share" / "otrp" / kDevCaName;
-  return std::filesystem::exists(installed, failure) ? installed.string() : OTRP_DEV_CA_TSM_KEY;
+  const bool is_in_its_tree = !std::filesystem::exists(installed, failure) &&
+                              std::filesystem::exists(OTRP_DEV_CA_TSM_KEY, failure);
+  return is_in_its_tree ? OTRP_DEV_CA_TSM_KEY : installed.string();
 }
 
 /// The state that the operator names, or the one that the home keeps.

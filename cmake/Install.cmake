@@ -1,0 +1,57 @@
+# What an installation holds: the programs, the host TEE's library with its TA images, and what is
+# needed to write a client of it.
+set(otrp_data_dir ${CMAKE_INSTALL_DATADIR}/otrp)
+set(otrp_ta_dir ${CMAKE_INSTALL_LIBDIR}/otrp/ta)  # beside the library, which looks there
+set(otrp_cmake_dir ${CMAKE_INSTALL_LIBDIR}/cmake/otrp-tee)
+
+# Programs and images find the library beside them, wherever the whole was moved to.
+file(RELATIVE_PATH bin_to_lib /${CMAKE_INSTALL_BINDIR} /${CMAKE_INSTALL_LIBDIR})
+set_target_properties(otrp-device otrp-tsm PROPERTIES INSTALL_RPATH "$ORIGIN/${bin_to_lib}")
+
+install(TARGETS otrp-device otrp-tsm RUNTIME)
+install(TARGETS tee EXPORT otrp-tee LIBRARY)
+install(TARGETS otrp_agent_image corvel_image LIBRARY DESTINATION ${otrp_ta_dir})
+install(FILES tee/include/tee_client_api.h tee/include/tee_inspect.h
+  DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/otrp)
+install(FILES keys/dev-ca-tsm.pem DESTINATION ${otrp_data_dir})
+
+install(FILES docs/man/otrp-device.1 docs/man/otrp-tsm.1
+  DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
+foreach(program otrp-device otrp-tsm)
+  install(FILES tools/completion/otrp.bash
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME ${program})
+endforeach()
+install(FILES LICENSE NOTICE README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR} RENAME copyright)  # where Debian looks
+
+# ---- For clients: find_package(otrp-tee) and pkg-config otrp-tee
+
+include(CMakePackageConfigHelpers)
+install(EXPORT otrp-tee NAMESPACE otrp:: FILE otrp-tee-config.cmake DESTINATION ${otrp_cmake_dir})
+write_basic_package_version_file(otrp-tee-config-version.cmake COMPATIBILITY SameMinorVersion)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/otrp-tee-config-version.cmake
+  DESTINATION ${otrp_cmake_dir})
+file(RELATIVE_PATH pc_to_prefix /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
+configure_file(cmake/otrp-tee.pc.in otrp-tee.pc @ONLY)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/otrp-tee.pc
+  DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+# ---- Packages: cpack -G DEB
+
+set(CPACK_PACKAGE_NAME otrp)
+set(CPACK_PACKAGE_VENDOR "OTrP device side authors")
+set(CPACK_PACKAGE_CONTACT "OTrP device side authors")
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "Device side of the Open Trust Protocol")
+set(CPACK_PACKAGE_DESCRIPTION
+"An OTrP agent for GlobalPlatform TEEs, a TEE to run it on any Linux machine,
+a key service, and command lines for the device and for a Trusted Service
+Manager. It is for development and simulation: the TEE isolates nothing.")
+set(CPACK_PACKAGE_CHECKSUM SHA256)
+set(CPACK_STRIP_FILES ON)
+set(CPACK_VERBATIM_VARIABLES ON)
+set(CPACK_GENERATOR DEB)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_SECTION utils)
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+include(CPack)

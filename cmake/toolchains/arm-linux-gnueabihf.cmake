@@ -1,0 +1,5 @@
+# 32-bit ARM, with Debian's g++-arm-linux-gnueabihf and qemu-user-static.
+set(CMAKE_SYSTEM_PROCESSOR armv7l)
+set(machine arm-linux-gnueabihf)
+set(emulator qemu-arm-static)
+include(${CMAKE_CURRENT_LIST_DIR}/debian-cross.cmake)
