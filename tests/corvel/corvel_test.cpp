@@ -255,6 +255,7 @@ TEST_F(Corvel, DamagedIdentityIsReportedAndLeftAlone) {
 // Whatever goes wrong at first use, the device works the next time, and what it has given out
 // stays true.
 TEST_F(Corvel, FirstUseMayFailAnywhere) {
+  tee::test::reuse_generated_keys(7);
   for (const Fault fault :
        {Fault::kPowerCut, Fault::kAllocation, Fault::kStorage, Fault::kCrypto, Fault::kShortRead}) {
     bool fired = true;
@@ -276,6 +277,7 @@ TEST_F(Corvel, FirstUseMayFailAnywhere) {
       EXPECT_TRUE(!passed || dead || first == last);
     }
   }
+  tee::test::reuse_generated_keys(0);
 }
 
 }  // namespace
