@@ -153,10 +153,20 @@ bool TargetDevice::open() {
   try {
     session_ = std::make_unique<device::Session>(door_, device::kAgentUuid);
   } catch (const device::Error &) {
+    require_clean_failure();
     return false;
   }
   require_clean(door_);
   return true;
+}
+
+// The instance is gone, and its heap with it. So the same is tried again from inside.
+void TargetDevice::require_clean_failure() {
+  const tee::test::InsideTa inside(host_, {.uuid = kAgent});
+  require(init_dsi() == nullptr, "what fails fails again");
+  const tee_heap_stats now = inside.stats();
+  require(now.live_blocks == 0 && now.open_objects == 0 && now.open_operations == 0,
+          "a start that fails leaves nothing behind");
 }
 
 void TargetDevice::close() {

@@ -47,6 +47,7 @@ class TargetDevice {
 
  private:
   std::string state() const;
+  void require_clean_failure();
   void require_message_answer(const device::Reply &reply);
   const tsm::RsaKey &tee_key();
 
