@@ -11,6 +11,7 @@
 #include "operations/exchange.h"
 #include "operations/operations.h"
 #include "operations/refresh_sd.h"
+#include "record_names.h"
 #include "security/tsm_trust.h"
 #include "state/object_store.h"
 #include "state/records.h"
@@ -146,6 +147,9 @@ static TEE_Result install_ta(const char *sdname, const char *spid, const char *t
         "ta already exist in ta_list, otrp fail error code: 0x%x", checked);
   CHECK(can_be_stored(taid) && can_be_stored(spid) && can_be_stored(ta_version), OTRP_NO_MEMORY,
         "install_ta fail, a text cannot be stored");
+  CHECK(sizeof(TA_INFO_PREFIX) - 1 + strlen(taid) <= TEE_OBJECT_ID_MAX_LEN,
+        TEE_ERROR_BAD_PARAMETERS, "save_ta_info_to_persistent_object fail error code: 0x%x",
+        TEE_ERROR_BAD_PARAMETERS);
 
   TRY_LOG(add_ta_to_ta_list(sd_info.get(), sdname, taid),
           "add_ta_to_ta_list fail error code: 0x%x");

@@ -199,6 +199,13 @@ const RefusalCase kRefusals[] = {
     {"InstallControlCharacterInVersion", kInstall, as_it_is(),
      content([](Json &json) { json["ta_version"] = "1\x1e"; }), kNoMemory, kWithIds},
 
+    {"InstallTaidTooLongForARecord",
+     kInstall,
+     [](Options &o) { o.taid = std::string(57, 'a'); },
+     {},
+     TEEC_ERROR_BAD_PARAMETERS,
+     kWithIds},
+
     {"UpdateTaStaleHash",
      kUpdateTa,
      [](Options &o) { o.dsihash = kStaleHash; },
