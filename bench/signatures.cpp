@@ -1,0 +1,161 @@
+// Verification of a request and signing of a response of 1.5 KiB against two JOSE libraries.
+#include <openssl/core_names.h>
+#include <openssl/evp.h>
+
+#include <stdexcept>
+
+#include "crypto/rsa.h"
+#include "groups.h"
+#include "inside.h"
+#include "libraries/libraries.h"
+#include "security/jws.h"
+#include "state/object_store.h"
+#include "tsm/request.h"
+
+namespace bench {
+namespace {
+
+constexpr size_t kMessageLen = 1536;
+constexpr char kName[] = "DeleteTARequest";
+constexpr char kStoredKeyId[] = "TSM_INFO_tsm1";
+
+RsaNumbers numbers_of(const tsm::RsaKey &key) {
+  const auto number = [&](const char *name) {
+    BIGNUM *value = nullptr;
+    if (EVP_PKEY_get_bn_param(key.get(), name, &value) != 1) {
+      throw std::runtime_error("a key lacks a number");
+    }
+    std::string bytes(static_cast<size_t>(BN_num_bytes(value)), 0);
+    BN_bn2bin(value, reinterpret_cast<uint8_t *>(bytes.data()));
+    BN_free(value);
+    return bytes;
+  };
+  return {number(OSSL_PKEY_PARAM_RSA_N), number(OSSL_PKEY_PARAM_RSA_E),
+          number(OSSL_PKEY_PARAM_RSA_D)};
+}
+
+key_object make_key(const RsaNumbers &numbers) {
+  key_object key;
+  TEE_Attribute attributes[3];
+  const auto put = [&](size_t i, uint32_t id, const std::string &number) {
+    TEE_InitRefAttribute(&attributes[i], id, number.data(), static_cast<uint32_t>(number.size()));
+  };
+  put(0, TEE_ATTR_RSA_MODULUS, numbers.n);
+  put(1, TEE_ATTR_RSA_PUBLIC_EXPONENT, numbers.e);
+  put(2, TEE_ATTR_RSA_PRIVATE_EXPONENT, numbers.d);
+  TEE_Result result = TEE_AllocateTransientObject(TEE_TYPE_RSA_KEYPAIR, kRsaKeyBits, out(key));
+  if (result == TEE_SUCCESS) result = TEE_PopulateTransientObject(key.get(), attributes, 3);
+  if (result != TEE_SUCCESS) throw std::runtime_error("a key was refused");
+  return key;
+}
+
+// The payload's length makes the message 1.5 KiB long.
+struct Message {
+  std::string payload;
+  std::string text;
+  std::string compact;
+};
+
+Message make_message(const tsm::RsaKey &key) {
+  Message message;
+  for (size_t len = 600; message.text.size() < kMessageLen; ++len) {
+    message.payload = R"({"filler":")" + std::string(len, 'x') + R"("})";
+    message.text = tsm::seal_text(message.payload, kName, "tsm1", key, tsm::Json::object());
+  }
+  const tsm::Json envelope = tsm::parse_json(message.text).value().at(kName);
+  for (const char *name : {"protect", "payload", "signature"}) {
+    if (!message.compact.empty()) message.compact += '.';
+    message.compact += envelope.at(name).get<std::string>();
+  }
+  return message;
+}
+
+void require(bool passed, const char *what) {
+  if (!passed) throw std::runtime_error(what);
+}
+
+// As the pipeline does it, the key's record included.
+void verify_with_stored_key(const Message &message) {
+  request_context context = {bytes_of(message.text), static_cast<uint32_t>(message.text.size()),
+                             kName, nullptr, 0};
+  const TEE_Result result = verify_decode_by_name(&context);
+  const tee_ptr<uint8_t> payload(context.payload);
+  require(result == TEE_SUCCESS && context.payload_len == message.payload.size(),
+          "the agent did not verify a message");
+}
+
+void verify_with_key(const Message &message, TEE_ObjectHandle key) {
+  const jsmn_string text = {message.text.data(), static_cast<uint32_t>(message.text.size())};
+  const token_object_ptr root(jsmn_init_object(&text));
+  const token_object_ptr envelope(jsmn_object_get_object(root.get(), kName));
+  const slice_ptr payload(jsmn_object_get_string(envelope.get(), "payload"));
+  const slice_ptr protect(jsmn_object_get_string(envelope.get(), "protect"));
+  const slice_ptr signature(jsmn_object_get_string(envelope.get(), "signature"));
+  secret_bytes decoded;
+  require(verify_signature(key, payload.get(), protect.get(), signature.get(), &decoded) &&
+              decoded.len == message.payload.size(),
+          "the agent did not verify a message");
+}
+
+void sign(const Message &message, TEE_ObjectHandle key) {
+  const json_text text(construct_json_signature("DeleteTAResponse", message.payload.c_str(),
+                                                JWS_HEADER_RS256, nullptr, key));
+  require(text != nullptr, "the agent did not sign a message");
+}
+
+void add_figure(Bench &bench, const JoseLibrary &library, const char *name, const Contestant &ours,
+                const Contestant &theirs) {
+  const Rounds rounds = compare({ours, theirs}, bench.effort);
+  bench.report.figures.push_back({.group = "signatures, 1.5 KiB",
+                                  .name = std::string(name) + " / " + library.name,
+                                  .value = rounds.ratio(0, 1),
+                                  .unit = "x",
+                                  .target = at_most(library.target),
+                                  .detail = time_text(rounds.seconds(0).median) + " / " +
+                                            time_text(rounds.seconds(1).median)});
+}
+
+void measure(Bench &bench, const JoseLibrary &library, const Message &message,
+             const RsaNumbers &numbers, TEE_ObjectHandle key) {
+  void *jwk = library.make_key(numbers);
+  require(jwk != nullptr, "a library refused a key");
+  const std::string stored = library.store_public_key(jwk);
+  const auto verify = [&](void *with) {
+    require(library.verify(message.compact, with) == message.payload.size(),
+            "a library did not verify a message");
+  };
+  add_figure(bench, library, "verify, stored key", {[&] { verify_with_stored_key(message); }},
+             {[&] {
+               void *loaded = library.load_key(stored);
+               verify(loaded);
+               library.free_key(loaded);
+             }});
+  add_figure(bench, library, "verify, key at hand", {[&] { verify_with_key(message, key); }},
+             {[&] { verify(jwk); }});
+  add_figure(bench, library, "sign", {[&] { sign(message, key); }}, {[&] {
+               require(!library.sign(message.payload, jwk).empty(),
+                       "a library did not sign a message");
+             }});
+  library.free_key(jwk);
+}
+
+}  // namespace
+
+void measure_signatures(Bench &bench) {
+  tee::test::Device device;
+  const Inside inside(device);
+  const tsm::RsaKey tsm_key = tsm::RsaKey::generate();
+  const RsaNumbers numbers = numbers_of(tsm_key);
+  const Message message = make_message(tsm_key);
+  const std::string stored = tsm::base64url_encode(tsm_key.encoded());
+  require(
+      save_data_to_persistent_object(stored.data(), static_cast<uint32_t>(stored.size()),
+                                     kStoredKeyId, sizeof kStoredKeyId - 1, true) == TEE_SUCCESS,
+      "a key was not stored");
+  const key_object key = make_key(numbers);
+  for (const JoseLibrary &library : known<JoseLibrary>()) {
+    measure(bench, library, message, numbers, key.get());
+  }
+}
+
+}  // namespace bench
