@@ -11,6 +11,7 @@
 struct jsmn_token : jsmntok_t {};
 static_assert(sizeof(jsmn_token) == sizeof(jsmntok_t));
 
+static constexpr int kUsualTokens = 64;
 static constexpr int kManyTokens = 256;  // more are read, but not without a word
 
 // ---- Slices
@@ -44,30 +45,64 @@ static int tokenize(const jsmn_string &text, jsmn_token *tokens, int num_tokens)
                     static_cast<unsigned>(num_tokens));
 }
 
-jsmn_object *jsmn_init_object(const jsmn_string *slice) {
-  const jsmn_string text = slice != nullptr ? *slice : jsmn_string{};
+static tee_ptr<jsmn_token> allocate_tokens(int num_tokens) {
+  const uint64_t len = static_cast<uint64_t>(num_tokens) * sizeof(jsmn_token);
+  if (len > UINT32_MAX) return nullptr;
+  return tee_ptr<jsmn_token>(
+      reinterpret_cast<jsmn_token *>(allocate_bytes(static_cast<uint32_t>(len))));
+}
+
+static const char kInitObject[] = "jsmn_init_object";
+
+static const char kNoMemory[] = "malloc jsmn_object error no memory";
+
+static int count_and_tokenize(const jsmn_string &text, tee_ptr<jsmn_token> *tokens) {
   const int num_tokens = tokenize(text, nullptr, 0);
-  CHECK(num_tokens >= 1, nullptr, "compute jsmn_string tokens fail with code: %d\n", num_tokens);
-  if (num_tokens > kManyTokens) trace_error(__func__, __LINE__, "json object too big");
+  CHECK_AS(kInitObject, num_tokens >= 1, -1, "compute jsmn_string tokens fail with code: %d\n",
+           num_tokens);
+  if (num_tokens > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
+  *tokens = allocate_tokens(num_tokens);
+  CHECK_AS(kInitObject, *tokens, -1, "%s", kNoMemory);
+  const int count = tokenize(text, tokens->get(), num_tokens);
+  CHECK_AS(kInitObject, count >= 0, -1, "Failed to parse JSON: %d\n", count);
+  return count;
+}
 
-  const uint64_t tokens_len = static_cast<uint64_t>(num_tokens) * sizeof(jsmn_token);
-  tee_ptr<jsmn_token> tokens;
-  if (tokens_len <= UINT32_MAX) {
-    tokens.reset(reinterpret_cast<jsmn_token *>(allocate_bytes(static_cast<uint32_t>(tokens_len))));
+// Most texts have few tokens, however large they are: they are read once, and counted first only
+// when they have more, or to find out what is wrong with them. Negative when it fails.
+static int tokenize_text(const jsmn_string &text, tee_ptr<jsmn_token> *tokens) {
+  tee_ptr<jsmn_token> room = allocate_tokens(kUsualTokens);
+  CHECK_AS(kInitObject, room, -1, "%s", kNoMemory);
+  const int count = tokenize(text, room.get(), kUsualTokens);
+  if (count < 1) {
+    room.reset();
+    return count_and_tokenize(text, tokens);
   }
-  CHECK(tokens, nullptr, "malloc jsmn_object error no memory");
-  const int count = tokenize(text, tokens.get(), num_tokens);
-  CHECK(count >= 0, nullptr, "Failed to parse JSON: %d\n", count);
-  CHECK(count >= 1 && tokens.get()->type == JSMN_OBJECT, nullptr, "Object expected\n");
+  *tokens = allocate_tokens(count);
+  CHECK_AS(kInitObject, *tokens, -1, "%s", kNoMemory);
+  memcpy(tokens->get(), room.get(), static_cast<size_t>(count) * sizeof(jsmn_token));
+  return count;
+}
 
+static jsmn_object *make_object(const jsmn_string &text, tee_ptr<jsmn_token> *tokens,
+                                uint32_t count) {
   token_object_ptr object(reinterpret_cast<jsmn_object *>(allocate_bytes(sizeof(jsmn_object))));
-  CHECK(object, nullptr, "malloc jsmn_object error no memory");
+  CHECK_AS(kInitObject, object, nullptr, "%s", kNoMemory);
   object->text = jsmn_init_string();
   if (object->text == nullptr) return nullptr;
   *object->text = text;
-  object->tokens = tokens.release();
-  object->count = static_cast<uint32_t>(count);
+  object->tokens = tokens->release();
+  object->count = count;
   return object.release();
+}
+
+jsmn_object *jsmn_init_object(const jsmn_string *slice) {
+  const jsmn_string text = slice != nullptr ? *slice : jsmn_string{};
+  tee_ptr<jsmn_token> tokens;
+  const int count = tokenize_text(text, &tokens);
+  if (count < 0) return nullptr;
+  CHECK(count >= 1 && tokens.get()->type == JSMN_OBJECT, nullptr, "Object expected\n");
+  return make_object(text, &tokens, static_cast<uint32_t>(count));
 }
 
 void jsmn_free_object(jsmn_object *object) {
@@ -85,28 +120,47 @@ static bool is_key(const jsmn_token &token, const jsmn_string &text, const char 
          memcmp(text.data + token.start, key, key_len) == 0;
 }
 
-static jsmn_string jsmn_find_value(const jsmn_string &text, const jsmn_token *tokens,
-                                   uint32_t count, const char *key) {
+// The token behind the key, or NULL.
+static const jsmn_token *find_value(const jsmn_object *object, const char *key) {
+  if (object == nullptr || key == nullptr) return nullptr;
+  const jsmn_token *tokens = object->tokens;
   const size_t key_len = strlen(key);
   uint32_t i = 1;
-  while (i < count && !is_key(tokens[i], text, key, key_len)) ++i;
-  if (i + 1 >= count) return {};
-  const jsmn_token &value = tokens[i + 1];
-  return {text.data + value.start, static_cast<uint32_t>(value.end - value.start)};
+  while (i < object->count && !is_key(tokens[i], *object->text, key, key_len)) ++i;
+  return i + 1 < object->count ? &tokens[i + 1] : nullptr;
 }
 
-static jsmn_string value_after(const jsmn_object *object, const char *key) {
-  if (object == nullptr || key == nullptr) return {};
-  return jsmn_find_value(*object->text, object->tokens, object->count, key);
+static jsmn_string text_of(const jsmn_object *object, const jsmn_token *token) {
+  if (token == nullptr) return {};
+  return {object->text->data + token->start, static_cast<uint32_t>(token->end - token->start)};
 }
 
 jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key) {
   jsmn_string *slice = jsmn_init_string();
-  if (slice != nullptr) *slice = value_after(object, key);
+  if (slice != nullptr) *slice = text_of(object, find_value(object, key));
   return slice;
 }
 
+// The tokens of an inner object follow its own. Its text, which may be large, is not read again.
+static jsmn_object *copy_inner_object(const jsmn_object *object, const jsmn_token *inner) {
+  const jsmn_token *end = inner;
+  const jsmn_token *last = object->tokens + object->count;
+  while (end != last && end->start < inner->end) ++end;
+  const auto count = static_cast<int>(end - inner);
+  if (count > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
+  tee_ptr<jsmn_token> tokens = allocate_tokens(count);
+  CHECK_AS(kInitObject, tokens, nullptr, "%s", kNoMemory);
+  for (int i = 0; i < count; ++i) {
+    tokens.get()[i] = inner[i];
+    tokens.get()[i].start -= inner->start;
+    tokens.get()[i].end -= inner->start;
+  }
+  return make_object(text_of(object, inner), &tokens, static_cast<uint32_t>(count));
+}
+
 jsmn_object *jsmn_object_get_object(const jsmn_object *object, const char *key) {
-  const jsmn_string value = value_after(object, key);
+  const jsmn_token *token = find_value(object, key);
+  if (token != nullptr && token->type == JSMN_OBJECT) return copy_inner_object(object, token);
+  const jsmn_string value = text_of(object, token);
   return jsmn_init_object(&value);
 }
