@@ -57,7 +57,11 @@ int main(int argc, char **argv) {
   app.add_option("-o,--output", output, "where the figures go");
   app.add_option("--work", bench.work_directory, "a directory for durable devices; emptied")
       ->default_val("bench-work");
-  CLI11_PARSE(app, argc, argv);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError &error) {
+    return app.exit(error) == 0 ? 0 : 2;
+  }
   if (quick) bench.effort = bench::kQuick;
   try {
     measure_all(only, bench);
