@@ -113,6 +113,7 @@ struct decoder {
   uint8_t *to;
 
   void take_blocks();
+  void take_last_block();
   int gather(uint32_t *bits);
   bool take_group();
   void take_rest();
@@ -144,25 +145,50 @@ static inline void store_big_endian(uint32_t bits, uint8_t *to) {
   memcpy(to, &bits, Num);
 }
 
+// False, and nothing stored, when one of the sixteen characters has to be skipped.
+template <const alphabet &Also>
+static inline bool decode_block(const char *from, uint8_t *to) {
+  characters text;
+  memcpy(&text, from, sizeof text);
+  const characters distances = distances_of<Also>(text);
+  if (any_nonzero(distances == 0)) return false;
+  const characters values = text + distances;
+  quartets split;
+  memcpy(&split, &values, sizeof split);
+  const quartets bits = ((split >> shift_of(0)) & 63) << 26 | ((split >> shift_of(1)) & 63) << 20 |
+                        ((split >> shift_of(2)) & 63) << 14 | ((split >> shift_of(3)) & 63) << 8;
+  store_big_endian<4>(bits[0], to);
+  store_big_endian<4>(bits[1], to + 3);
+  store_big_endian<4>(bits[2], to + 6);
+  store_big_endian<3>(bits[3], to + 9);
+  return true;
+}
+
 // The usual case: stops before the first block that has something to skip in it.
 template <const alphabet &Also>
 void decoder<Also>::take_blocks() {
-  for (; static_cast<size_t>(end - at) >= kNumCharacters; at += kNumCharacters, to += kBlockLen) {
-    characters text;
-    memcpy(&text, at, sizeof text);
-    const characters distances = distances_of<Also>(text);
-    if (any_nonzero(distances == 0)) return;
-    const characters values = text + distances;
-    quartets split;
-    memcpy(&split, &values, sizeof split);
-    const quartets bits = ((split >> shift_of(0)) & 63) << 26 |
-                          ((split >> shift_of(1)) & 63) << 20 |
-                          ((split >> shift_of(2)) & 63) << 14 | ((split >> shift_of(3)) & 63) << 8;
-    store_big_endian<4>(bits[0], to);
-    store_big_endian<4>(bits[1], to + 3);
-    store_big_endian<4>(bits[2], to + 6);
-    store_big_endian<3>(bits[3], to + 9);
+  while (static_cast<size_t>(end - at) >= kNumCharacters && decode_block<Also>(at, to)) {
+    at += kNumCharacters;
+    to += kBlockLen;
   }
+}
+
+// The usual end: less than a block, with nothing to skip in it.
+template <const alphabet &Also>
+void decoder<Also>::take_last_block() {
+  const auto left = static_cast<size_t>(end - at);
+  if (left == 0 || left >= kNumCharacters) return;
+  char text[kNumCharacters];
+  uint8_t bytes[kBlockLen];
+  memset(text, 'A', sizeof text);
+  memcpy(text, at, left);
+  if (decode_block<Also>(text, bytes)) {
+    memcpy(to, bytes, left * 3 / 4);
+    to += left * 3 / 4;
+    at = end;
+  }
+  wipe(text, sizeof text);
+  wipe(bytes, sizeof bytes);
 }
 
 // The next four values, or as many as there are, however far apart they stand. Returns how many.
@@ -216,8 +242,9 @@ static uint32_t decode(const char *caller, const char *text, uint32_t len, uint3
   *bytes = allocate_bytes(len / 4 * 3 + rest / 4 + rest % 4 + spare);
   CHECK_AS(caller, *bytes != nullptr, 0, "decode base64 but not memory");
   decoder<Also> in = {text, text + len, *bytes};
-  do in.take_blocks();
-  while (in.take_group());
+  in.take_blocks();
+  in.take_last_block();
+  while (in.take_group()) in.take_blocks();
   in.take_rest();
   return static_cast<uint32_t>(in.to - *bytes);
 }
