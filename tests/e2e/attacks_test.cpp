@@ -56,6 +56,49 @@ TEST_F(Attack, ARequestCountsForItsOwnMessageOnly) {
   EXPECT_EQ(scene.device.objects(), stored);
 }
 
+TEST_F(Attack, OneChangedCharacterInAnyMessageIsNoticed) {
+  const auto stored = scene.device.objects();
+  for (const auto &[id, options] : kRequests) {
+    const Json request = Json::parse(scene.request(id, options));
+    for (const char *member : {"payload", "protect", "signature"}) {
+      // Not the last character: its lowest bits may be spare.
+      const std::string text = request.front()[member];
+      for (const size_t at : {size_t{0}, text.size() / 2, text.size() - 2}) {
+        Json changed = request;
+        std::string edited = text;
+        edited[at] = text[at] == 'A' ? 'B' : 'A';
+        changed.front()[member] = edited;
+        const Reply reply = scene.device.send(static_cast<uint32_t>(id), changed.dump());
+        EXPECT_NE(reply.status, 0u) << member << at;
+        EXPECT_TRUE(reply.response.empty());
+      }
+    }
+  }
+  EXPECT_EQ(scene.device.objects(), stored);
+}
+
+TEST_F(Attack, AStrangerCannotTakeOverAnAdmittedName) {
+  const auto stored = scene.device.objects();
+  const tsm::RsaKey &stranger = key_named("stranger");
+  const auto edit = [&](Json &tbs) {
+    tbs.front()["tsm_key_chain"]["tsm_list"][0] =
+        tsm::tsm_entry(stranger, "tsm1", stranger.encoded());
+  };
+  EXPECT_EQ(scene.run(MessageId::kGetDeviceState, {}, {.tbs = edit}).code(), kCaCheckFailed);
+  EXPECT_EQ(scene.device.objects(), stored);
+}
+
+TEST_F(Attack, AnotherTaSeesNoneOfTheRecords) {
+  const tee::test::InsideTa other(scene.device.host(), {.uuid = {0x0BAD, 0, 0, {}}});
+  for (const auto &[id, data] : scene.device.objects()) {
+    TEE_ObjectHandle object = TEE_HANDLE_NULL;
+    EXPECT_EQ(
+        TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id.data(), static_cast<uint32_t>(id.size()),
+                                 TEE_DATA_FLAG_ACCESS_READ, &object),
+        TEE_ERROR_ITEM_NOT_FOUND);
+  }
+}
+
 TEST_F(Attack, AnOldRequestIsRefusedOnceTheStateHasMoved) {
   const std::string create =
       scene.request(MessageId::kCreateSd, {.spid = "sp1", .sdname = "sd2", .spcert = "c"});
