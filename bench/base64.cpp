@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The agent's base64url against OpenSSL's block functions, whose buffers are made beforehand.
 #include "crypto/base64.h"
 

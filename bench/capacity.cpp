@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What fits a device whose agent has a heap of 2 MiB.
 #include <tee_test.h>
 

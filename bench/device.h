@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Devices to measure, and single exchanges with them.
 #ifndef BENCH_DEVICE_H
 #define BENCH_DEVICE_H

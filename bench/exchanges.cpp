@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Whole exchanges against the cryptography that they cannot do without.
 #include "device.h"
 #include "floor.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The floor under an exchange: the cryptographic work that it cannot do without, straight in
 /// OpenSSL, with all contexts made beforehand.
 ///

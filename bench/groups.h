@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The groups of figures. Each measures on its own and adds to the report.
 #ifndef BENCH_GROUPS_H
 #define BENCH_GROUPS_H

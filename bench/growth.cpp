@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What a message costs on a device with more and more SDs.
 #include <cmath>
 #include <memory>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Timing by turns. Machines differ and drift, so no time stands alone: whatever is compared runs
 /// alternately, round after round, and a figure is the median of the rounds' ratios.
 #ifndef BENCH_HARNESS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Code of the agent that is measured by itself runs as an instance of a trusted application.
 #ifndef BENCH_INSIDE_H
 #define BENCH_INSIDE_H

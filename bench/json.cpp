@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The agent's JSON documents against other libraries: a device state document of 200 KiB.
 #include "state/json.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Measures group by group and writes what it found as JSON.
 #include <tee_test.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What the benchmark found: figures with their targets, and the curves of the growth chart.
 #ifndef BENCH_REPORT_H
 #define BENCH_REPORT_H

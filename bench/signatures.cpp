@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Verification of a request and signing of a response of 1.5 KiB against two JOSE libraries.
 #include <openssl/core_names.h>
 #include <openssl/evp.h>

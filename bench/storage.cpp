@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Durable objects against the bare transactions of the same database library on the same disk.
 #include <sqlite3.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The token reader against its tokenizer alone, in one pass over an array that is large enough.
 #include <vector>
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # What an installation holds: the programs, the host TEE's library with its TA images, and what is
 # needed to write a client of it.
 set(otrp_data_dir ${CMAKE_INSTALL_DATADIR}/otrp)

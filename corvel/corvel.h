@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The commands of the key service, which holds the identity of the device: its ID and the TEE's
 /// 2048-bit RSA key pair, both made at first use and never changed.
 ///

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What makes this device this device. It lies in one persistent object, which is created whole:
 /// a device that loses power at its first use has either no identity yet, or all of it.
 ///

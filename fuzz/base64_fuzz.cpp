@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Base64: encoders against OpenSSL's, decoders against it on what it takes, and against a reader of
 // a few lines on everything else.
 #include <openssl/evp.h>

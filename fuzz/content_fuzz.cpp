@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What a message has inside: the input is encrypted and signed into an otherwise good request.
 //
 //     message ID (one digit) | content, up to a NUL | TA image, for InstallTA and UpdateTA

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Command 0: the frame of a message, from its first byte on.
 #include "support/require.h"
 #include "support/target_device.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A change anywhere in a signed message is found out at the signature. So messages are opened,
 // changed inside, and closed again.
 #include "support/mutation.h"

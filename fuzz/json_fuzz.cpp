@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The document model: what it writes it reads back as the same document, and after any edit it
 // holds what an independent model of JSON holds.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // For targets whose inputs are a JSON text up to a NUL, and perhaps more behind it.
 #include "support/mutation.h"
 #include "support/require.h"

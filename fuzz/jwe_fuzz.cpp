@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Encrypted contents: what the strict reader of the TSM opens the agent opens to the same text, and
 // what the agent encrypts the TSM opens.
 #include <openssl/core_names.h>

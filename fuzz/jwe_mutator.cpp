@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Encrypted objects are opened, changed inside or in a part, and closed again.
 #include <openssl/hmac.h>
 

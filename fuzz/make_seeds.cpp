@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Plays the exchanges of a TSM with a fresh device, and keeps the device and what was said:
 //
 //     fuzz_make_seeds FOLDER        writes FOLDER/device.json and FOLDER/corpus/TARGET/*

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Command 1: is a TA recorded?
 #include "support/require.h"
 #include "support/target_device.h"

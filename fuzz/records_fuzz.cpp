@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What the agent finds stored when it starts: the input's objects beside, or in place of, those of
 // the stored device. If it starts with them, it must answer all that reads or changes them.
 #include "support/record_list.h"

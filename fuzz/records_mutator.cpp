@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Records change as documents, and the key boxes in them as bytes; the length in front stays right
 // more often than not.
 #include "support/mutation.h"

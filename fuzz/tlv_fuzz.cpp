@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The record box: it takes what a reader of a few lines takes, and gives it back as it was.
 #include <map>
 #include <optional>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The token reader: every slice lies inside the text, and is what a second reader of the same text
 // finds.
 //

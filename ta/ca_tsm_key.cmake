@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # otrp_generate_ca_tsm_key(PEM HEADER): writes the modulus of a 2048-bit RSA key as a C++ constant.
 function(otrp_generate_ca_tsm_key pem header)
   find_program(OPENSSL_PROGRAM openssl NO_CMAKE_FIND_ROOT_PATH REQUIRED)

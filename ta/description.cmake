@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # otrp_describe_agent(HEADER JSON): what a TEE is told of the agent, from its ta_config.h, as JSON
 # for the build scripts of kits.
 function(otrp_describe_agent header json)

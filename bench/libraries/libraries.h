@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Other libraries for the same work. Each is a source of its own, which takes part when the build
 /// finds the library.
 #ifndef BENCH_LIBRARIES_H

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # 64-bit ARM, with Debian's g++-aarch64-linux-gnu and qemu-user-static.
 set(CMAKE_SYSTEM_PROCESSOR aarch64)
 set(machine aarch64-linux-gnu)

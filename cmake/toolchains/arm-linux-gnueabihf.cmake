@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # 32-bit ARM, with Debian's g++-arm-linux-gnueabihf and qemu-user-static.
 set(CMAKE_SYSTEM_PROCESSOR armv7l)
 set(machine arm-linux-gnueabihf)

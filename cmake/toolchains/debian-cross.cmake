@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # Shared by the toolchains of Debian's cross compilers, which set:
 #   machine   the compilers' prefix, and the folder of that machine's libraries (multiarch tuple)
 #   emulator  the program that runs its programs here

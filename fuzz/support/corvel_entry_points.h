@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The key service's entry points under names of their own: the agent's are in the same program.
 #ifndef FUZZ_CORVEL_ENTRY_POINTS_H
 #define FUZZ_CORVEL_ENTRY_POINTS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The agent's functions called directly, from inside an instance that lives as long as the
 /// process.
 #ifndef FUZZ_INSIDE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Mutations of texts, for the targets' own mutators.
 #ifndef FUZZ_MUTATION_H
 #define FUZZ_MUTATION_H

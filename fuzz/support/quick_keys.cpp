@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Key generation in place of the TEE's own, for all of this program: the primes of a key as long as
 // devices have would take longer to find than everything else that a run does.
 #include <dlfcn.h>

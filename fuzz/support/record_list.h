@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Stored objects as one input:
 ///
 ///     ID length (1) | ID | data length (2, little-endian) | data | more objects

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Runs a target over every file of the folders that are named: what was found once stays found,
 // with any compiler.
 #include <algorithm>

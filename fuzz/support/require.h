@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The checks of the fuzz targets. A property that does not hold ends the process, so that the
 /// fuzzer keeps the input.
 #ifndef FUZZ_REQUIRE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Requests of the stored device's TSM: good ones, and good ones with something inside changed.
 #ifndef FUZZ_SEALED_REQUEST_H
 #define FUZZ_SEALED_REQUEST_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "support/stored_device.h"
 
 #include "common/files.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The device that the targets attack, and the TSM that manages it, as fuzz/device.json keeps them.
 ///
 /// The corpora hold signed and encrypted messages, which only this device understands: fuzz_seeds

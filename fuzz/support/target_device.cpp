@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "support/target_device.h"
 
 #include <ta_config.h>

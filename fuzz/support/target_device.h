@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device in memory that runs the agent linked into this program, and whatever must hold after
 /// every command, checked.
 #ifndef FUZZ_TARGET_DEVICE_H

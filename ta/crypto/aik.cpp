@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/aik.h"
 
 #include "crypto/base64.h"

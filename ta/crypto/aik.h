@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The attestation identity key (AIK) of a service provider: an RSA key pair made in the TEE and
 /// kept as a key box, in base64, in the "aik" member of the SP's record.
 #ifndef AIK_H

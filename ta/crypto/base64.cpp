@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/base64.h"
 
 #include "failure.h"

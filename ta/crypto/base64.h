@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Base64 and base64url (RFC 4648, sections 4 and 5).
 ///
 /// The encoders make NUL-terminated texts, the standard one padded with "=", the URL one not. The

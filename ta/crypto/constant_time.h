@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Comparison that takes the same time wherever its operands differ.
 #ifndef CONSTANT_TIME_H
 #define CONSTANT_TIME_H

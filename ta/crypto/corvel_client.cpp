@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/corvel_client.h"
 
 #include <ta_config.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Client of the key service Corvel, which holds the device's identity and keys.
 ///
 /// Each call opens a session, invokes one command and closes the session; nothing is kept. Codes

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/key_list.h"
 
 #include "failure.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A list of values under distinct integer keys, the newest first. It owns its values.
 ///
 /// Results are 0, or -1 for a failure that changed nothing.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// RSA keys as TLV boxes and as encoded public keys, and the RSA operations on key objects.
 ///
 /// A key box holds these records; values are the attribute's bytes, big-endian:

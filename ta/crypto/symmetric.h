@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// AES-GCM, AES-CBC with PKCS#7 padding, HMAC-SHA256, digests and random bytes on byte buffers.
 ///
 /// Each function builds its key object and operation, runs one complete operation and frees both:

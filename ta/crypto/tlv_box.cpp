@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/tlv_box.h"
 
 #include "cursor.h"

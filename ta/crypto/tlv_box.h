@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A box of records, each a type and a value, and its serialized form: the records behind each
 /// other, in any order,
 ///

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The TA's entry points and its command interface.
 #include "crypto/corvel_client.h"
 #include "failure.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "frame/message_table.h"
 
 #include "operations/operations.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The table of messages: who verifies, processes and encodes each.
 #ifndef MESSAGE_TABLE_H
 #define MESSAGE_TABLE_H

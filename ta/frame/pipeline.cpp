@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "frame/pipeline.h"
 
 #include <string.h>

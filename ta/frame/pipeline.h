@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The message pipeline: one OTrP request in, one signed OTrP response out.
 ///
 ///     in:   reserved word | L1 | L1 bytes | L2 | L2 bytes | message ID | M | M bytes of JSON

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Members that the to-be-signed responses have in common.
 #ifndef RESPONSE_FIELDS_H
 #define RESPONSE_FIELDS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "frame/status_query.h"
 
 #include <string.h>

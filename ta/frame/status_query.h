@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The status query: is a TA with this taid recorded on the device?
 ///
 ///     in:   reserved word | L | L bytes of JSON: {"taid"}

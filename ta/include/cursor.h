@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The only thing that touches bytes from outside: a cursor that never goes past what is left.
 /// A read that fails leaves the cursor unusable.
 #ifndef CURSOR_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// One of several byte strings that are hashed or signed as if they stood behind each other.
 #ifndef DATA_PART_H
 #define DATA_PART_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Four macros that leave a function on failure. No others hide a return.
 #ifndef FAILURE_H
 #define FAILURE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Integers of frames, records and encodings: little-endian, assembled from bytes.
 #ifndef LITTLE_ENDIAN_H
 #define LITTLE_ENDIAN_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What the message pipeline and the stages of a message agree on.
 #ifndef MESSAGE_H
 #define MESSAGE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Result codes of the agent, and the conventions that every function of it keeps.
 ///
 /// A function returns TEE_SUCCESS or a code that says what went wrong: one of those below or a

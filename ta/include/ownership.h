@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Owners: whatever is taken is held at once by a type that gives it back.
 #ifndef OWNERSHIP_H
 #define OWNERSHIP_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Differences between the kits of TEE vendors, met in one place.
 #ifndef PLATFORM_H
 #define PLATFORM_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// IDs of the agent's persistent objects: a prefix followed by the record's own name, or a fixed
 /// ID.
 #ifndef RECORD_NAMES_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // CreateSD: a security domain for a service provider, and an AIK for one that has none yet.
 #include <string.h>
 

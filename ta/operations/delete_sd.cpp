@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // DeleteSD: removes a security domain, on request with its TAs, and its SP with the last one.
 #include <string.h>
 

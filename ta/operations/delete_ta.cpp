@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // DeleteTA: takes a TA out of its security domain.
 #include "operations/delete_ta.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Shared by the messages that take something away from a security domain.
 #ifndef DELETE_TA_H
 #define DELETE_TA_H

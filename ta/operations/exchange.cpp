@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "operations/exchange.h"
 
 #include "crypto/corvel_client.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The frame that the six state-changing messages share. A handler is three stages:
 ///
 ///     open_response()      the response's objects

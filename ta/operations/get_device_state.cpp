@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // GetDeviceState: the device state, encrypted for the TSM that asks. A failure has no response.
 #include "failure.h"
 #include "frame/response_fields.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // GetTAInfo: what is recorded of a TA, signed with the AIK of the SP that the request names. A
 // failure has no response.
 #include "crypto/aik.h"

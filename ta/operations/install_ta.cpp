@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // InstallTA: decrypts a TA image, records the TA in a security domain and hands the image over.
 #include "operations/install_ta.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Shared by the messages that bring a TA image.
 #ifndef INSTALL_TA_H
 #define INSTALL_TA_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "operations/new_aik.h"
 
 #include "crypto/aik.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A new AIK for an SP, step by step, as CreateSD and UpdateSD make it: the same texts, under the
 /// name of the operation `caller`.
 #ifndef NEW_AIK_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The process functions of the eight messages; message.h says what a process function is. Each is
 /// the public face of the source that bears its message's name.
 #ifndef OPERATIONS_H

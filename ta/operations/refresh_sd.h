@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Brings an SD's entry in the in-memory DSI up to its stored record.
 #ifndef REFRESH_SD_H
 #define REFRESH_SD_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // UpdateSD: renews the AIK and the certificate of the SP that owns a security domain.
 #include <string.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // UpdateTA: replaces the image and the version of an installed TA.
 #include "failure.h"
 #include "operations/exchange.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "security/jwe.h"
 
 #include <string.h>

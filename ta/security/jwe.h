@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// JSON Web Encryption objects (RFC 7516, JSON serialization with one recipient):
 ///
 ///     {"protect", "recipients": [{"header": {"alg": "RSA1_5"}, "encrypted_key"}],

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// JSON Web Signatures (RFC 7515), RS256: RSASSA-PKCS1-v1_5 with SHA-256 over
 ///
 ///     base64url(protected header) "." base64url(payload)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "security/tsm_trust.h"
 
 #include <ca_tsm_key.h>

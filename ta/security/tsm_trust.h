@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The trust chain that admits TSM keys, and the store of admitted keys.
 ///
 /// One key is trusted by construction, the CA-TSM key, which is compiled in. It signs TSM keys,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Device state information (DSI): which SDs exist, whose they are, which TAs they hold, and the
 /// AIK of every SP. It is not stored: it is rebuilt from the records when the instance starts and
 /// then edited in step with them.

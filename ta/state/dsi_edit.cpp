@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Edits of the DSI's entries.
 #include <string.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "state/json.h"
 
 #include "state/json_node.h"

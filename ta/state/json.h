@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The JSON document model: every document that is stored, hashed, signed, encrypted or sent is
 /// parsed, built, edited and serialized here.
 ///

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Inside of the JSON document model: how a document lies in memory.
 ///
 /// A value is a node. A container points at its first child, each child at the next one, and the

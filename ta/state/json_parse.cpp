@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "failure.h"
 #include "state/json_node.h"
 

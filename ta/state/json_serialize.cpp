@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "state/json_node.h"
 
 // ---- Where the characters go

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The agent's persistent objects: save, load, delete, and the reader of JSON records.
 ///
 /// An object's data stream is

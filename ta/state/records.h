@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The agent's durable JSON records, all stored as compact text:
 ///
 ///     SD_LIST_ID         {"sd_list": [names]}

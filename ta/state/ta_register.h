@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The table of installed TA images: which taid was installed with which image digest.
 ///
 /// It is one object, OTRP_TA_REGISTER_INFO, whose payload is

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The token reader: picks values out of request texts without building a tree.
 ///
 /// It hands out slices of the text itself, as they stand there, escape sequences included. The

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # Part of the host TEE's kit for trusted applications.
 
 # Flags of code that runs inside a TEE: no runtime library behind it.

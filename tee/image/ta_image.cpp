@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The image header of a trusted application, from the ta_config.h of its build.
 #include <ta_config.h>
 #include <tee_ta_image.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// GlobalPlatform TEE Client API 1.0: the door of the normal world.
 ///
 /// The context name is the device's state directory (created when missing, mode 0700). One
@@ -126,8 +127,8 @@ void TEEC_CloseSession(TEEC_Session *session);
 
 /// A memory reference reaches the trusted application without a copy: both worlds see the same
 /// bytes while the command runs, as on a device with shared memory.
-TEEC_Result TEEC_InvokeCommand(TEEC_Session *session, uint32_t commandID,
-                               TEEC_Operation *operation, uint32_t *returnOrigin);
+TEEC_Result TEEC_InvokeCommand(TEEC_Session *session, uint32_t commandID, TEEC_Operation *operation,
+                               uint32_t *returnOrigin);
 void TEEC_RequestCancellation(TEEC_Operation *operation);
 
 #ifdef __cplusplus

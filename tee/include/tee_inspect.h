@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Looking into the host TEE from outside, for developers: the stored objects of a trusted
 /// application and the figures of its heap. A real device offers nothing of the kind.
 #ifndef TEE_INSPECT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// GlobalPlatform TEE Internal Core API 1.1: the part of it that trusted applications here use.
 ///
 /// Names, signatures and constants are the standard's. The standard passes buffer lengths as
@@ -121,7 +122,7 @@ typedef struct {
 #define TEE_PARAM_TYPE_MEMREF_INOUT 7u
 
 #define TEE_PARAM_TYPES(t0, t1, t2, t3) ((t0) | ((t1) << 4) | ((t2) << 8) | ((t3) << 12))
-#define TEE_PARAM_TYPE_GET(t, i) (((t) >> ((i) * 4)) & 0xFu)
+#define TEE_PARAM_TYPE_GET(t, i) (((t) >> ((i)*4)) & 0xFu)
 
 #define TEE_TIMEOUT_INFINITE 0xFFFFFFFFu
 
@@ -143,8 +144,8 @@ TEE_Result TEE_GetPropertyAsIdentity(TEE_PropSetHandle propsetOrEnumerator, cons
 void TEE_Panic(TEE_Result panicCode) __attribute__((noreturn));
 
 TEE_Result TEE_OpenTASession(const TEE_UUID *destination, uint32_t cancellationRequestTimeout,
-                             uint32_t paramTypes, TEE_Param params[4],
-                             TEE_TASessionHandle *session, uint32_t *returnOrigin);
+                             uint32_t paramTypes, TEE_Param params[4], TEE_TASessionHandle *session,
+                             uint32_t *returnOrigin);
 void TEE_CloseTASession(TEE_TASessionHandle session);
 TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t cancellationRequestTimeout,
                                uint32_t commandID, uint32_t paramTypes, TEE_Param params[4],
@@ -196,8 +197,8 @@ void TEE_Free(void *buffer);
 #define TEE_ATTR_RSA_COEFFICIENT 0xC0000830u
 
 TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo *objectInfo);
-TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attributeID,
-                                        void *buffer, TEE_LengthType *size);
+TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attributeID, void *buffer,
+                                        TEE_LengthType *size);
 void TEE_CloseObject(TEE_ObjectHandle object);
 
 TEE_Result TEE_AllocateTransientObject(TEE_ObjectType objectType, uint32_t maxObjectSize,
@@ -260,8 +261,7 @@ TEE_Result TEE_MACComputeFinal(TEE_OperationHandle operation, const void *messag
 
 TEE_Result TEE_AEInit(TEE_OperationHandle operation, const void *nonce, TEE_LengthType nonceLen,
                       uint32_t tagLen, uint32_t AADLen, uint32_t payloadLen);
-void TEE_AEUpdateAAD(TEE_OperationHandle operation, const void *AADdata,
-                     TEE_LengthType AADdataLen);
+void TEE_AEUpdateAAD(TEE_OperationHandle operation, const void *AADdata, TEE_LengthType AADdataLen);
 TEE_Result TEE_AEUpdate(TEE_OperationHandle operation, const void *srcData, TEE_LengthType srcLen,
                         void *destData, TEE_LengthType *destLen);
 TEE_Result TEE_AEEncryptFinal(TEE_OperationHandle operation, const void *srcData,

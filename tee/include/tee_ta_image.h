@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The TA image format of the host TEE: what the loader reads from a trusted application's shared
 /// object. `tee_add_ta_image()` (tee/cmake) compiles tee/image/ta_image.cpp into every image, from
 /// the `ta_config.h` that the trusted application's build provides.

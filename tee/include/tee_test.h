@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// For tests only: devices in memory, trusted applications given as functions, faults on order,
 /// a power cut, and a sink for log lines.
 #ifndef TEE_TEST_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The trace facility of the TEE: one log line per call, on standard error or in a test's sink.
 ///
 /// A line reads "LEVEL [0xTHREAD] PREFIX:FUNCTION:LINE: MESSAGE", without the bracket where the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What is behind a TEEC_Context.
 #ifndef TEE_CLIENT_CONTEXT_H
 #define TEE_CLIENT_CONTEXT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Parameters of the Client API as the Internal Core API knows them.
 #ifndef TEE_CLIENT_PARAMS_H
 #define TEE_CLIENT_PARAMS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// How failures travel inside the host TEE: as an Error, up to the C function that was called. No
 /// exception crosses a C function.
 #ifndef TEE_ERROR_H

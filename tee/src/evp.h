@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Owners for what OpenSSL hands out, and its algorithms, fetched once per process.
 #ifndef TEE_EVP_H
 #define TEE_EVP_H

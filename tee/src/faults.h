@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Faults on order: which call of a trusted application is to fail, for tests.
 #ifndef TEE_FAULTS_H
 #define TEE_FAULTS_H

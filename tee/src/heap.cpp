@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "heap.h"
 
 #include <tee_internal_api.h>

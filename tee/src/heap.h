@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The heap of one instance: what TEE_Malloc() charges against gpd.ta.dataSize.
 #ifndef TEE_HEAP_H
 #define TEE_HEAP_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device: its storage, the instances that run on it, and the way into them.
 ///
 /// The secure world here has one core: a lock per device lets one thread at a time enter, whatever

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Files of the host. A namespace of its own, because <fcntl.h> declares a function tee(): its
 /// source must not see the namespace of that name.
 #ifndef TEE_HOST_FILE_H

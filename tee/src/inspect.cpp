@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include <tee_inspect.h>
 
 #include <cstdlib>

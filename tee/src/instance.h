@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What the rest of the host TEE knows of the trusted application that is running.
 #ifndef TEE_INSTANCE_H
 #define TEE_INSTANCE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Finds and loads TA images.
 ///
 /// An image is the file UUID.so, the UUID in lower case, in the first of these folders that has

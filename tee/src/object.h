@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The object behind a TEE_ObjectHandle, transient or persistent.
 #ifndef TEE_OBJECT_H
 #define TEE_OBJECT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The operation behind a TEE_OperationHandle.
 ///
 /// Everything that does not depend on the data is prepared when the operation is allocated or

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // RSA with PKCS #1 v1.5 padding (RFC 8017, sections 7.2 and 8.2).
 #include <openssl/crypto.h>
 #include <openssl/rsa.h>

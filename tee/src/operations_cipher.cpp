@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // AES: CBC without padding, and GCM.
 #include <openssl/crypto.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Digests and message authentication codes.
 #include <openssl/sha.h>
 

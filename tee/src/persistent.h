@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Open data streams of persistent objects.
 ///
 /// An object is read whole when its first handle opens; its handles share that copy. What is

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A storage whose power can be cut, for tests: it counts durable writes and, once cut, lets none
 /// through. Trusted applications notice nothing, as on a device that dies a moment later: they see
 /// what they wrote until the power is back, and then what storage really holds.

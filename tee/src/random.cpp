@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include <openssl/rand.h>
 #include <tee_internal_api.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Which devices this process has, by name and by state directory.
 #include <unistd.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// RSA keys between the attributes of an object and OpenSSL.
 #ifndef TEE_RSA_KEY_H
 #define TEE_RSA_KEY_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // TA-to-TA sessions (section 4.9).
 #include "error.h"
 #include "host_device.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "sqlite_storage.h"
 
 #include <sys/stat.h>

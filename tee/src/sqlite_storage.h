@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Persistent objects in an SQLite database: objects.db of a state directory.
 ///
 ///   objects(ta, id, digest, data)   one row per object, key (ta, id)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The directory that holds the state of a device, and the lock that makes this process its owner.
 #ifndef TEE_STATE_DIRECTORY_H
 #define TEE_STATE_DIRECTORY_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Where persistent objects are kept: one interface, a database of a state directory behind it or,
 /// in tests, memory.
 ///

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "ta_instance.h"
 
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A running trusted application: its program, and everything that it holds.
 #ifndef TEE_TA_INSTANCE_H
 #define TEE_TA_INSTANCE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include <sys/syscall.h>
 #include <tee_test.h>
 #include <tee_trace.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// UUIDs as bytes and as text.
 #ifndef TEE_UUID_H
 #define TEE_UUID_H

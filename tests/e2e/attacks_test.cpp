@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What an attacker may try who holds old requests, shares the buffers or is a TSM himself.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The command interface from outside: parameter types, framing, buffers.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The exchanges in docs/examples: the device must still answer the requests as it did then.
 //
 // With OTRP_WRITE_EXAMPLES set to a folder, the test writes them anew.

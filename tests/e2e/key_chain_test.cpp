@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // GetDeviceState from outside: how a TSM becomes known, and what its signature covers.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

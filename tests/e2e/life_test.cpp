@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A device's life: all messages, with every response, record and device state checked.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

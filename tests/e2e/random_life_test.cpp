@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Random requests, good ones and refused ones, against a small model of what the device must keep.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Requests that a handler refuses: the code in "reason", which members the answer has, and what is
 // stored afterwards.
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A device that is so full that it takes no more must still start, tell its state and be emptied.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The most that each message needs of the 2 MiB heap, held to what it has been measured to need.
 #include <gtest/gtest.h>
 

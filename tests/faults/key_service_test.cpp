@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A key service that answers wrongly: every answer gets a code, and none a signature.
 #include <gtest/gtest.h>
 

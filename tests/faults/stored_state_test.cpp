@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Whatever storage holds: the instance starts or refuses to start, every message is answered with a
 // code, and nothing else is written.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "faults/sweep.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// One driver for all fault sweeps: a scenario is run with the first call of a kind failing, then
 /// with the second, and so on, until a run is not hit any more; after each run everything is
 /// checked that must hold whatever failed.

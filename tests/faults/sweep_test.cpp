@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Every scenario with every kind of fault, at every point.
 #include "faults/sweep.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Processes that manage a device on disk are killed at any moment; the next one must find a device
 // that starts, tells its state and can be managed. Takes minutes: not part of the suite.
 #include <gtest/gtest.h>

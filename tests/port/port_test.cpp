@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A device behind any TEE Client API, as a TSM meets it. A real device is left as it was found, but
 // for the TSM that makes itself known and a row in the register of images.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device in memory that runs the real TA images, driven through the Client API.
 #ifndef SUPPORT_AGENT_DEVICE_H
 #define SUPPORT_AGENT_DEVICE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Unit tests of the agent's code run as an instance of a trusted application.
 #ifndef SUPPORT_INSIDE_AGENT_H
 #define SUPPORT_INSIDE_AGENT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Vectors that others published, as texts; numbers and bytes are hex or base64url as their source
 /// has them.
 #ifndef PUBLISHED_VECTORS_H

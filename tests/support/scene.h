@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device and a TSM that manages it: whole exchanges in one line.
 #ifndef SUPPORT_SCENE_H
 #define SUPPORT_SCENE_H

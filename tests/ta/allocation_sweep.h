@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// For unit tests of code that allocates and logs.
 #ifndef ALLOCATION_SWEEP_H
 #define ALLOCATION_SWEEP_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // What a kit is told of the agent is what its own image says to the host TEE.
 #include <dlfcn.h>
 #include <gtest/gtest.h>

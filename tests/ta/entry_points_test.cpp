@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Parameter types: of the 65536 combinations each command takes one.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Signatures and encrypted contents against vectors of the standards, and what the agent refuses.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Stored objects, the TA register and the device state, on storage that the tests look into.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

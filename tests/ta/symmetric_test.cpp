@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Known answers of others, and what the wrappers add: padding, truncation, refusals.
 #include "crypto/symmetric.h"
 

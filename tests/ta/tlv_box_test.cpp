@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/tlv_box.h"
 
 #include "support/inside_agent.h"

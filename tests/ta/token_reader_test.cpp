@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "state/token_reader.h"
 
 #include <climits>

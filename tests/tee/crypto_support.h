@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Keys and operations for tests that call the Internal Core API, and published RSA keys.
 #ifndef CRYPTO_SUPPORT_H
 #define CRYPTO_SUPPORT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // State directories: who may use them, what a crash leaves, what happens to damaged ones.
 #include <signal.h>
 #include <sys/resource.h>

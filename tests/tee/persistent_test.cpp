@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Persistent objects, on both kinds of storage.
 #include <memory>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // Ways into a trusted application: loading, sessions of both worlds, parameters.
 #include <atomic>
 #include <chrono>

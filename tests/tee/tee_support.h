@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What tests of the host TEE share: a folder of their own, trusted applications that do what a
 /// test says, and a client.
 #ifndef TEE_SUPPORT_H

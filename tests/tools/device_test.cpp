@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include <gmock/gmock.h>
 #include <sys/wait.h>
 #include <tee_test.h>

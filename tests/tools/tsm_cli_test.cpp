@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The program otrp-tsm as an operator meets it: exit codes, error lines, files left behind.
 #include <gtest/gtest.h>
 #include <sys/stat.h>

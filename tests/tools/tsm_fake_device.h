@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The answers of a device, made without one: what the TSM reads in tests.
 #ifndef TSM_FAKE_DEVICE_H
 #define TSM_FAKE_DEVICE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Bytes as text: base64 and base64url (RFC 4648) and hexadecimal.
 ///
 /// Decoders are strict: a character, length, padding or spare bit that no encoder would have

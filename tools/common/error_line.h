@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// How the command lines say what went wrong: one line on standard error, and an exit code.
 #ifndef COMMON_ERROR_LINE_H
 #define COMMON_ERROR_LINE_H

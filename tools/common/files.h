@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Whole files in and out. A path of "-" is standard input or standard output.
 ///
 /// Failures throw UsageError with the path and the system's reason. Bytes travel in std::string.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The result codes that a device answers with: their names, and what an operator can do.
 #ifndef COMMON_RESULT_NAMES_H
 #define COMMON_RESULT_NAMES_H

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: BSD-2-Clause
 # Bash completion for otrp-device and otrp-tsm: what --help of the command at hand lists. -*- sh -*-
 
 _otrp() {

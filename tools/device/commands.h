@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The commands of otrp-device. Each opens the device, does its work and leaves only the result on
 /// standard output; failures are thrown.
 #ifndef DEVICE_COMMANDS_H

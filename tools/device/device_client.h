@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device as the normal world sees it: sessions over the TEE Client API, the frames of the
 /// agent's commands, and the commands themselves.
 ///

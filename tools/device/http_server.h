@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The device end of OTrP over HTTP, for TSMs that bring their own transport.
 ///
 ///     POST /otrp/MESSAGE    the signed response; header OTrP-TA-Image names the path of a TA image

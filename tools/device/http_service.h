@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// A device that answers over HTTP, without the HTTP: what each request gets, as status, content
 /// and headers.
 ///

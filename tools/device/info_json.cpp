@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "device/info_json.h"
 
 #include <nlohmann/json.hpp>

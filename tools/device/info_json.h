@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What a TSM operator needs to know of a device, as the JSON line that otrp-tsm reads.
 #ifndef DEVICE_INFO_JSON_H
 #define DEVICE_INFO_JSON_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What only a TEE made for developers offers: a look into it from outside.
 #ifndef DEVICE_INSPECT_H
 #define DEVICE_INSPECT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// otrp-device: drives a device from the normal world.
 #include <CLI/CLI.hpp>
 #include <exception>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Storage object IDs, which are any bytes, as printable text: bytes outside printable ASCII and
 /// the backslash appear as `\xNN`.
 #ifndef DEVICE_OBJECT_ID_H

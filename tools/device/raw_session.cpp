@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "device/raw_session.h"
 
 #include <algorithm>

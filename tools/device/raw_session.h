@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Raw invocations of the agent, as the commands `invoke` and `session` take them.
 ///
 /// A session reads lines, whose fields are separated by blanks or tabs (so paths hold neither):

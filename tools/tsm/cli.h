@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The command line of otrp-tsm: its commands, options, help and checks of single values.
 #ifndef TSM_CLI_H
 #define TSM_CLI_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What each command of otrp-tsm does. Functions return an exit code, and throw tools::UsageError
 /// for wrong input and NotVerified for a response that is not to be believed.
 #ifndef TSM_COMMANDS_H

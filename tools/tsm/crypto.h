@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// RSA keys and the algorithms of RFC 7518 that the protocol uses, on OpenSSL.
 ///
 /// Failures of the cryptographic library, such as no memory, throw std::runtime_error; what

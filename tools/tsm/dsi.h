@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The device state information: {"dsi": {"tfwdata", "tee": {..., "sdlist", "teeaiklist"}}}.
 ///
 /// Functions that read a document take any JSON and pass over what is not as it should be.

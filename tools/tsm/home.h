@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The TSM's home directory: its identity, and what it knows of each device.
 ///
 ///     tsm.json           tsmid and the key chain that admits this TSM's key

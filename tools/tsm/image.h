@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// TA images: a file behind a header that carries its digest, as the device's register reads it.
 ///
 ///     | magic "OTrP TA image\0" (14) | version, 1 (2) | digest length, 32 (2) | 0 (2) |

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// JSON as the device reads and writes it.
 ///
 /// Members keep their order. The device writes control characters inside strings as they are, so

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The protocol's JWE objects: the content key RSA1_5-wrapped in the one recipient, while the
 /// protected header says "dir".
 ///

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// The eight messages and their names, in one place.
 #ifndef TSM_MESSAGES_H
 #define TSM_MESSAGES_H

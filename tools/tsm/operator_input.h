@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// From what an operator typed to what a request needs: files are read and
 /// checked against what the message and the device need. Everything here throws tools::UsageError.
 #ifndef TSM_OPERATOR_INPUT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Who takes part in an exchange: this TSM, and the device it talks to.
 #ifndef TSM_PARTIES_H
 #define TSM_PARTIES_H

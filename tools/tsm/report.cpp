@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/report.h"
 
 #include "common/result_names.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Verified responses and device states as an operator reads them: a few lines, or JSON.
 #ifndef TSM_REPORT_H
 #define TSM_REPORT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/request.h"
 
 #include "common/error_line.h"

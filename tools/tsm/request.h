@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Requests, from their plain members to the signed message.
 ///
 /// make_request() runs the whole way. The steps before it are for who needs a request that differs

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// Responses: envelope, signature, decrypted content. What has not been verified is handed to no
 /// one as if it were true: open_response() gives a verified response or throws NotVerified.
 #ifndef TSM_RESPONSE_H

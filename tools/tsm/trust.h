@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 /// What the CA-TSM key signs: the key chain entry that admits a TSM to devices, and the second
 /// signature of requests that bring a TA image.
 #ifndef TSM_TRUST_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // A TA image for tests of the loader: it counts commands in a global variable, and answers each
 // with their number in value 0.
 #include <tee_internal_api.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: BSD-2-Clause
 // The image of the test TA; see echo_ta.cpp.
 #ifndef TA_CONFIG_H
 #define TA_CONFIG_H
