@@ -19,22 +19,25 @@ constexpr uint32_t kDeviceIdCommand = 2;
 constexpr size_t kCapacity = 1 << 16;
 
 /// Payloads by ID. An object without a complete payload counts as one that is not there, as it does
-/// for the agent; of an AIK only counts whether it is the one it was before.
-Records records_of(const AgentDevice &device, const Records &before) {
+/// for the agent.
+Records payloads_of(const AgentDevice &device) {
   Records records;
   for (const auto &[id, raw] : device.objects()) {
     const auto payload = device.record(id);
-    if (!payload || payload->empty()) continue;
-    std::string text = *payload;
-    if (id.starts_with("SP_INFO_")) {
-      const auto old = before.find(id);
-      if (old == before.end() || old->second != text) {
-        Json record = Json::parse(text);
-        record["aik"] = "new";
-        text = record.dump();
-      }
-    }
-    records[id] = text;
+    if (payload && !payload->empty()) records[id] = *payload;
+  }
+  return records;
+}
+
+/// The same; of an AIK that is not in `before` only counts that it is a new one.
+Records records_of(const AgentDevice &device, const Records &before) {
+  Records records = payloads_of(device);
+  for (auto &[id, text] : records) {
+    const auto old = before.find(id);
+    if (!id.starts_with("SP_INFO_") || (old != before.end() && old->second == text)) continue;
+    Json record = Json::parse(text);
+    record["aik"] = "new";
+    text = record.dump();
   }
   return records;
 }
@@ -62,8 +65,7 @@ class Sweep {
     request_ = origin_.request(scenario.id, scenario.options);
     state_request_ = origin_.request(MessageId::kGetDeviceState, {});
     snapshot_ = origin_.device.snapshot();
-    before_ = records_of(origin_.device, {});
-    before_ = records_of(origin_.device, before_);
+    before_ = payloads_of(origin_.device);
     learn_good_run();
   }
 
