@@ -5,22 +5,37 @@
 
 #include <tee_internal_api.h>
 
-#include <unordered_set>
+#include <algorithm>
+#include <vector>
 
 #include "tee_test.h"
-
-struct __TEE_ObjectHandle;
-struct __TEE_OperationHandle;
 
 namespace tee {
 
 using test::Fault;
 
+/// Handles of one kind. They are few, and the one that is looked for is mostly the newest.
+template <class Handle>
+class HandleSet {
+ public:
+  void insert(Handle handle) { handles_.push_back(handle); }
+  bool contains(Handle handle) const {
+    return std::find(handles_.rbegin(), handles_.rend(), handle) != handles_.rend();
+  }
+  bool erase(Handle handle) { return std::erase(handles_, handle) != 0; }
+  bool empty() const { return handles_.empty(); }
+  size_t size() const { return handles_.size(); }
+  Handle newest() const { return handles_.back(); }
+
+ private:
+  std::vector<Handle> handles_;
+};
+
 /// Handles that an instance has open. A handle that is not in its set was never given out, or was
 /// given back: using it is a programmer error.
 struct OpenHandles {
-  std::unordered_set<__TEE_ObjectHandle *> objects;
-  std::unordered_set<__TEE_OperationHandle *> operations;
+  HandleSet<TEE_ObjectHandle> objects;
+  HandleSet<TEE_OperationHandle> operations;
 };
 
 class Instance;

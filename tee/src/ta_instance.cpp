@@ -25,8 +25,8 @@ Instance::~Instance() {
   while (!sessions.empty()) {
     device.close_session(std::move(sessions.extract(sessions.begin()).mapped()));
   }
-  while (!handles.operations.empty()) TEE_FreeOperation(*handles.operations.begin());
-  while (!handles.objects.empty()) close_handle(*handles.objects.begin());
+  while (!handles.operations.empty()) TEE_FreeOperation(handles.operations.newest());
+  while (!handles.objects.empty()) close_handle(handles.objects.newest());
 }
 
 // Ends, for no session is opened that would close a cycle.
