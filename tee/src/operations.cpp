@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-#include <openssl/rsa.h>
+#include <openssl/core_names.h>
+#include <openssl/params.h>
 
 #include <algorithm>
 #include <iterator>
@@ -88,25 +89,31 @@ bool set_cipher_key(__TEE_OperationHandle &operation, const std::vector<uint8_t>
          EVP_CIPHER_CTX_set_padding(context, 0) == 1;
 }
 
+// With its parameters in one go, which OpenSSL would otherwise look up one by one.
 bool start_rsa(EVP_PKEY_CTX *context, uint32_t mode) {
+  char digest[] = "SHA256";
+  char padding[] = OSSL_PKEY_RSA_PAD_MODE_PKCSV15;
+  const OSSL_PARAM for_signatures[] = {
+      OSSL_PARAM_construct_utf8_string(OSSL_SIGNATURE_PARAM_DIGEST, digest, 0),
+      OSSL_PARAM_construct_utf8_string(OSSL_PKEY_PARAM_PAD_MODE, padding, 0),
+      OSSL_PARAM_construct_end(),
+  };
+  const OSSL_PARAM *for_ciphers = for_signatures + 1;
   switch (mode) {
     case TEE_MODE_ENCRYPT:
-      return EVP_PKEY_encrypt_init(context) == 1;
+      return EVP_PKEY_encrypt_init_ex(context, for_ciphers) == 1;
     case TEE_MODE_DECRYPT:
-      return EVP_PKEY_decrypt_init(context) == 1;
+      return EVP_PKEY_decrypt_init_ex(context, for_ciphers) == 1;
     case TEE_MODE_SIGN:
-      return EVP_PKEY_sign_init(context) == 1 &&
-             EVP_PKEY_CTX_set_signature_md(context, algorithms().sha256) == 1;
+      return EVP_PKEY_sign_init_ex(context, for_signatures) == 1;
     default:
-      return EVP_PKEY_verify_init(context) == 1 &&
-             EVP_PKEY_CTX_set_signature_md(context, algorithms().sha256) == 1;
+      return EVP_PKEY_verify_init_ex(context, for_signatures) == 1;
   }
 }
 
 bool set_rsa_key(__TEE_OperationHandle &operation, EVP_PKEY *key) {
   operation.rsa.reset(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr));
-  return operation.rsa != nullptr && start_rsa(operation.rsa.get(), operation.mode) &&
-         EVP_PKEY_CTX_set_rsa_padding(operation.rsa.get(), RSA_PKCS1_PADDING) == 1;
+  return operation.rsa != nullptr && start_rsa(operation.rsa.get(), operation.mode);
 }
 
 bool set_key(__TEE_OperationHandle &operation, const __TEE_ObjectHandle &key) {
@@ -183,7 +190,7 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle *operation, uint32_t algori
 
 void TEE_FreeOperation(TEE_OperationHandle operation) {
   if (operation == TEE_HANDLE_NULL) return;
-  if (open_handles(current_instance()).operations.erase(operation) == 0) {
+  if (!open_handles(current_instance()).operations.erase(operation)) {
     panic(__func__, "not an open operation handle");
   }
   delete operation;

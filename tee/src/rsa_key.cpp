@@ -113,8 +113,9 @@ SharedKey import_rsa_key(const Attributes &attributes) {
   }
   params.push_back(OSSL_PARAM_construct_end());
 
+  // Importing leaves nothing in a context, and making one takes as long as importing a public key.
+  static thread_local const KeyContext context = rsa_context();
   const bool pair = attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT);
-  const KeyContext context = rsa_context();
   EVP_PKEY *key = nullptr;
   const bool made =
       context && EVP_PKEY_fromdata_init(context.get()) == 1 &&
