@@ -107,19 +107,23 @@ static TEE_Result read_frame_head(reader *in, uint32_t *message_id) {
 static const char kName[] = "OTrP_TaInvokeCmd";
 
 static TEE_Result verify(const message_entry *entry, const jsmn_string *message,
-                         secret_bytes *payload) {
-  request_context context = {reinterpret_cast<const uint8_t *>(message->data), message->len,
-                             entry->request_name, nullptr, 0};
+                         secret_bytes *payload, token_object_ptr *tokens) {
+  request_context context = {};
+  context.message = reinterpret_cast<const uint8_t *>(message->data);
+  context.message_len = message->len;
+  context.request_name = entry->request_name;
   const TEE_Result result = entry->verify(&context);
   payload->data = context.payload;
   payload->len = context.payload_len;
+  tokens->reset(context.tokens);
   CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to verify message");
   return TEE_SUCCESS;
 }
 
 // Finds out which TSM sent the message; a GetTAInfo request names none.
-static TEE_Result read_sender(work *job) {
-  job->request.reset(jsmn_init_object(job->message.get()));
+static TEE_Result read_sender(const jsmn_object *tokens, work *job) {
+  job->request.reset(tokens != nullptr ? jsmn_copy_object(tokens)
+                                       : jsmn_init_object(job->message.get()));
   CHECK_AS(kName, job->request, OTRP_BAD_REQUEST, "init request_json get NULL");
   const slice_ptr tsmid(jsmn_object_get_string(job->request.get(), "tsmid"));
   if (tsmid && tsmid->len != 0) job->tsmid.reset(jsmn_string_dup(tsmid->data, tsmid->len));
@@ -189,8 +193,10 @@ static TEE_Result answer_message(reader *in, uint32_t message_id, work *job, out
 
   secret_bytes payload;
   slice_ptr placed;
-  TRY(verify(entry, job->message.get(), &payload));
-  TRY(read_sender(job));
+  token_object_ptr tokens;
+  TRY(verify(entry, job->message.get(), &payload, &tokens));
+  TRY(read_sender(tokens.get(), job));
+  tokens.reset();
   TRY(place_payload(&payload, *out, job, &placed));
   TRY(process(entry, *out, placed, job));
   TRY(encode(entry, *job, out));

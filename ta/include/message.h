@@ -15,6 +15,7 @@ struct request_context {
   const char *request_name;  // outer key of the envelope
   uint8_t *payload;          // the decoded to-be-signed request and a NUL; the pipeline's to free
   uint32_t payload_len;
+  jsmn_object *tokens;  // the message's, NULL when it was not read; the pipeline's to free
 };
 
 /// A decrypted TA image on its way to the normal world. The pipeline frees `data`.

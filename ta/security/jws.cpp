@@ -25,6 +25,7 @@ constexpr uint32_t kModeWithSpekid = 2;
 
 // The members of a request's envelope; slices of the message text.
 struct envelope {
+  token_object_ptr root;
   slice_ptr payload;
   slice_ptr protect;
   slice_ptr signature;
@@ -45,9 +46,10 @@ static TEE_Result read_envelope(const char *caller, const request_context *conte
   CHECK_AS(caller, message, OTRP_NO_MEMORY, "init root_object_jsmn_string error");
   message->data = reinterpret_cast<const char *>(context->message);
   message->len = context->message_len;
-  const token_object_ptr root(jsmn_init_object(message.get()));
-  CHECK_AS(caller, root, OTRP_NO_MEMORY, "parse root_object_jsmn_string to root_object error");
-  const token_object_ptr request(jsmn_object_get_object(root.get(), context->request_name));
+  parts->root.reset(jsmn_init_object(message.get()));
+  CHECK_AS(caller, parts->root, OTRP_NO_MEMORY,
+           "parse root_object_jsmn_string to root_object error");
+  const token_object_ptr request(jsmn_object_get_object(parts->root.get(), context->request_name));
   CHECK_AS(caller, request, OTRP_BAD_REQUEST, "%s not found", context->request_name);
 
   parts->payload.reset(jsmn_object_get_string(request.get(), "payload"));
@@ -189,6 +191,7 @@ TEE_Result verify_decode_by_name(request_context *context) {
 
   context->payload_len = payload.len;
   context->payload = payload.release();
+  context->tokens = parts.root.release();
   return TEE_SUCCESS;
 }
 

@@ -142,21 +142,32 @@ jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key) 
   return slice;
 }
 
-// The tokens of an inner object follow its own. Its text, which may be large, is not read again.
+// An object over the part of a text that begins at `offset`, from the part's tokens. The text,
+// which may be large, is not read again.
+static jsmn_object *copy_tokens(const jsmn_string &part, int offset, const jsmn_token *from,
+                                uint32_t count) {
+  if (count > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
+  tee_ptr<jsmn_token> tokens = allocate_tokens(static_cast<int>(count));
+  CHECK_AS(kInitObject, tokens, nullptr, "%s", kNoMemory);
+  for (uint32_t i = 0; i < count; ++i) {
+    tokens.get()[i] = from[i];
+    tokens.get()[i].start -= offset;
+    tokens.get()[i].end -= offset;
+  }
+  return make_object(part, &tokens, count);
+}
+
+jsmn_object *jsmn_copy_object(const jsmn_object *object) {
+  return copy_tokens(*object->text, 0, object->tokens, object->count);
+}
+
+// The tokens of an inner object follow its own.
 static jsmn_object *copy_inner_object(const jsmn_object *object, const jsmn_token *inner) {
   const jsmn_token *end = inner;
   const jsmn_token *last = object->tokens + object->count;
   while (end != last && end->start < inner->end) ++end;
-  const auto count = static_cast<int>(end - inner);
-  if (count > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
-  tee_ptr<jsmn_token> tokens = allocate_tokens(count);
-  CHECK_AS(kInitObject, tokens, nullptr, "%s", kNoMemory);
-  for (int i = 0; i < count; ++i) {
-    tokens.get()[i] = inner[i];
-    tokens.get()[i].start -= inner->start;
-    tokens.get()[i].end -= inner->start;
-  }
-  return make_object(text_of(object, inner), &tokens, static_cast<uint32_t>(count));
+  return copy_tokens(text_of(object, inner), inner->start, inner,
+                     static_cast<uint32_t>(end - inner));
 }
 
 jsmn_object *jsmn_object_get_object(const jsmn_object *object, const char *key) {

@@ -34,6 +34,9 @@ jsmn_string *jsmn_init_string();
 /// text is no JSON whose first value is an object, or memory ran out.
 jsmn_object *jsmn_init_object(const jsmn_string *slice);
 
+/// A new object like `object`, over the same text, which is not read again.
+jsmn_object *jsmn_copy_object(const jsmn_object *object);
+
 /// A new slice of the value that follows `key`, without the quotes of a string. Its `data` is NULL
 /// when there is no such value; that of an empty string is not. NULL: no memory.
 jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key);
