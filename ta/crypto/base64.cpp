@@ -11,6 +11,7 @@
 namespace {
 
 using characters = int8_t __attribute__((vector_size(16)));
+using octets = uint8_t __attribute__((vector_size(16)));
 using quartets = uint32_t __attribute__((vector_size(16)));  // the same bytes, four by four
 
 constexpr uint32_t kNumCharacters = sizeof(characters);
@@ -32,12 +33,16 @@ constexpr int8_t kUpper = 0 - 'A';
 constexpr int8_t kLower = 26 - 'a';
 constexpr int8_t kDigit = 52 - '0';
 
-// Place of the n-th character of a quartet in its number, as memory has it.
-constexpr uint32_t shift_of(uint32_t n) {
-  return __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__ ? 8 * n : 24 - 8 * n;
-}
+constexpr bool kLittleEndian = __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__;
 
 }  // namespace
+
+// Between memory and numbers whose first byte is the lowest.
+static inline quartets first_byte_lowest(quartets numbers) {
+  if (kLittleEndian) return numbers;
+  for (uint32_t i = 0; i < kNumQuartets; ++i) numbers[i] = __builtin_bswap32(numbers[i]);
+  return numbers;
+}
 
 // ---- Encoding
 
@@ -50,8 +55,8 @@ template <const alphabet &To>
 static void encode_block(const uint8_t *bytes, char *text) {
   const quartets bits = {load_big_endian(bytes), load_big_endian(bytes + 3),
                          load_big_endian(bytes + 6), load_big_endian(bytes + 9)};
-  const quartets split = ((bits >> 26) & 63) << shift_of(0) | ((bits >> 20) & 63) << shift_of(1) |
-                         ((bits >> 14) & 63) << shift_of(2) | ((bits >> 8) & 63) << shift_of(3);
+  const quartets pairs = bits >> 20 | ((bits << 8) & 0x0FFF0000);
+  const quartets split = first_byte_lowest(((pairs >> 6) & 0x003F003F) | (pairs & 0x003F003F) << 8);
   characters values;
   memcpy(&values, &split, sizeof values);
 
@@ -118,15 +123,24 @@ struct decoder {
   int gather(uint32_t *bits);
   bool take_group();
   void take_rest();
+  void take_scattered();
 };
 
 }  // namespace
 
+// One comparison: what stands behind `Last` wraps around to the negative numbers.
+template <char First, char Last>
+static inline characters in_range(characters text) {
+  constexpr uint8_t kUp = INT8_MAX - Last;
+  const auto moved = reinterpret_cast<characters>(reinterpret_cast<octets>(text) + kUp);
+  return moved >= static_cast<int8_t>(INT8_MAX - (Last - First));
+}
+
 // What leads from each character to its value; 0 from one that has none.
 template <const alphabet &Also>
 static inline characters distances_of(characters text) {
-  return ((text >= 'A') & (text <= 'Z') & kUpper) | ((text >= 'a') & (text <= 'z') & kLower) |
-         ((text >= '0') & (text <= '9') & kDigit) |
+  return (in_range<'A', 'Z'>(text) & kUpper) | (in_range<'a', 'z'>(text) & kLower) |
+         (in_range<'0', '9'>(text) & kDigit) |
          ((text == kStandard.value_62) & kStandard.distance_62) |
          ((text == kStandard.value_63) & kStandard.distance_63) |
          ((text == Also.value_62) & Also.distance_62) |
@@ -139,11 +153,12 @@ static bool any_nonzero(characters flags) {
   return (halves[0] | halves[1]) != 0;
 }
 
-// The high bytes, three or four of them. Four are quicker, where what follows is yet to be written.
+// Two numbers of 24 bits. Eight bytes are quicker, where what follows is yet to be written.
 template <size_t Num>
-static inline void store_big_endian(uint32_t bits, uint8_t *to) {
-  if (__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__) bits = __builtin_bswap32(bits);
-  memcpy(to, &bits, Num);
+static inline void store_big_endian(uint32_t first, uint32_t second, uint8_t *to) {
+  uint64_t both = uint64_t{first} << 40 | uint64_t{second} << 16;
+  if (kLittleEndian) both = __builtin_bswap64(both);
+  memcpy(to, &both, Num);
 }
 
 // False, and nothing stored, when one of the sixteen characters has to be skipped.
@@ -156,12 +171,11 @@ static inline bool decode_block(const char *from, uint8_t *to) {
   const characters values = text + distances;
   quartets split;
   memcpy(&split, &values, sizeof split);
-  const quartets bits = ((split >> shift_of(0)) & 63) << 26 | ((split >> shift_of(1)) & 63) << 20 |
-                        ((split >> shift_of(2)) & 63) << 14 | ((split >> shift_of(3)) & 63) << 8;
-  store_big_endian<4>(bits[0], to);
-  store_big_endian<4>(bits[1], to + 3);
-  store_big_endian<4>(bits[2], to + 6);
-  store_big_endian<3>(bits[3], to + 9);
+  split = first_byte_lowest(split);
+  const quartets pairs = (split & 0x00FF00FF) << 6 | ((split >> 8) & 0x00FF00FF);
+  const quartets bits = (pairs & 0xFFF) << 12 | pairs >> 16;
+  store_big_endian<8>(bits[0], bits[1], to);
+  store_big_endian<6>(bits[2], bits[3], to + 6);
   return true;
 }
 
@@ -235,6 +249,12 @@ void decoder<Also>::take_rest() {
 }
 
 template <const alphabet &Also>
+void decoder<Also>::take_scattered() {
+  while (take_group()) take_blocks();
+  take_rest();
+}
+
+template <const alphabet &Also>
 static uint32_t decode(const char *caller, const char *text, uint32_t len, uint32_t spare,
                        uint8_t **bytes) {
   if (text == nullptr) return 0;
@@ -245,8 +265,7 @@ static uint32_t decode(const char *caller, const char *text, uint32_t len, uint3
   decoder<Also> in = {text, text + len, *bytes};
   in.take_blocks();
   in.take_last_block();
-  while (in.take_group()) in.take_blocks();
-  in.take_rest();
+  if (in.at != in.end) in.take_scattered();
   return static_cast<uint32_t>(in.to - *bytes);
 }
 
