@@ -9,7 +9,6 @@
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
 #include "failure.h"
-#include "operations/exchange.h"
 #include "operations/operations.h"
 #include "operations/refresh_sd.h"
 #include "record_names.h"
@@ -45,18 +44,6 @@ constexpr uint32_t kImageKeyLen = 32;  // the last 16 bytes are the AES key
 }  // namespace
 
 // ---- The image
-
-void drop_image(ta_image *image) {
-  if (image->data != nullptr) {
-    wipe(image->data, image->len);
-    TEE_Free(image->data);
-  }
-  *image = {};
-}
-
-const uint8_t *image_with_header(const ta_image &image) {
-  return image.len >= kTaImageHeaderLen ? image.data : nullptr;
-}
 
 static TEE_Result decode_member(const char *caller, const jsmn_object *from, const char *key,
                                 const char *missing, const char *undecodable, secret_bytes *bytes) {
@@ -116,6 +103,28 @@ TEE_Result verify_encrypted_ta(const char *field, const char *spid, const jsmn_o
   *image = plain.release();
   *digest = hash.release();
   return TEE_SUCCESS;
+}
+
+TEE_Result hand_over_image(exchange *x, const char *taid, ta_register_operation operation_code,
+                           secret_bytes *plain, ta_image *image) {
+  image->len = plain->len;
+  image->data = plain->release();
+  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
+  const uint8_t *with_header = image->len >= kTaImageHeaderLen ? image->data : nullptr;
+  TRY_LOG_AS(x->texts->process, save_ta_register_info(taid, with_header, operation_code),
+             "save_ta_register_info fail error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result close_with_image(exchange *x, TEE_Result result, char **response, ta_image *image) {
+  const TEE_Result closed = close_response(x, result, response);
+  if (closed != TEE_SUCCESS) {
+    secret_bytes dropped;
+    dropped.data = image->data;
+    dropped.len = image->len;
+    *image = {};
+  }
+  return closed;
 }
 
 // ---- The records
@@ -190,12 +199,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   TRY_LOG_AS(name, install_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "install_ta error code 0x%x");
 
-  image->len = plain.len;
-  image->data = plain.release();
-  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
-  TRY_LOG_AS(name, save_ta_register_info(taid, image_with_header(*image), kRegisterTa),
-             "save_ta_register_info fail error code: 0x%x");
-  return TEE_SUCCESS;
+  return hand_over_image(x, taid, kRegisterTa, &plain, image);
 }
 
 TEE_Result installta_process(const char *tsmid, const jsmn_object *tbs, char **response,
@@ -203,7 +207,5 @@ TEE_Result installta_process(const char *tsmid, const jsmn_object *tbs, char **r
   TRY(check_input(kTexts, tbs, response));
   exchange x(kTexts, tsmid);
   const TEE_Result result = carry_out(&x, tbs, request, image);
-  const TEE_Result closed = close_response(&x, result, response);
-  if (closed != TEE_SUCCESS) drop_image(image);
-  return closed;
+  return close_with_image(&x, result, response, image);
 }

@@ -7,6 +7,9 @@
 #include <tee_internal_api.h>
 
 #include "message.h"
+#include "operations/exchange.h"
+#include "ownership.h"
+#include "state/ta_register.h"
 
 /// Decrypts the TA image of "encrypted_ta": {"key", "iv", FIELD}, with the AIK of SP `spid`.
 /// `field` names the ciphertext member. The image and its SHA-256 digest (32 bytes) come in new
@@ -16,10 +19,14 @@
                                              const jsmn_object *encrypted_ta, uint8_t **image,
                                              uint32_t *image_len, uint8_t **digest);
 
-/// Wipes and frees an image that is not handed over after all.
-void drop_image(ta_image *image);
+/// Moves the decrypted image to where the pipeline takes it, names the TA in the response and
+/// changes its row of the register, which refuses an image that is too short to have a header.
+[[nodiscard]] TEE_Result hand_over_image(exchange *x, const char *taid,
+                                         ta_register_operation operation_code, secret_bytes *plain,
+                                         ta_image *image);
 
-/// The image as the TA register takes it: NULL when it is too short to have a header.
-const uint8_t *image_with_header(const ta_image &image);
+/// close_response() for these messages: without a response there is no image either.
+[[nodiscard]] TEE_Result close_with_image(exchange *x, TEE_Result result, char **response,
+                                          ta_image *image);
 
 #endif

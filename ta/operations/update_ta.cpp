@@ -1,13 +1,11 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // UpdateTA: replaces the image and the version of an installed TA.
 #include "failure.h"
-#include "operations/exchange.h"
 #include "operations/install_ta.h"
 #include "operations/operations.h"
 #include "security/tsm_trust.h"
 #include "state/object_store.h"
 #include "state/records.h"
-#include "state/ta_register.h"
 
 namespace {
 
@@ -79,12 +77,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   TRY_LOG_AS(name, update_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "update_ta error code 0x%x");
 
-  image->len = plain.len;
-  image->data = plain.release();
-  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
-  TRY_LOG_AS(name, save_ta_register_info(taid, image_with_header(*image), kUpdateTa),
-             "save_ta_register_info fail error code: 0x%x");
-  return TEE_SUCCESS;
+  return hand_over_image(x, taid, kUpdateTa, &plain, image);
 }
 
 TEE_Result updateta_process(const char *tsmid, const jsmn_object *tbs, char **response,
@@ -92,7 +85,5 @@ TEE_Result updateta_process(const char *tsmid, const jsmn_object *tbs, char **re
   TRY(check_input(kTexts, tbs, response));
   exchange x(kTexts, tsmid);
   const TEE_Result result = carry_out(&x, tbs, request, image);
-  const TEE_Result closed = close_response(&x, result, response);
-  if (closed != TEE_SUCCESS) drop_image(image);
-  return closed;
+  return close_with_image(&x, result, response, image);
 }
