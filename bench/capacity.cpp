@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // What fits a device whose agent has a heap of 2 MiB.
+#include <tee_test.h>
+
 #include "device.h"
 
 namespace bench {
@@ -79,6 +81,7 @@ benchmark::UserCounters peak_of(MessageCase message, size_t num_sds) {
 
 void add(const std::string &name, const std::function<benchmark::UserCounters()> &find) {
   const auto run = [find](benchmark::State &state) {
+    const tee::test::TraceSink log;
     while (state.KeepRunning()) state.counters = find();
   };
   benchmark::RegisterBenchmark(name.c_str(), run)->Iterations(1);

@@ -67,7 +67,6 @@ size_t run(Options &options) {
   benchmark::AddCustomContext("openssl", OpenSSL_version(OPENSSL_VERSION));
   std::filesystem::remove_all(options.suite.work_directory);
   tee::test::reuse_generated_keys(4);  // nothing that is timed makes one
-  const tee::test::TraceSink log;      // nothing that is measured waits for a terminal
   Progress progress;
   return benchmark::RunSpecifiedBenchmarks(&progress);
 }
