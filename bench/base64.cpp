@@ -4,54 +4,65 @@
 
 #include <openssl/evp.h>
 
-#include "groups.h"
+#include <memory>
+
 #include "inside.h"
 #include "ownership.h"
+#include "suite.h"
 #include "tsm/crypto.h"
 
 namespace bench {
+namespace {
 
-void measure_base64(Bench &bench) {
-  tee::test::Device device;
-  const Inside inside(device);
+struct Texts {
+  explicit Texts(size_t len) : bytes(tsm::random_bytes(len)) {}
+
+  Inside inside;
+  const std::string bytes;
+  const std::string text = tsm::base64url_encode(bytes);
+  const std::string padded = tsm::base64_encode(bytes);
+  std::vector<uint8_t> room = std::vector<uint8_t>(2 * bytes.size() + 4);
+};
+
+Comparison encoders(size_t len) {
+  const auto texts = std::make_shared<Texts>(len);
+  const auto encode = [texts] {
+    const tee_ptr<char> encoded(base64urlEncodeAddEndZero(
+        bytes_of(texts->bytes), static_cast<uint32_t>(texts->bytes.size())));
+    benchmark::DoNotOptimize(encoded.get());
+  };
+  const auto openssl = [texts] {
+    EVP_EncodeBlock(texts->room.data(), bytes_of(texts->bytes),
+                    static_cast<int>(texts->bytes.size()));
+  };
+  return {{{"agent", encode}, {.name = "OpenSSL", .run = openssl, .target = 1.0}}};
+}
+
+Comparison decoders(size_t len) {
+  const auto texts = std::make_shared<Texts>(len);
+  const auto decode = [texts] {
+    secret_bytes decoded;
+    decoded.len = base64urlDecodeStringRemoveEndZeroV2(
+        texts->text.data(), static_cast<uint32_t>(texts->text.size()), &decoded.data);
+    benchmark::DoNotOptimize(decoded.data);
+  };
+  const auto openssl = [texts] {
+    EVP_DecodeBlock(texts->room.data(), bytes_of(texts->padded),
+                    static_cast<int>(texts->padded.size()));
+  };
+  return {{{"agent", decode}, {.name = "OpenSSL", .run = openssl, .target = 1.0}}};
+}
+
+}  // namespace
+
+void add_base64(Suite &suite) {
   const struct {
     size_t len;
     const char *text;
   } sizes[] = {{256, "256 bytes"}, {64 << 10, "64 KiB"}, {1 << 20, "1 MiB"}};
   for (const auto &size : sizes) {
-    const std::string bytes = tsm::random_bytes(size.len);
-    const std::string text = tsm::base64url_encode(bytes);
-    const std::string padded = tsm::base64_encode(bytes);
-    std::vector<uint8_t> room(2 * size.len + 4);
-    const Contestant encode = {[&] {
-      const tee_ptr<char> encoded(
-          base64urlEncodeAddEndZero(bytes_of(bytes), static_cast<uint32_t>(bytes.size())));
-      keep(encoded);
-    }};
-    const Contestant decode = {[&] {
-      secret_bytes decoded;
-      decoded.len = base64urlDecodeStringRemoveEndZeroV2(
-          text.data(), static_cast<uint32_t>(text.size()), &decoded.data);
-      keep(decoded);
-    }};
-    const Contestant openssl_encode = {
-        [&] { EVP_EncodeBlock(room.data(), bytes_of(bytes), static_cast<int>(bytes.size())); }};
-    const Contestant openssl_decode = {
-        [&] { EVP_DecodeBlock(room.data(), bytes_of(padded), static_cast<int>(padded.size())); }};
-    const struct {
-      const char *name;
-      std::vector<Contestant> pair;
-    } rows[] = {{"encode", {encode, openssl_encode}}, {"decode", {decode, openssl_decode}}};
-    for (const auto &row : rows) {
-      const Rounds rounds = compare(row.pair, bench.effort);
-      bench.report.figures.push_back({.group = "base64url / OpenSSL",
-                                      .name = std::string(row.name) + ", " + size.text,
-                                      .value = rounds.ratio(0, 1),
-                                      .unit = "x",
-                                      .target = at_most(1.0),
-                                      .detail = time_text(rounds.seconds(0).median) + " / " +
-                                                time_text(rounds.seconds(1).median)});
-    }
+    suite.compare(std::string("base64/encode, ") + size.text, [=] { return encoders(size.len); });
+    suite.compare(std::string("base64/decode, ") + size.text, [=] { return decoders(size.len); });
   }
 }
 

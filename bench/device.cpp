@@ -114,28 +114,32 @@ Snapshot filled(const Snapshot &first, size_t num_sds) {
   return snapshot;
 }
 
-FilledDevice::FilledDevice(size_t num_sds) {
+std::shared_ptr<Scene> start(const Scene &first, const Snapshot &snapshot) {
+  const auto scene = std::make_shared<Scene>(first, snapshot);
+  const bool started =
+      scene->device.open() && Exchange(scene, message_case(MessageId::kGetDeviceState)).try_once();
+  return started ? scene : nullptr;
+}
+
+std::shared_ptr<Scene> filled_device(size_t num_sds) {
   Scene first;
   make_first_sd(first);
-  snapshot_ = filled(first.device.snapshot(), num_sds);
-  scene_.emplace(first, snapshot_);
-  require(scene_->device.open(), "start");
-  if (!Exchange(*scene_, message_case(MessageId::kGetDeviceState)).try_once()) {
-    throw std::runtime_error("the device refused to tell its state");
-  }
+  const auto scene = start(first, filled(first.device.snapshot(), num_sds));
+  require(scene != nullptr, "start");
+  return scene;
 }
 
 // ---- Exchanges
 
-Exchange::Exchange(Scene &scene, MessageCase message)
-    : scene_(scene),
+Exchange::Exchange(std::shared_ptr<Scene> scene, MessageCase message)
+    : scene_(std::move(scene)),
       message_(std::move(message)),
-      session_(scene.device.door(), device::kAgentUuid),
+      session_(scene_->device.door(), device::kAgentUuid),
       output_(kOutputLen) {}
 
 void Exchange::before() {
-  if (message_.arrange != nullptr) message_.arrange(scene_);
-  request_ = scene_.request(message_.id, message_.options);
+  if (message_.arrange != nullptr) message_.arrange(*scene_);
+  request_ = scene_->request(message_.id, message_.options);
   frame_ = otrp_test::frame(static_cast<uint32_t>(message_.id), request_);
   operation_ = {};
   operation_.paramTypes = device::kMessageTypes;
@@ -150,30 +154,31 @@ void Exchange::run() {
 
 bool Exchange::read_answer() {
   if (result_ != TEEC_SUCCESS || word_at(output_.data()) != 0) return false;
-  const tsm::ResponseKeys keys = {scene_.info.tee_key, scene_.tsm().key, &scene_.dsi};
+  const tsm::ResponseKeys keys = {scene_->info.tee_key, scene_->tsm().key, &scene_->dsi};
   response_.assign(output_.data() + 8, word_at(output_.data() + 4));
   const tsm::Response response = tsm::open_response(response_, keys);
   if (response.status == "fail") return false;
   if (response.dsi_text) {
-    scene_.dsi_text = *response.dsi_text;
-    scene_.dsi = tsm::parse_json(scene_.dsi_text).value();
+    scene_->dsi_text = *response.dsi_text;
+    scene_->dsi = tsm::parse_json(scene_->dsi_text).value();
   }
   return true;
 }
 
 void Exchange::after() {
   if (!read_answer()) throw std::runtime_error(message_.name + " was not carried out");
-  if (message_.restore != nullptr) message_.restore(scene_);
-}
-
-Contestant Exchange::contestant() {
-  return {[this] { run(); }, [this] { before(); }, [this] { after(); }};
+  if (message_.restore != nullptr) message_.restore(*scene_);
 }
 
 bool Exchange::try_once() {
   before();
   run();
   return read_answer();
+}
+
+Contestant contestant(const std::string &name, const std::shared_ptr<Exchange> &exchange) {
+  return {name, [exchange] { exchange->run(); }, [exchange] { exchange->before(); },
+          [exchange] { exchange->after(); }};
 }
 
 }  // namespace bench

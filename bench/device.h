@@ -3,12 +3,12 @@
 #ifndef BENCH_DEVICE_H
 #define BENCH_DEVICE_H
 
-#include <optional>
+#include <memory>
 #include <string>
 #include <vector>
 
 #include "device/device_client.h"
-#include "harness.h"
+#include "suite.h"
 #include "support/scene.h"
 
 namespace bench {
@@ -39,22 +39,17 @@ Snapshot filled(const Snapshot &first, size_t num_sds);
 /// A device with "sd1", "ta1" and "ta2".
 void make_first_sd(Scene &scene);
 
-/// A device in memory that has been started with `num_sds` SDs, and a TSM that knows its state.
-class FilledDevice {
- public:
-  explicit FilledDevice(size_t num_sds);
-  Scene &scene() { return *scene_; }
-  const Snapshot &snapshot() const { return snapshot_; }
+/// A device in memory in the state of `first` with the objects of `snapshot`, started, and a TSM
+/// that knows its state; NULL when it does not start or tell.
+std::shared_ptr<Scene> start(const Scene &first, const Snapshot &snapshot);
 
- private:
-  Snapshot snapshot_;
-  std::optional<Scene> scene_;
-};
+/// A started device with `num_sds` SDs.
+std::shared_ptr<Scene> filled_device(size_t num_sds);
 
 /// One message to one device through the Client API, with all buffers made beforehand.
 class Exchange {
  public:
-  Exchange(Scene &scene, MessageCase message);
+  Exchange(std::shared_ptr<Scene> scene, MessageCase message);
   Exchange(const Exchange &) = delete;
   Exchange &operator=(const Exchange &) = delete;
 
@@ -62,17 +57,17 @@ class Exchange {
   void run();
   /// Throws when the device has not carried the message out.
   void after();
-  Contestant contestant();
 
   /// The whole of it; false when the device has not carried the message out.
   bool try_once();
+  const Scene &scene() const { return *scene_; }
   const std::string &request() const { return request_; }
   const std::string &response() const { return response_; }
 
  private:
   bool read_answer();
 
-  Scene &scene_;
+  const std::shared_ptr<Scene> scene_;
   const MessageCase message_;
   device::Session session_;
   std::string request_;
@@ -82,6 +77,8 @@ class Exchange {
   TEEC_Result result_ = 0;
   std::string response_;
 };
+
+Contestant contestant(const std::string &name, const std::shared_ptr<Exchange> &exchange);
 
 }  // namespace bench
 

@@ -2,7 +2,6 @@
 // Whole exchanges against the cryptography that they cannot do without.
 #include "device.h"
 #include "floor.h"
-#include "groups.h"
 
 namespace bench {
 namespace {
@@ -13,44 +12,36 @@ constexpr double kTargetWithoutImage = 1.10;
 constexpr double kTargetWithImage = 1.15;
 constexpr double kTargetWithLargeImage = 1.5;
 
-void measure(Bench &bench, Scene &scene, const MessageCase &message, const std::string &name,
-             double target) {
-  Exchange exchange(scene, message);
-  const size_t dsi_len = scene.dsi_text.size();
-  exchange.before();
-  exchange.run();
-  exchange.after();
-  const auto floor = [&](Keys keys) -> Contestant {
-    const auto works = work_of(message, exchange.request(), exchange.response(), dsi_len, keys);
-    return {[works] {
+Comparison exchange_and_floors(const MessageCase &message, double target) {
+  const auto exchange = std::make_shared<Exchange>(filled_device(kNumSds), message);
+  const size_t dsi_len = exchange->scene().dsi_text.size();
+  exchange->before();
+  exchange->run();
+  exchange->after();
+  const auto floor = [&](Keys keys) {
+    return [works = work_of(message, exchange->request(), exchange->response(), dsi_len, keys)] {
       for (const auto &work : works) work();
-    }};
+    };
   };
-  const Rounds rounds =
-      compare({exchange.contestant(), floor(Keys::kAtHand), floor(Keys::kNew)}, bench.effort);
-  const auto add = [&](size_t reference, const std::string &row, Target limit) {
-    bench.report.figures.push_back({.group = "exchange / floor",
-                                    .name = row,
-                                    .value = rounds.ratio(0, reference),
-                                    .unit = "x",
-                                    .target = limit,
-                                    .detail = time_text(rounds.seconds(0).median) + " / " +
-                                              time_text(rounds.seconds(reference).median)});
-  };
-  add(1, name, at_most(target));
-  add(2, name + ", floor with new keys", {});
+  return {{contestant("exchange", exchange),
+           {.name = "floor", .run = floor(Keys::kAtHand), .target = target},
+           {.name = "floor with new keys", .run = floor(Keys::kNew)}}};
+}
+
+bool has_image(const MessageCase &message) {
+  return !tsm::image_member(message.id).empty();
+}
+
+void add(Suite &suite, const std::string &name, const MessageCase &message, double target) {
+  suite.compare("exchanges/" + name, [=] { return exchange_and_floors(message, target); },
+                {.batches = false});
 }
 
 }  // namespace
 
-void measure_exchanges(Bench &bench) {
-  FilledDevice device(kNumSds);
-  const auto has_image = [](const MessageCase &message) {
-    return !tsm::image_member(message.id).empty();
-  };
+void add_exchanges(Suite &suite) {
   for (const MessageCase &message : message_cases()) {
-    if (has_image(message)) continue;
-    measure(bench, device.scene(), message, message.name, kTargetWithoutImage);
+    if (!has_image(message)) add(suite, message.name, message, kTargetWithoutImage);
   }
   const struct {
     size_t len;
@@ -62,7 +53,7 @@ void measure_exchanges(Bench &bench) {
   for (const auto &image : images) {
     for (const MessageCase &message : message_cases(image.len)) {
       if (!has_image(message)) continue;
-      measure(bench, device.scene(), message, message.name + ", " + image.text, image.target);
+      add(suite, message.name + ", " + image.text, message, image.target);
     }
   }
 }

@@ -9,8 +9,10 @@
 
 namespace bench {
 
+/// Makes this thread the instance while it lives, with its objects in memory or on a disk.
 struct Inside {
-  explicit Inside(tee::test::Device &device) : ta(device, properties()) {}
+  Inside() = default;
+  explicit Inside(const std::string &state_directory) : device(state_directory) {}
 
   static tee::test::TaProperties properties() {
     tee::test::TaProperties roomy;
@@ -18,7 +20,8 @@ struct Inside {
     return roomy;
   }
 
-  tee::test::InsideTa ta;
+  tee::test::Device device;
+  tee::test::InsideTa ta{device, properties()};
 };
 
 inline const uint8_t *bytes_of(const std::string &bytes) {

@@ -2,15 +2,12 @@
 // The agent's JSON documents against other libraries: a device state document of 200 KiB.
 #include "state/json.h"
 
-#include <malloc.h>
-
-#include <limits>
-#include <optional>
+#include <memory>
 #include <stdexcept>
 
-#include "groups.h"
 #include "inside.h"
 #include "libraries/libraries.h"
+#include "suite.h"
 #include "tsm/crypto.h"
 #include "tsm/json.h"
 
@@ -56,107 +53,76 @@ const JsonLibrary kAgent = {
     .free = [](void *document) { json_value_free(tree(document)); },
 };
 
-// What the process has taken from the C library, under which all of them lie.
-size_t heap_in_use() {
-  const struct mallinfo2 info = ::mallinfo2();
-  return info.uordblks + info.hblkhd;
-}
-
-double heap_of(const JsonLibrary &library, const std::string &text) {
-  const size_t before = heap_in_use();
-  void *document = library.parse(text);
-  const size_t with = heap_in_use();
-  library.free(document);
-  return with > before ? static_cast<double>(with - before) : 0;
-}
-
-struct Subject {
-  const JsonLibrary *library;
-  void *document;
+struct Stage {
+  Inside inside;
+  const std::string text = make_document();
 };
 
-using Work = void (*)(const Subject &, const std::string &);
+/// One library with a document that it has parsed, and a second one for a while.
+class Subject {
+ public:
+  Subject(std::shared_ptr<const Stage> stage, const JsonLibrary &library)
+      : stage_(std::move(stage)), library_(library), document_(library.parse(stage_->text)) {
+    require(document_ != nullptr, "parse");
+  }
+  ~Subject() { library_.free(document_); }
+  Subject(const Subject &) = delete;
+  Subject &operator=(const Subject &) = delete;
 
-void parse(const Subject &subject, const std::string &text) {
-  void *document = subject.library->parse(text);
-  if (document == nullptr) throw std::runtime_error("a document was not parsed");
-  subject.library->free(document);
-}
+  void parse() {
+    second_ = library_.parse(stage_->text);
+    require(second_ != nullptr, "parse");
+  }
+  void free() { library_.free(second_); }
+  void parse_and_free() {
+    parse();
+    free();
+  }
+  void serialize() { require(library_.serialize(document_) >= kDocumentLen, "serialize"); }
+  void copy_and_free() {
+    second_ = library_.copy(document_);
+    require(second_ != nullptr, "copy");
+    free();
+  }
 
-void serialize(const Subject &subject, const std::string &) {
-  if (subject.library->serialize(subject.document) < kDocumentLen) {
-    throw std::runtime_error("a document was not serialized");
+ private:
+  void require(bool passed, const char *what) const {
+    if (!passed) throw std::runtime_error(std::string(library_.name) + " did not " + what);
   }
-}
 
-void copy(const Subject &subject, const std::string &) {
-  void *document = subject.library->copy(subject.document);
-  if (document == nullptr) throw std::runtime_error("a document was not copied");
-  subject.library->free(document);
-}
+  const std::shared_ptr<const Stage> stage_;
+  const JsonLibrary &library_;
+  void *document_;
+  void *second_ = nullptr;
+};
 
-// The agent is the first subject. The target is the fastest of those that set it.
-void measure(Bench &bench, const std::vector<Subject> &subjects, const std::string &text,
-             const char *name, Work work) {
-  std::vector<Contestant> contestants;
-  for (const Subject &subject : subjects) {
-    contestants.push_back({[&subject, &text, work] { work(subject, text); }});
-  }
-  const Rounds rounds = compare(contestants, bench.effort);
-  size_t fastest = 0;
-  for (size_t i = 1; i < subjects.size(); ++i) {
-    if (!subjects[i].library->sets_target) continue;
-    if (fastest == 0 || rounds.seconds(i).median < rounds.seconds(fastest).median) fastest = i;
-  }
-  for (size_t i = 1; i < subjects.size(); ++i) {
-    bench.report.figures.push_back({.group = "JSON, 200 KiB document",
-                                    .name = std::string(name) + " / " + subjects[i].library->name,
-                                    .value = rounds.ratio(0, i),
-                                    .unit = "x",
-                                    .target = i == fastest ? at_most(1.0) : Target{},
-                                    .detail = time_text(rounds.seconds(0).median) + " / " +
-                                              time_text(rounds.seconds(i).median)});
-  }
-}
-
-void measure_heap(Bench &bench, const std::vector<Subject> &subjects, const std::string &text) {
-  std::vector<double> heaps;
-  size_t leanest = 0;
-  for (const Subject &subject : subjects) {
-    heaps.push_back(heap_of(*subject.library, text));
-    const size_t i = heaps.size() - 1;
-    if (subject.library->sets_target && (leanest == 0 || heaps[i] < heaps[leanest])) leanest = i;
-  }
-  for (size_t i = 1; i < subjects.size(); ++i) {
-    const double ratio = heaps[0] / heaps[i];
-    bench.report.figures.push_back(
-        {.group = "JSON, 200 KiB document",
-         .name = std::string("heap / ") + subjects[i].library->name,
-         .value = {ratio, ratio, ratio},
-         .unit = "x",
-         .target = i == leanest ? at_most(0.5) : Target{},
-         .detail = std::to_string(static_cast<size_t>(heaps[0]) >> 10) + " / " +
-                   std::to_string(static_cast<size_t>(heaps[i]) >> 10) + " KiB"});
-  }
+/// The agent against all libraries; the target holds for those that set it.
+Comparison libraries(void (Subject::*run)(), void (Subject::*after)(), double target) {
+  const auto stage = std::make_shared<const Stage>();
+  Comparison comparison;
+  const auto add = [&](const JsonLibrary &library) {
+    const auto subject = std::make_shared<Subject>(stage, library);
+    Contestant contestant = {.name = library.name, .run = [=] { (*subject.*run)(); }};
+    if (after != nullptr) contestant.after = [=] { (*subject.*after)(); };
+    if (library.sets_target) contestant.target = target;
+    comparison.contestants.push_back(contestant);
+  };
+  add(kAgent);
+  for (const JsonLibrary &library : known<JsonLibrary>()) add(library);
+  return comparison;
 }
 
 }  // namespace
 
-void measure_json(Bench &bench) {
-  tee::test::Device device;
-  const Inside inside(device);
-  const std::string text = make_document();
-  std::vector<Subject> subjects = {{&kAgent, nullptr}};
-  for (const JsonLibrary &library : known<JsonLibrary>()) subjects.push_back({&library, nullptr});
-  measure_heap(bench, subjects, text);
-  for (Subject &subject : subjects) {
-    subject.document = subject.library->parse(text);
-    if (subject.document == nullptr) throw std::runtime_error("a document was not parsed");
-  }
-  measure(bench, subjects, text, "parse and free", parse);
-  measure(bench, subjects, text, "serialize", serialize);
-  measure(bench, subjects, text, "copy and free", copy);
-  for (const Subject &subject : subjects) subject.library->free(subject.document);
+void add_json(Suite &suite) {
+  const auto add = [&](const std::string &name, void (Subject::*run)()) {
+    suite.compare("json/" + name, [=] { return libraries(run, nullptr, 1.0); });
+  };
+  suite.compare("json/heap", [] { return libraries(&Subject::parse, &Subject::free, 0.5); },
+                {.gauge = Gauge::kHeap, .rounds = 1, .batches = false});
+  add("parse and free", &Subject::parse_and_free);
+  add("serialize", &Subject::serialize);
+  add("copy and free", &Subject::copy_and_free);
 }
 
 }  // namespace bench

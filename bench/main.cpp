@@ -1,75 +1,90 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// Measures group by group and writes what it found as JSON.
+// Registers the groups of benchmarks and runs them. What comes out is for bench/report.
+#include <openssl/crypto.h>
 #include <tee_test.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdio>
-#include <fstream>
+#include <filesystem>
 
-#include "groups.h"
+#include "suite.h"
 
 namespace {
 
-struct Group {
+const struct {
   const char *name;
-  void (*measure)(bench::Bench &);
+  void (*add)(bench::Suite &);
+} kGroups[] = {
+    {"exchanges", bench::add_exchanges},
+    {"growth", bench::add_growth},
+    {"capacity", bench::add_capacity},
+    {"base64", bench::add_base64},
+    {"json", bench::add_json},
+    {"tokens", bench::add_tokens},
+    {"signatures", bench::add_signatures},
+    {"storage", bench::add_storage},
 };
 
-const Group kGroups[] = {
-    {"exchanges", bench::measure_exchanges},
-    {"growth", bench::measure_growth},
-    {"capacity", bench::measure_capacity},
-    {"base64", bench::measure_base64},
-    {"json", bench::measure_json},
-    {"tokens", bench::measure_tokens},
-    {"signatures", bench::measure_signatures},
-    {"storage", bench::measure_storage},
-};
-
-void measure_all(const std::vector<std::string> &only, bench::Bench &bench) {
-  for (const Group &group : kGroups) {
-    if (!only.empty() && std::ranges::find(only, group.name) == only.end()) continue;
-    std::fprintf(stderr, "measuring: %s\n", group.name);
-    const tee::test::TraceSink log;  // nothing that is measured waits for a terminal
-    group.measure(bench);
+// Standard output stays empty: what there is to see is the table of all figures, at the end.
+struct Progress : benchmark::BenchmarkReporter {
+  bool ReportContext(const Context &) override { return true; }
+  void ReportRuns(const std::vector<Run> &runs) override {
+    std::fprintf(stderr, "measured: %s\n", runs.front().run_name.function_name.c_str());
   }
+};
+
+struct Options {
+  CLI::App app{
+      "Measures the agent against what bounds it. Takes the --benchmark_... options of "
+      "Google Benchmark, too: --benchmark_out=FILE is where the figures go."};
+  bench::Suite suite;
+  std::vector<std::string> only;
+
+  Options() {
+    std::vector<std::string> names;
+    for (const auto &group : kGroups) names.emplace_back(group.name);
+    app.name("otrp-bench");
+    app.add_flag("--quick", suite.quick,
+                 "two rounds of everything: shows that it runs, measures nothing");
+    app.add_option("--only", only, "groups to measure")->check(CLI::IsMember(names));
+    app.add_option("--work", suite.work_directory, "a directory for durable devices; emptied")
+        ->default_val("bench-work");
+  }
+};
+
+void print_help() {
+  std::fputs(Options().app.help().c_str(), stdout);
 }
 
-void write_report(const std::string &path, const std::string &text) {
-  std::ofstream file(path);
-  file << text;
-  file.close();
-  if (!file) throw std::runtime_error("cannot write " + path);
+size_t run(Options &options) {
+  for (const auto &group : kGroups) {
+    const bool chosen =
+        options.only.empty() || std::ranges::find(options.only, group.name) != options.only.end();
+    if (chosen) group.add(options.suite);
+  }
+  benchmark::AddCustomContext("quick", options.suite.quick ? "yes" : "no");
+  benchmark::AddCustomContext("openssl", OpenSSL_version(OPENSSL_VERSION));
+  std::filesystem::remove_all(options.suite.work_directory);
+  tee::test::reuse_generated_keys(4);  // nothing that is timed makes one
+  Progress progress;
+  return benchmark::RunSpecifiedBenchmarks(&progress);
 }
 
 }  // namespace
 
 int main(int argc, char **argv) {
-  CLI::App app{"Measures the agent against what bounds it"};
-  bench::Bench bench;
-  bool quick = false;
-  std::string output = "figures.json";
-  std::vector<std::string> only;
-  std::vector<std::string> names;
-  for (const Group &group : kGroups) names.emplace_back(group.name);
-  app.add_flag("--quick", quick, "two rounds of everything: shows that it runs, measures nothing");
-  app.add_option("--only", only, "groups to measure")->check(CLI::IsMember(names));
-  app.add_option("-o,--output", output, "where the figures go");
-  app.add_option("--work", bench.work_directory, "a directory for durable devices; emptied")
-      ->default_val("bench-work");
+  benchmark::Initialize(&argc, argv, print_help);
+  Options options;
   try {
-    app.parse(argc, argv);
+    options.app.parse(argc, argv);
   } catch (const CLI::ParseError &error) {
-    return app.exit(error) == 0 ? 0 : 2;
+    return options.app.exit(error) == 0 ? 0 : 2;
   }
-  if (quick) bench.effort = bench::kQuick;
   try {
-    measure_all(only, bench);
-    write_report(output, bench.report.json(quick));
+    return run(options) == 0 ? 2 : 0;
   } catch (const std::exception &error) {
     std::fprintf(stderr, "otrp-bench: %s\n", error.what());
     return 1;
   }
-  return 0;
 }

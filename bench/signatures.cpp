@@ -3,14 +3,16 @@
 #include <openssl/core_names.h>
 #include <openssl/evp.h>
 
+#include <memory>
 #include <stdexcept>
 
 #include "crypto/rsa.h"
-#include "groups.h"
 #include "inside.h"
 #include "libraries/libraries.h"
 #include "security/jws.h"
 #include "state/object_store.h"
+#include "suite.h"
+#include "support/scene.h"
 #include "tsm/request.h"
 
 namespace bench {
@@ -19,6 +21,10 @@ namespace {
 constexpr size_t kMessageLen = 1536;
 constexpr char kName[] = "DeleteTARequest";
 constexpr char kStoredKeyId[] = "TSM_INFO_tsm1";
+
+void require(bool passed, const char *what) {
+  if (!passed) throw std::runtime_error(what);
+}
 
 RsaNumbers numbers_of(const tsm::RsaKey &key) {
   const auto number = [&](const char *name) {
@@ -71,12 +77,25 @@ Message make_message(const tsm::RsaKey &key) {
   return message;
 }
 
-void require(bool passed, const char *what) {
-  if (!passed) throw std::runtime_error(what);
-}
+struct Stage {
+  Stage() {
+    const std::string stored = tsm::base64url_encode(tsm_key.encoded());
+    require(
+        save_data_to_persistent_object(stored.data(), static_cast<uint32_t>(stored.size()),
+                                       kStoredKeyId, sizeof kStoredKeyId - 1, true) == TEE_SUCCESS,
+        "a key was not stored");
+  }
+
+  Inside inside;
+  const tsm::RsaKey &tsm_key = otrp_test::key_named("tsm");
+  const RsaNumbers numbers = numbers_of(tsm_key);
+  const Message message = make_message(tsm_key);
+  const key_object key = make_key(numbers);
+};
 
 // As the pipeline does it, the key's record included.
-void verify_with_stored_key(const Message &message) {
+void verify_with_stored_key(const Stage &stage) {
+  const Message &message = stage.message;
   request_context context = {bytes_of(message.text), static_cast<uint32_t>(message.text.size()),
                              kName, nullptr, 0};
   const TEE_Result result = verify_decode_by_name(&context);
@@ -85,7 +104,8 @@ void verify_with_stored_key(const Message &message) {
           "the agent did not verify a message");
 }
 
-void verify_with_key(const Message &message, TEE_ObjectHandle key) {
+void verify(const Stage &stage) {
+  const Message &message = stage.message;
   const jsmn_string text = {message.text.data(), static_cast<uint32_t>(message.text.size())};
   const token_object_ptr root(jsmn_init_object(&text));
   const token_object_ptr envelope(jsmn_object_get_object(root.get(), kName));
@@ -93,70 +113,73 @@ void verify_with_key(const Message &message, TEE_ObjectHandle key) {
   const slice_ptr protect(jsmn_object_get_string(envelope.get(), "protect"));
   const slice_ptr signature(jsmn_object_get_string(envelope.get(), "signature"));
   secret_bytes decoded;
-  require(verify_signature(key, payload.get(), protect.get(), signature.get(), &decoded) &&
-              decoded.len == message.payload.size(),
-          "the agent did not verify a message");
+  require(
+      verify_signature(stage.key.get(), payload.get(), protect.get(), signature.get(), &decoded) &&
+          decoded.len == message.payload.size(),
+      "the agent did not verify a message");
 }
 
-void sign(const Message &message, TEE_ObjectHandle key) {
-  const json_text text(construct_json_signature("DeleteTAResponse", message.payload.c_str(),
-                                                JWS_HEADER_RS256, nullptr, key));
+void sign(const Stage &stage) {
+  const json_text text(construct_json_signature("DeleteTAResponse", stage.message.payload.c_str(),
+                                                JWS_HEADER_RS256, nullptr, stage.key.get()));
   require(text != nullptr, "the agent did not sign a message");
 }
 
-void add_figure(Bench &bench, const JoseLibrary &library, const char *name, const Contestant &ours,
-                const Contestant &theirs) {
-  const Rounds rounds = compare({ours, theirs}, bench.effort);
-  bench.report.figures.push_back({.group = "signatures, 1.5 KiB",
-                                  .name = std::string(name) + " / " + library.name,
-                                  .value = rounds.ratio(0, 1),
-                                  .unit = "x",
-                                  .target = at_most(library.target),
-                                  .detail = time_text(rounds.seconds(0).median) + " / " +
-                                            time_text(rounds.seconds(1).median)});
-}
+/// A library with its form of the key.
+class Rival {
+ public:
+  Rival(std::shared_ptr<const Stage> stage, const JoseLibrary &library)
+      : stage_(std::move(stage)), library_(library), key_(library.make_key(stage_->numbers)) {
+    require(key_ != nullptr, "a library refused a key");
+    stored_ = library.store_public_key(key_);
+  }
+  ~Rival() { library_.free_key(key_); }
+  Rival(const Rival &) = delete;
+  Rival &operator=(const Rival &) = delete;
 
-void measure(Bench &bench, const JoseLibrary &library, const Message &message,
-             const RsaNumbers &numbers, TEE_ObjectHandle key) {
-  void *jwk = library.make_key(numbers);
-  require(jwk != nullptr, "a library refused a key");
-  const std::string stored = library.store_public_key(jwk);
-  const auto verify = [&](void *with) {
-    require(library.verify(message.compact, with) == message.payload.size(),
+  void verify_with_stored_key() const {
+    void *loaded = library_.load_key(stored_);
+    verify_with(loaded);
+    library_.free_key(loaded);
+  }
+  void verify() const { verify_with(key_); }
+  void sign() const {
+    require(!library_.sign(stage_->message.payload, key_).empty(),
+            "a library did not sign a message");
+  }
+
+ private:
+  void verify_with(void *key) const {
+    require(library_.verify(stage_->message.compact, key) == stage_->message.payload.size(),
             "a library did not verify a message");
-  };
-  add_figure(bench, library, "verify, stored key", {[&] { verify_with_stored_key(message); }},
-             {[&] {
-               void *loaded = library.load_key(stored);
-               verify(loaded);
-               library.free_key(loaded);
-             }});
-  add_figure(bench, library, "verify, key at hand", {[&] { verify_with_key(message, key); }},
-             {[&] { verify(jwk); }});
-  add_figure(bench, library, "sign", {[&] { sign(message, key); }}, {[&] {
-               require(!library.sign(message.payload, jwk).empty(),
-                       "a library did not sign a message");
-             }});
-  library.free_key(jwk);
+  }
+
+  const std::shared_ptr<const Stage> stage_;
+  const JoseLibrary &library_;
+  void *key_;
+  std::string stored_;
+};
+
+void add(Suite &suite, const std::string &name, void (*ours)(const Stage &),
+         void (Rival::*theirs)() const) {
+  suite.compare("signatures/" + name, [=] {
+    const auto stage = std::make_shared<const Stage>();
+    Comparison comparison = {{{"agent", [=] { ours(*stage); }}}};
+    for (const JoseLibrary &library : known<JoseLibrary>()) {
+      const auto rival = std::make_shared<Rival>(stage, library);
+      comparison.contestants.push_back(
+          {.name = library.name, .run = [=] { (*rival.*theirs)(); }, .target = library.target});
+    }
+    return comparison;
+  });
 }
 
 }  // namespace
 
-void measure_signatures(Bench &bench) {
-  tee::test::Device device;
-  const Inside inside(device);
-  const tsm::RsaKey tsm_key = tsm::RsaKey::generate();
-  const RsaNumbers numbers = numbers_of(tsm_key);
-  const Message message = make_message(tsm_key);
-  const std::string stored = tsm::base64url_encode(tsm_key.encoded());
-  require(
-      save_data_to_persistent_object(stored.data(), static_cast<uint32_t>(stored.size()),
-                                     kStoredKeyId, sizeof kStoredKeyId - 1, true) == TEE_SUCCESS,
-      "a key was not stored");
-  const key_object key = make_key(numbers);
-  for (const JoseLibrary &library : known<JoseLibrary>()) {
-    measure(bench, library, message, numbers, key.get());
-  }
+void add_signatures(Suite &suite) {
+  add(suite, "verify, stored key", verify_with_stored_key, &Rival::verify_with_stored_key);
+  add(suite, "verify, key at hand", verify, &Rival::verify);
+  add(suite, "sign", sign, &Rival::sign);
 }
 
 }  // namespace bench

@@ -7,7 +7,6 @@
 #include <stdexcept>
 
 #include "device.h"
-#include "groups.h"
 #include "inside.h"
 #include "state/object_store.h"
 
@@ -62,68 +61,57 @@ std::string next_record(size_t len) {
   return record + std::string(len - record.size(), ' ');
 }
 
-void measure_saves(Bench &bench, size_t len) {
-  BareDatabase bare(bench.work_directory + "/bare" + std::to_string(len));
-  tee::test::Device device(bench.work_directory + "/state" + std::to_string(len));
-  const Inside inside(device);
-  const Contestant save = {[&] {
+Comparison saves(const std::string &directory, size_t len) {
+  const auto inside = std::make_shared<Inside>(directory + "/device");
+  const auto bare = std::make_shared<BareDatabase>(directory);
+  const auto save = [inside, len] {
     const std::string record = next_record(len);
     const TEE_Result result = save_data_to_persistent_object(
         record.data(), static_cast<uint32_t>(record.size()), kRecordId, kIdLen, true);
     if (result != TEE_SUCCESS) throw std::runtime_error("a record was not saved");
-  }};
-  const Contestant transaction = {[&] { bare.save(next_record(len)); }};
-  const Rounds rounds = compare({save, transaction}, bench.effort, Clock::kWall);
-  bench.report.figures.push_back(
-      {.group = "durable storage",
-       .name = "record save / transaction, " + std::to_string(len) + " bytes",
-       .value = rounds.ratio(0, 1),
-       .unit = "x",
-       .target = at_most(kSaveTarget),
-       .detail =
-           time_text(rounds.seconds(0).median) + " / " + time_text(rounds.seconds(1).median)});
+  };
+  const auto transaction = [bare, len] { bare->save(next_record(len)); };
+  return {{{"record", save}, {.name = "transaction", .run = transaction, .target = kSaveTarget}}};
 }
 
-void measure_durable_exchange(Bench &bench, Scene &scene, BareDatabase &bare,
-                              const MessageCase &message) {
-  Exchange exchange(scene, message);
-  exchange.before();
-  const uint64_t before = scene.device.host().durable_writes();
-  exchange.run();
-  const uint64_t commits = scene.device.host().durable_writes() - before;
-  exchange.after();
-  const Contestant bare_commits = {[&] {
-    for (uint64_t i = 0; i < commits; ++i) bare.save(next_record(300));
-  }};
-  std::vector<Contestant> contestants = {exchange.contestant()};
-  if (commits != 0) contestants.push_back(bare_commits);
-  const Rounds rounds = compare(contestants, bench.effort, Clock::kWall);
-  const Spread seconds = rounds.seconds(0);
-  bench.report.figures.push_back({.group = "durable storage",
-                                  .name = message.name + ", exchanges",
-                                  .value = {1 / seconds.median, 1 / seconds.high, 1 / seconds.low},
-                                  .unit = "a second",
-                                  .detail = std::to_string(commits) + " commits"});
-  if (commits == 0) return;
-  bench.report.figures.push_back(
-      {.group = "durable storage",
-       .name = message.name + ", exchange / its bare commits",
-       .value = rounds.ratio(0, 1),
-       .unit = "x",
-       .detail = time_text(seconds.median) + " / " + time_text(rounds.seconds(1).median)});
+Comparison exchange_and_commits(const std::string &directory, const MessageCase &message) {
+  const auto scene = std::make_shared<Scene>("tsm1", directory + "/device");
+  make_first_sd(*scene);
+  const auto exchange = std::make_shared<Exchange>(scene, message);
+  exchange->before();
+  const uint64_t before = scene->device.host().durable_writes();
+  exchange->run();
+  const uint64_t commits = scene->device.host().durable_writes() - before;
+  exchange->after();
+
+  Comparison comparison = {{contestant("exchange", exchange)},
+                           {{"commits", static_cast<double>(commits)}}};
+  if (commits == 0) return comparison;
+  const auto bare = std::make_shared<BareDatabase>(directory);
+  comparison.contestants.push_back({"its bare commits", [bare, commits] {
+                                      for (uint64_t i = 0; i < commits; ++i) {
+                                        bare->save(next_record(300));
+                                      }
+                                    }});
+  return comparison;
 }
 
 }  // namespace
 
-void measure_storage(Bench &bench) {
-  std::filesystem::remove_all(bench.work_directory);
-  for (const size_t len : {300, 4096}) measure_saves(bench, len);
-
-  Scene scene("tsm1", bench.work_directory + "/device");
-  make_first_sd(scene);
-  BareDatabase bare(bench.work_directory + "/bare");
+void add_storage(Suite &suite) {
+  for (const size_t len : {300, 4096}) {
+    const std::string name = "save, " + std::to_string(len) + " bytes";
+    suite.compare(
+        "storage/" + name,
+        [=, directory = suite.work_directory + '/' + name] { return saves(directory, len); },
+        {.gauge = Gauge::kWall});
+  }
   for (const MessageCase &message : message_cases()) {
-    measure_durable_exchange(bench, scene, bare, message);
+    suite.compare("storage/" + message.name,
+                  [=, directory = suite.work_directory + '/' + message.name] {
+                    return exchange_and_commits(directory, message);
+                  },
+                  {.gauge = Gauge::kWall, .rounds = 41, .batches = false});
   }
 }
 

@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // The token reader against its tokenizer alone, in one pass over an array that is large enough.
-#include <vector>
+#include <memory>
 
 #include "device.h"
-#include "groups.h"
 #include "inside.h"
 #include "state/token_reader.h"
 
@@ -11,44 +10,45 @@
 #include <jsmn.h>
 
 namespace bench {
+namespace {
 
-static void measure(Bench &bench, const std::string &request, const std::string &name,
-                    const std::string &what) {
-  tee::test::Device device;
-  const Inside inside(device);
-  std::vector<jsmntok_t> tokens(64);
-  const Contestant plain = {[&] {
-    jsmn_parser parser;
-    jsmn_init(&parser);
-    keep(jsmn_parse(&parser, request.data(), request.size(), tokens.data(),
-                    static_cast<unsigned>(tokens.size())));
-  }};
-  const Contestant reader = {[&] {
-    const jsmn_string text = {request.data(), static_cast<uint32_t>(request.size())};
+struct Request {
+  explicit Request(const MessageCase &message)
+      : text(filled_device(1)->request(message.id, message.options)) {}
+
+  const std::string text;
+  Inside inside;
+  std::vector<jsmntok_t> tokens = std::vector<jsmntok_t>(64);
+};
+
+Comparison readers(const MessageCase &message) {
+  const auto request = std::make_shared<Request>(message);
+  const auto pick = [request, name = message.name + "Request"] {
+    const jsmn_string text = {request->text.data(), static_cast<uint32_t>(request->text.size())};
     const token_object_ptr root(jsmn_init_object(&text));
     const token_object_ptr envelope(jsmn_object_get_object(root.get(), name.c_str()));
     for (const char *member : {"payload", "protect", "signature", "tsmid"}) {
       const slice_ptr slice(jsmn_object_get_string(envelope.get(), member));
-      keep(slice);
+      benchmark::DoNotOptimize(slice.get());
     }
-  }};
-  const Rounds rounds = compare({reader, plain}, bench.effort);
-  bench.report.figures.push_back({.group = "token reader / jsmn",
-                                  .name = "an envelope's members, " + what,
-                                  .value = rounds.ratio(0, 1),
-                                  .unit = "x",
-                                  .detail = time_text(rounds.seconds(0).median) + " / " +
-                                            time_text(rounds.seconds(1).median)});
+  };
+  const auto tokenize = [request] {
+    jsmn_parser parser;
+    jsmn_init(&parser);
+    benchmark::DoNotOptimize(jsmn_parse(&parser, request->text.data(), request->text.size(),
+                                        request->tokens.data(),
+                                        static_cast<unsigned>(request->tokens.size())));
+  };
+  return {{{"reader", pick}, {"jsmn", tokenize}}};
 }
 
-void measure_tokens(Bench &bench) {
-  FilledDevice device(1);
-  const MessageCase deletion = message_case(MessageId::kDeleteTa);
-  const MessageCase installation = message_case(MessageId::kInstallTa, 1 << 20);
-  Scene &scene = device.scene();
-  measure(bench, scene.request(deletion.id, deletion.options), "DeleteTARequest", "DeleteTA");
-  measure(bench, scene.request(installation.id, installation.options), "InstallTARequest",
-          "InstallTA, 1 MiB");
+}  // namespace
+
+void add_tokens(Suite &suite) {
+  suite.compare("tokens/an envelope's members, DeleteTA",
+                [] { return readers(message_case(MessageId::kDeleteTa)); });
+  suite.compare("tokens/an envelope's members, InstallTA, 1 MiB",
+                [] { return readers(message_case(MessageId::kInstallTa, 1 << 20)); });
 }
 
 }  // namespace bench

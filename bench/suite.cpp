@@ -1,0 +1,104 @@
+// SPDX-License-Identifier: BSD-2-Clause
+#include "suite.h"
+
+#include <malloc.h>
+#include <tee_test.h>
+#include <time.h>
+
+#include <algorithm>
+#include <cstdlib>
+
+namespace bench {
+namespace {
+
+constexpr double kShortestRound = 500e-6;
+constexpr size_t kLargeBlock = 1 << 20;
+
+double read(Gauge gauge) {
+  if (gauge == Gauge::kHeap) {
+    const struct mallinfo2 info = ::mallinfo2();
+    return static_cast<double>(info.uordblks + info.hblkhd);
+  }
+  timespec time{};
+  ::clock_gettime(gauge == Gauge::kWall ? CLOCK_MONOTONIC : CLOCK_PROCESS_CPUTIME_ID, &time);
+  return static_cast<double>(time.tv_sec) + 1e-9 * static_cast<double>(time.tv_nsec);
+}
+
+// The C library puts its free blocks in order when it is next asked for a large one. Whoever asked
+// would be measured with what others have left behind.
+void tidy_heap() {
+  void *block = std::malloc(kLargeBlock);
+  benchmark::DoNotOptimize(block);
+  std::free(block);
+}
+
+double measure(const Contestant &contestant, benchmark::IterationCount num_runs, Gauge gauge) {
+  if (contestant.before) contestant.before();
+  tidy_heap();
+  const double begin = read(gauge);
+  for (benchmark::IterationCount i = 0; i < num_runs; ++i) contestant.run();
+  const double end = read(gauge);
+  if (contestant.after) contestant.after();
+  return (end - begin) / static_cast<double>(num_runs);
+}
+
+void run_round(benchmark::State &state, const Comparison &comparison, size_t round, Gauge gauge) {
+  const std::vector<Contestant> &contestants = comparison.contestants;
+  const benchmark::IterationCount num_runs = state.max_iterations;
+  std::vector<double> amounts(contestants.size());
+  while (state.KeepRunningBatch(num_runs)) {
+    // Each comes first as often as the others: what one leaves in the caches meets all of them.
+    for (size_t turn = 0; turn < contestants.size(); ++turn) {
+      const size_t i = (turn + round) % contestants.size();
+      amounts[i] = measure(contestants[i], num_runs, gauge);
+      state.SetIterationTime(amounts[i] * static_cast<double>(num_runs));
+    }
+  }
+  state.counters = comparison.counters;
+  state.counters[contestants[0].name] = amounts[0];
+  for (size_t i = 1; i < contestants.size(); ++i) {
+    const std::string &name = contestants[i].name;
+    state.counters[name] = amounts[i];
+    state.counters[contestants[0].name + " / " + name] = amounts[0] / amounts[i];
+    if (contestants[i].target != 0) state.counters[name + " target"] = contestants[i].target;
+  }
+}
+
+template <size_t kPercent>
+double quantile(const std::vector<double> &values) {
+  std::vector<double> sorted = values;
+  std::ranges::sort(sorted);
+  return sorted[(sorted.size() - 1) * kPercent / 100];
+}
+
+}  // namespace
+
+Suite::Present &Suite::present(const std::string &name, const std::function<Comparison()> &make) {
+  if (!present_ || present_->name != name) {
+    present_.reset();
+    present_.emplace(Present{name, make()});
+  }
+  return *present_;
+}
+
+void Suite::compare(const std::string &name, const std::function<Comparison()> &make,
+                    const Plan &plan) {
+  benchmark::internal::Benchmark *benchmark =
+      benchmark::RegisterBenchmark(name.c_str(), [=, this](benchmark::State &state) {
+        const tee::test::TraceSink log;  // nothing that is measured waits for a terminal
+        Present &now = present(name, make);
+        run_round(state, now.comparison, now.num_rounds++, plan.gauge);
+      });
+  benchmark->UseManualTime()
+      ->Repetitions(quick ? std::min(plan.rounds, 2) : plan.rounds)
+      ->ReportAggregatesOnly()
+      ->ComputeStatistics("low", quantile<25>)
+      ->ComputeStatistics("high", quantile<75>);
+  if (plan.batches && !quick) {
+    benchmark->MinTime(kShortestRound);
+  } else {
+    benchmark->Iterations(1);
+  }
+}
+
+}  // namespace bench
