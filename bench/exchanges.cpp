@@ -12,20 +12,18 @@ constexpr double kTargetWithoutImage = 1.10;
 constexpr double kTargetWithImage = 1.15;
 constexpr double kTargetWithLargeImage = 1.5;
 
-Comparison exchange_and_floors(const MessageCase &message, double target) {
+Comparison exchange_and_floor(const MessageCase &message, double target) {
   const auto exchange = std::make_shared<Exchange>(filled_device(kNumSds), message);
   const size_t dsi_len = exchange->scene().dsi_text.size();
   exchange->before();
   exchange->run();
   exchange->after();
-  const auto floor = [&](Keys keys) {
-    return [works = work_of(message, exchange->request(), exchange->response(), dsi_len, keys)] {
-      for (const auto &work : works) work();
-    };
+  const auto work = [&](Depth depth) {
+    return work_of(message, exchange->request(), exchange->response(), dsi_len, depth);
   };
   return {{contestant("exchange", exchange),
-           {.name = "floor", .run = floor(Keys::kAtHand), .target = target},
-           {.name = "floor with new keys", .run = floor(Keys::kNew)}}};
+           {.name = "floor", .run = work(Depth::kCryptography), .target = target},
+           {.name = kBound, .run = work(Depth::kWithRules)}}};
 }
 
 bool has_image(const MessageCase &message) {
@@ -33,7 +31,7 @@ bool has_image(const MessageCase &message) {
 }
 
 void add(Suite &suite, const std::string &name, const MessageCase &message, double target) {
-  suite.compare("exchanges/" + name, [=] { return exchange_and_floors(message, target); },
+  suite.compare("exchanges/" + name, [=] { return exchange_and_floor(message, target); },
                 {.batches = false});
 }
 

@@ -12,11 +12,13 @@
 #include "inside.h"
 #include "tsm/json.h"
 
+#define JSMN_STATIC
+#include <jsmn.h>
+
 namespace bench {
 namespace {
 
 using Json = tsm::Json;
-using Work = std::function<void()>;
 
 constexpr size_t kScratchLen = 8 << 20;
 constexpr size_t kCekLen = 32;
@@ -26,6 +28,8 @@ constexpr size_t kAesBlockLen = 16;
 constexpr size_t kAlLen = 8;
 constexpr size_t kEncodedKeyLen = 4 + 256 + 4 + 3;
 constexpr size_t kChainBlockLen = 12;
+constexpr size_t kProtectLen = 20;  // of the RS256 header in base64url
+constexpr unsigned kNumTokens = 1 << 12;
 
 void require(int result) {
   if (result <= 0) throw std::runtime_error("OpenSSL failed");
@@ -97,6 +101,36 @@ Work aes(size_t len, bool encrypt) {
   };
 }
 
+// As TEE_CipherUpdate gets it.
+Work decrypt_blocks(size_t len) {
+  const std::shared_ptr<EVP_CIPHER> cipher(EVP_CIPHER_fetch(nullptr, "AES-128-CBC", nullptr),
+                                           EVP_CIPHER_free);
+  const std::shared_ptr<EVP_CIPHER_CTX> context(EVP_CIPHER_CTX_new(), EVP_CIPHER_CTX_free);
+  require(EVP_CipherInit_ex2(context.get(), cipher.get(), scratch().in.data(), scratch().in.data(),
+                             0, nullptr));
+  require(EVP_CIPHER_CTX_set_padding(context.get(), 0));
+  return [=] {
+    for (size_t at = 0; at + kAesBlockLen <= len; at += kAesBlockLen) {
+      require(EVP_Cipher(context.get(), scratch().out.data() + at, scratch().in.data() + at,
+                         kAesBlockLen));
+    }
+  };
+}
+
+Work tokenize(std::string text) {
+  return [text = std::move(text), tokens = std::vector<jsmntok_t>(kNumTokens)]() mutable {
+    jsmn_parser parser;
+    jsmn_init(&parser);
+    require(jsmn_parse(&parser, text.data(), text.size(), tokens.data(), kNumTokens));
+  };
+}
+
+Work in_order(std::vector<Work> works) {
+  return [works = std::move(works)] {
+    for (const Work &work : works) work();
+  };
+}
+
 // ---- RSA
 
 enum class Form { kPublic, kExponentsAlone, kWithPrimes };
@@ -152,20 +186,20 @@ class KeyNumbers {
 
 using KeyContext = std::shared_ptr<EVP_PKEY_CTX>;
 
-/// An operation that starts with a context, of a key that is at hand or new each time.
 Work rsa(Form form, Keys keys, int (*start)(EVP_PKEY_CTX *), bool signs,
          std::function<void(EVP_PKEY_CTX *)> run) {
   const auto numbers = std::make_shared<KeyNumbers>(form);
-  const auto make_context = [=] {
-    const auto key = numbers->make_key();
+  const auto make_context = [=](const std::shared_ptr<EVP_PKEY> &key) {
     KeyContext context(EVP_PKEY_CTX_new(key.get(), nullptr), EVP_PKEY_CTX_free);
     require(start(context.get()));
     require(EVP_PKEY_CTX_set_rsa_padding(context.get(), RSA_PKCS1_PADDING));
     if (signs) require(EVP_PKEY_CTX_set_signature_md(context.get(), EVP_sha256()));
     return context;
   };
-  if (keys == Keys::kNew) return [=] { run(make_context().get()); };
-  return [context = make_context(), run] { run(context.get()); };
+  if (keys == Keys::kNew) return [=] { run(make_context(numbers->make_key()).get()); };
+  const auto key = numbers->make_key();
+  if (keys == Keys::kAtHand) return [=] { run(make_context(key).get()); };
+  return [context = make_context(key), run] { run(context.get()); };
 }
 
 Work rsa_encrypt(Keys keys) {
@@ -211,10 +245,15 @@ size_t bytes_in(size_t text_len) {
 }
 
 struct Floor {
-  Keys keys;
+  explicit Floor(Depth to)
+      : depth(to), keys(to == Depth::kCryptography ? Keys::kPrepared : Keys::kNew) {}
+
+  const Depth depth;
+  const Keys keys;
   std::vector<Work> works = {};
 
   void add(Work work) { works.push_back(std::move(work)); }
+  void add_reading(const std::string &text);
   void add_envelope_check(const Json &envelope);
   void add_key_chain(const Json &chain);
   void add_opening(const Json &jwe);
@@ -223,11 +262,12 @@ struct Floor {
   void add_signing(const Json &envelope, Form form);
 };
 
+void Floor::add_reading(const std::string &text) {
+  if (depth == Depth::kWithRules) add(tokenize(text));
+}
+
 void Floor::add_envelope_check(const Json &envelope) {
-  add(decode(len_of(envelope, "payload")));
-  add(decode(len_of(envelope, "signature")));
-  add(digest(len_of(envelope, "protect") + 1 + len_of(envelope, "payload")));
-  add(rsa_verify(keys));
+  add(verification_of(len_of(envelope, "payload"), keys));
 }
 
 void Floor::add_key_chain(const Json &chain) {
@@ -254,7 +294,7 @@ void Floor::add_image(const Json &encrypted_ta, const char *image_name) {
   const size_t len = bytes_in(len_of(encrypted_ta, image_name));
   for (const char *name : {"key", "iv", image_name}) add(decode(len_of(encrypted_ta, name)));
   add(rsa_decrypt(Form::kWithPrimes, keys));
-  add(aes(len, false));
+  add(depth == Depth::kWithRules ? decrypt_blocks(len) : aes(len, false));
   add(digest(len));
 }
 
@@ -277,24 +317,39 @@ void Floor::add_signing(const Json &envelope, Form form) {
   add(rsa_sign(form, keys));
 }
 
+std::string payload_text(const Json &envelope) {
+  return tsm::base64url_decode(envelope.at("payload").get<std::string>()).value();
+}
+
 Json payload_of(const Json &envelope) {
-  const auto text = tsm::base64url_decode(envelope.at("payload").get<std::string>());
-  return tsm::parse_json(text.value()).value();
+  return tsm::parse_json(payload_text(envelope)).value();
 }
 
 }  // namespace
 
-std::vector<Work> work_of(const MessageCase &message, const std::string &request,
-                          const std::string &response, size_t dsi_len, Keys keys) {
-  Floor floor = {keys};
+Work verification_of(size_t payload_len, Keys keys) {
+  return in_order({decode(payload_len), decode(kRsaLen * 4 / 3),
+                   digest(kProtectLen + 1 + payload_len), rsa_verify(keys)});
+}
+
+Work signing_of(size_t payload_len, Keys keys) {
+  return in_order({encode(bytes_in(payload_len)), encode(kRsaLen),
+                   digest(kProtectLen + 1 + payload_len), rsa_sign(Form::kExponentsAlone, keys)});
+}
+
+Work work_of(const MessageCase &message, const std::string &request, const std::string &response,
+             size_t dsi_len, Depth depth) {
+  Floor floor(depth);
   const Json answer = tsm::parse_json(response).value().front();
+  floor.add_reading(request);
   if (message.id == MessageId::kGetTaInfo) {
     floor.add_signing(answer, Form::kWithPrimes);
-    return floor.works;
+    return in_order(floor.works);
   }
 
   const Json envelope = tsm::parse_json(request).value().front();
   floor.add_envelope_check(envelope);
+  floor.add_reading(payload_text(envelope));
   const Json tbs = payload_of(envelope).front();
   if (tbs.contains("tsm_key_chain")) floor.add_key_chain(tbs.at("tsm_key_chain"));
   if (tbs.contains("dsihash")) {
@@ -305,7 +360,7 @@ std::vector<Work> work_of(const MessageCase &message, const std::string &request
   if (tbs.contains("encrypted_ta")) {
     floor.add(decode(len_of(envelope, "signature2")));
     floor.add(digest(2 * kCekLen));
-    floor.add(rsa_verify(keys));
+    floor.add(rsa_verify(floor.keys));
     const std::string image_name(tsm::image_member(message.id));
     floor.add_image(tbs.at("encrypted_ta"), image_name.c_str());
   }
@@ -313,7 +368,7 @@ std::vector<Work> work_of(const MessageCase &message, const std::string &request
   const Json members = payload.size() == 1 ? payload.front() : payload;
   floor.add_sealing(members.contains("edsi") ? members.at("edsi") : members.at("content"));
   floor.add_signing(answer, Form::kExponentsAlone);
-  return floor.works;
+  return in_order(floor.works);
 }
 
 }  // namespace bench

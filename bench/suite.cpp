@@ -42,6 +42,14 @@ double measure(const Contestant &contestant, benchmark::IterationCount num_runs,
   return (end - begin) / static_cast<double>(num_runs);
 }
 
+// The time of the contestant kBound, where there is one.
+std::optional<double> bound_of(const std::vector<Contestant> &contestants,
+                               const std::vector<double> &amounts) {
+  const auto bound = std::ranges::find(contestants, kBound, &Contestant::name);
+  if (bound == contestants.end()) return {};
+  return amounts[static_cast<size_t>(bound - contestants.begin())];
+}
+
 void run_round(benchmark::State &state, const Comparison &comparison, size_t round, Gauge gauge) {
   const std::vector<Contestant> &contestants = comparison.contestants;
   const benchmark::IterationCount num_runs = state.max_iterations;
@@ -56,11 +64,14 @@ void run_round(benchmark::State &state, const Comparison &comparison, size_t rou
   }
   state.counters = comparison.counters;
   state.counters[contestants[0].name] = amounts[0];
+  const std::optional<double> bound = bound_of(contestants, amounts);
   for (size_t i = 1; i < contestants.size(); ++i) {
     const std::string &name = contestants[i].name;
     state.counters[name] = amounts[i];
     state.counters[contestants[0].name + " / " + name] = amounts[0] / amounts[i];
-    if (contestants[i].target != 0) state.counters[name + " target"] = contestants[i].target;
+    if (contestants[i].target == 0) continue;
+    state.counters[name + " target"] = contestants[i].target;
+    if (bound) state.counters[name + " bound"] = *bound / amounts[i];
   }
 }
 

@@ -8,6 +8,7 @@
 ///     NAME           seconds, or bytes, that one run of NAME takes
 ///     FIRST / NAME   what the first contestant takes as a part of that
 ///     NAME target    what this ratio is held to
+///     NAME bound     what it would be if nothing were left but the contestant kBound
 #ifndef BENCH_SUITE_H
 #define BENCH_SUITE_H
 
@@ -28,6 +29,9 @@ struct Contestant {
   std::function<void()> after = {};
   double target = 0;  // the first contestant takes at most so many times as much; 0: no target
 };
+
+/// Name of the contestant that has to do what the first one cannot avoid, and nothing else.
+inline constexpr char kBound[] = "bound";
 
 struct Comparison {
   std::vector<Contestant> contestants;
