@@ -22,8 +22,7 @@ extern "C" {
 /// TEEC_SUCCESS or one of the codes below, or a trusted application's own.
 typedef uint32_t TEEC_Result;
 
-/// Result codes (section 4.4.2). TEEC_ERROR_CORRUPT_OBJECT, of a damaged database, is the Internal
-/// Core API's.
+/// Result codes. TEEC_ERROR_CORRUPT_OBJECT, of a damaged database, is the Internal Core API's.
 /// @{
 #define TEEC_SUCCESS 0x00000000u
 #define TEEC_ERROR_CORRUPT_OBJECT 0xF0100001u
@@ -45,17 +44,15 @@ typedef uint32_t TEEC_Result;
 #define TEEC_ERROR_SECURITY 0xFFFF000Fu
 #define TEEC_ERROR_SHORT_BUFFER 0xFFFF0010u
 #define TEEC_ERROR_TARGET_DEAD 0xFFFF3024u
-
 /// @}
 
-/// Where a result arose (section 4.4.3): in this library, on the way, in the TEE, or in the trusted
-/// application, whose code it then is.
+/// Where a result arose: in this library, on the way, in the TEE, or in the trusted application,
+/// whose code it then is.
 /// @{
 #define TEEC_ORIGIN_API 1u
 #define TEEC_ORIGIN_COMMS 2u
 #define TEEC_ORIGIN_TEE 3u
 #define TEEC_ORIGIN_TRUSTED_APP 4u
-
 /// @}
 
 /// The client does not say who it is: the only login that is offered.
@@ -65,11 +62,10 @@ typedef uint32_t TEEC_Result;
 /// @{
 #define TEEC_MEM_INPUT 0x00000001u
 #define TEEC_MEM_OUTPUT 0x00000002u
-
 /// @}
 
-/// Types of a parameter (section 4.4.4), for TEEC_PARAM_TYPES(): which member of TEEC_Parameter
-/// counts, and its direction, seen from the trusted application.
+/// Types of a parameter, for TEEC_PARAM_TYPES(): which member of TEEC_Parameter counts, and its
+/// direction, seen from the trusted application.
 /// @{
 #define TEEC_NONE 0x00000000u
 #define TEEC_VALUE_INPUT 0x00000001u
@@ -82,7 +78,6 @@ typedef uint32_t TEEC_Result;
 #define TEEC_MEMREF_PARTIAL_INPUT 0x0000000Du
 #define TEEC_MEMREF_PARTIAL_OUTPUT 0x0000000Eu
 #define TEEC_MEMREF_PARTIAL_INOUT 0x0000000Fu
-
 /// @}
 
 /// `paramTypes` of an operation: the types of its four parameters.

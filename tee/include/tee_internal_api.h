@@ -148,14 +148,12 @@ typedef struct {
 #define TEE_PARAM_TYPE_MEMREF_INPUT 5u
 #define TEE_PARAM_TYPE_MEMREF_OUTPUT 6u
 #define TEE_PARAM_TYPE_MEMREF_INOUT 7u
-
 /// @}
 
 /// The types of four parameters as one number, and the type of parameter `i` in it.
 /// @{
 #define TEE_PARAM_TYPES(t0, t1, t2, t3) ((t0) | ((t1) << 4) | ((t2) << 8) | ((t3) << 12))
 #define TEE_PARAM_TYPE_GET(t, i) (((t) >> ((i)*4)) & 0xFu)
-
 /// @}
 
 /// Waits for as long as it takes; other times are taken like it.
@@ -168,21 +166,18 @@ typedef struct {
 #define TEE_ORIGIN_COMMS 2u
 #define TEE_ORIGIN_TEE 3u
 #define TEE_ORIGIN_TRUSTED_APP 4u
-
 /// @}
 
 /// Kinds of clients: the normal world, and another trusted application.
 /// @{
 #define TEE_LOGIN_PUBLIC 0x00000000u
 #define TEE_LOGIN_TRUSTED_APP 0xF0000000u
-
 /// @}
 
 /// Properties of the client that has called, and of this trusted application.
 /// @{
 #define TEE_PROPSET_CURRENT_CLIENT ((TEE_PropSetHandle)0xFFFFFFFE)
 #define TEE_PROPSET_CURRENT_TA ((TEE_PropSetHandle)0xFFFFFFFF)
-
 /// @}
 
 /// Says who has called: `name` is "gpd.client.identity", of TEE_PROPSET_CURRENT_CLIENT. Anything
@@ -239,7 +234,6 @@ void TEE_Free(void *buffer);
 #define TEE_DATA_FLAG_SHARE_READ 0x00000010u
 #define TEE_DATA_FLAG_SHARE_WRITE 0x00000020u
 #define TEE_DATA_FLAG_OVERWRITE 0x00000400u
-
 /// @}
 
 /// Flags in `handleFlags` of TEE_ObjectInfo.
@@ -248,7 +242,6 @@ void TEE_Free(void *buffer);
 #define TEE_HANDLE_FLAG_INITIALIZED 0x00020000u
 #define TEE_HANDLE_FLAG_KEY_SET 0x00040000u
 #define TEE_HANDLE_FLAG_EXPECT_TWO_KEYS 0x00080000u
-
 /// @}
 
 /// Bytes of the longest object ID.
@@ -262,7 +255,6 @@ void TEE_Free(void *buffer);
 #define TEE_TYPE_RSA_PUBLIC_KEY 0xA0000030u
 #define TEE_TYPE_RSA_KEYPAIR 0xA1000030u
 #define TEE_TYPE_DATA 0xA00000BFu
-
 /// @}
 
 /// Attributes of objects, and the flags in their IDs: two numbers instead of a buffer; not secret.
@@ -278,7 +270,6 @@ void TEE_Free(void *buffer);
 #define TEE_ATTR_RSA_EXPONENT1 0xC0000630u
 #define TEE_ATTR_RSA_EXPONENT2 0xC0000730u
 #define TEE_ATTR_RSA_COEFFICIENT 0xC0000830u
-
 /// @}
 
 /// Describes an object of any kind.
@@ -361,7 +352,6 @@ TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_
 #define TEE_ALG_SHA256 0x50000004u
 #define TEE_ALG_RSAES_PKCS1_V1_5 0x60000130u
 #define TEE_ALG_RSASSA_PKCS1_V1_5_SHA256 0x70004830u
-
 /// @}
 
 /// What an operation does.
@@ -372,7 +362,6 @@ TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_
 #define TEE_MODE_VERIFY 3u
 #define TEE_MODE_MAC 4u
 #define TEE_MODE_DIGEST 5u
-
 /// @}
 
 /// Makes an operation for keys of up to `maxKeySize` bits (0 for a digest).
