@@ -23,7 +23,6 @@ foreach(program otrp-device otrp-tsm)
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME ${program})
 endforeach()
 install(FILES LICENSE NOTICE README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
-install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR} RENAME copyright)  # where Debian looks
 
 # ---- For clients: find_package(otrp-tee) and pkg-config otrp-tee
 
@@ -36,23 +35,3 @@ file(RELATIVE_PATH pc_to_prefix /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 configure_file(cmake/otrp-tee.pc.in otrp-tee.pc @ONLY)
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/otrp-tee.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
-
-# ---- Packages: cpack -G DEB
-
-set(CPACK_PACKAGE_NAME otrp)
-set(CPACK_PACKAGE_VENDOR "OTrP device side authors")
-set(CPACK_PACKAGE_CONTACT "OTrP device side authors")
-set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "Device side of the Open Trust Protocol")
-set(CPACK_PACKAGE_DESCRIPTION
-"An OTrP agent for GlobalPlatform TEEs, a TEE to run it on any Linux machine,
-a key service, and command lines for the device and for a Trusted Service
-Manager. It is for development and simulation: the TEE isolates nothing.")
-set(CPACK_PACKAGE_CHECKSUM SHA256)
-set(CPACK_STRIP_FILES ON)
-set(CPACK_VERBATIM_VARIABLES ON)
-set(CPACK_GENERATOR DEB)
-set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
-set(CPACK_DEBIAN_PACKAGE_SECTION utils)
-set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
-include(CPack)

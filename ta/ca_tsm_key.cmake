@@ -20,9 +20,11 @@ function(otrp_generate_ca_tsm_key pem header)
       "OTRP_CA_TSM_KEY must name a PEM file with a 2048-bit RSA key of exponent 65537: ${pem}")
   endif()
 
-  file(SHA256 ${PROJECT_SOURCE_DIR}/keys/dev-ca-tsm.pub.pem dev_digest)
+  file(SHA256 ${PROJECT_SOURCE_DIR}/keys/dev-ca-tsm.pub.pem public_digest)
+  file(SHA256 ${PROJECT_SOURCE_DIR}/keys/dev-ca-tsm.pem private_digest)
   file(SHA256 ${pem} digest)
-  if(digest STREQUAL dev_digest AND CMAKE_BUILD_TYPE STREQUAL "Release")
+  if(CMAKE_BUILD_TYPE STREQUAL "Release" AND
+      (digest STREQUAL public_digest OR digest STREQUAL private_digest))
     message(WARNING "The agent trusts the development CA-TSM key, whose private half is public. "
       "Set OTRP_CA_TSM_KEY for anything that leaves the desk.")
   endif()

@@ -299,7 +299,7 @@ uint32_t base64urlDecodePiece(char *text, uint32_t *len, bool is_last, uint8_t *
     return static_cast<uint32_t>(in.to - to);
   }
   for (; in.at != in.end; ++in.at) {
-    const characters one = {*in.at};
+    const characters one = {static_cast<signed char>(*in.at)};
     if (distances_of<kUrl>(one)[0] != 0) text[(*len)++] = *in.at;
   }
   return static_cast<uint32_t>(in.to - to);

@@ -8,9 +8,10 @@
 
 #include "little_endian.h"
 
+/// What is left to read. The bytes stay their owner's.
 struct reader {
-  const uint8_t *at;
-  uint32_t left;  // bytes
+  const uint8_t *at;  // the next byte
+  uint32_t left;      // bytes
 };
 
 /// `*bytes` points at the next `n` bytes; false when n is 0 or more than is left.
@@ -22,6 +23,7 @@ struct reader {
   return true;
 }
 
+/// The next two bytes as a number; false when they are not there.
 [[nodiscard]] inline bool take_u16(reader *in, uint16_t *value) {
   const uint8_t *bytes = nullptr;
   if (!take(in, sizeof *value, &bytes)) return false;
@@ -29,6 +31,7 @@ struct reader {
   return true;
 }
 
+/// The next four bytes as a number; false when they are not there.
 [[nodiscard]] inline bool take_u32(reader *in, uint32_t *value) {
   const uint8_t *bytes = nullptr;
   if (!take(in, sizeof *value, &bytes)) return false;

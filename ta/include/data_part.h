@@ -6,12 +6,13 @@
 #include <stdint.h>
 #include <string.h>
 
+/// A byte string that stays its owner's.
 struct data_part {
-  const void *data;
-  uint32_t len;
+  const void *data;  // may be NULL when `len` is 0
+  uint32_t len;      // bytes
 };
 
-/// The characters of a text, without its terminating NUL.
+/// The characters of a text, which must not be NULL, without its terminating NUL.
 inline data_part text_part(const char *text) {
   return {text, static_cast<uint32_t>(strlen(text))};
 }

@@ -7,6 +7,7 @@
 
 #include "otrp_result.h"
 
+/// Logs a line of level TEE_TRACE_ERROR.
 #define trace_error(function, line, ...) tee_trace(function, line, TEE_TRACE_ERROR, __VA_ARGS__)
 
 /// Logs the text, a printf format with its arguments, and returns `code`.
@@ -25,8 +26,8 @@
 /// The same, and adds a line of our own: `text` ends in a conversion for the code.
 #define TRY_LOG(call, text) TRY_LOG_AS(__func__, call, text)
 
-// For a stage that logs under the name of the operation it was split from.
-
+/// FAIL, CHECK and TRY_LOG for a stage that logs under the name of the operation it was split from.
+/// @{
 #define FAIL_AS(name, code, ...)              \
   do {                                        \
     trace_error(name, __LINE__, __VA_ARGS__); \
@@ -43,5 +44,6 @@
     const TEE_Result r_ = (call);                       \
     if (r_ != TEE_SUCCESS) FAIL_AS(name, r_, text, r_); \
   } while (0)
+/// @}
 
 #endif

@@ -10,18 +10,18 @@ struct jsmn_object;
 
 /// What the verify stage gets and fills.
 struct request_context {
-  const uint8_t *message;  // the message text, in the caller's input buffer
-  uint32_t message_len;
-  const char *request_name;  // outer key of the envelope
+  const uint8_t *message;    // the message text, in the caller's input buffer
+  uint32_t message_len;      // bytes
+  const char *request_name;  // outer key of the envelope, from the message table
   uint8_t *payload;          // the decoded to-be-signed request and a NUL; the pipeline's to free
-  uint32_t payload_len;
-  jsmn_object *tokens;  // the message's, NULL when it was not read; the pipeline's to free
+  uint32_t payload_len;      // bytes, without the NUL
+  jsmn_object *tokens;       // the message's, NULL when it was not read; the pipeline's to free
 };
 
 /// A decrypted TA image on its way to the normal world. The pipeline frees `data`.
 struct ta_image {
-  uint8_t *data;
-  uint32_t len;
+  uint8_t *data;  // NULL for messages without an image
+  uint32_t len;   // bytes
 };
 
 /// Checks the TSM's signature; on success the context's payload is set.

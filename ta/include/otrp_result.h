@@ -12,22 +12,24 @@
 
 #include <tee_internal_api.h>
 
+/// Codes of the agent's own. Clients see them as results of an invocation, as status words of
+/// answers, and as "error_code" in responses.
 enum : TEE_Result {
-  OTRP_DSI_MISMATCH = 0xDEAD0001,       // stale DSI hash; foreign TSM; device ID rejected
-  OTRP_SD_EXISTS = 0xDEAD0002,          // CreateSD: the SD name is taken
-  OTRP_SD_MISMATCH = 0xDEAD0004,        // UpdateSD: name, SP or TSM differs from the SD record
-  OTRP_BAD_REQUEST = 0xDEAD0006,        // malformed, unknown, unverifiable or undecryptable
-  OTRP_TA_DECRYPT_FAILED = 0xDEAD0007,  // TA image cannot be decrypted
-  OTRP_TA_EXISTS = 0xDEAD0008,          // TA is in the SD, or registered, already
-  OTRP_NOT_FOUND = 0xDEAD000A,          // no SD or TA record; TA not registered
-  OTRP_DSI_HASH_FAILED = 0xDEAD000C,    // DSI hash cannot be computed
-  OTRP_RESPONSE_FAILED = 0xDEAD000E,    // response not encrypted or signed; SD list or record bad
-  OTRP_CA_CHECK_FAILED = 0xDEAD0010,    // the CA-TSM key does not vouch for it
-  OTRP_TA_INFO_INCOMPLETE = 0xDEAD1001,
+  OTRP_DSI_MISMATCH = 0xDEAD0001,        // stale DSI hash; foreign TSM; device ID rejected
+  OTRP_SD_EXISTS = 0xDEAD0002,           // CreateSD: the SD name is taken
+  OTRP_SD_MISMATCH = 0xDEAD0004,         // UpdateSD: name, SP or TSM differs from the SD record
+  OTRP_BAD_REQUEST = 0xDEAD0006,         // malformed, unknown, unverifiable or undecryptable
+  OTRP_TA_DECRYPT_FAILED = 0xDEAD0007,   // TA image cannot be decrypted
+  OTRP_TA_EXISTS = 0xDEAD0008,           // TA is in the SD, or registered, already
+  OTRP_NOT_FOUND = 0xDEAD000A,           // no SD or TA record; TA not registered
+  OTRP_DSI_HASH_FAILED = 0xDEAD000C,     // DSI hash cannot be computed
+  OTRP_RESPONSE_FAILED = 0xDEAD000E,     // response not encrypted or signed; SD list or record bad
+  OTRP_CA_CHECK_FAILED = 0xDEAD0010,     // the CA-TSM key does not vouch for it
+  OTRP_TA_INFO_INCOMPLETE = 0xDEAD1001,  // a TA record lacks a member
   OTRP_NO_MEMORY = 0xDEAD1002,  // no memory, or a value that cannot be built, decoded or parsed
-  OTRP_SD_LIST_BROKEN = 0xDEAD1003,
-  OTRP_MISSING = 0xDEAD1004,  // an argument or member is missing; no such entry in the DSI
-  OTRP_SP_NOT_FOUND = 0xDEAD1005,
+  OTRP_SD_LIST_BROKEN = 0xDEAD1003,  // the stored SD list is not what it should be
+  OTRP_MISSING = 0xDEAD1004,         // an argument or member is missing; no such entry in the DSI
+  OTRP_SP_NOT_FOUND = 0xDEAD1005,    // no record of the SP
 };
 
 #endif

@@ -21,14 +21,17 @@ inline uint8_t *allocate_bytes(uint32_t len) {
   return static_cast<uint8_t *>(TEE_Malloc(len, TEE_MALLOC_FILL_ZERO));
 }
 
+/// A deleter that calls a function.
 template <auto Free>
 struct freed_by {
+  /// Frees what an owner holds, which is never NULL.
   template <class T>
   void operator()(T *p) const {
     Free(p);
   }
 };
 
+/// Owns a handle or pointer that `Free` gives back.
 template <class Handle, auto Free>
 using owned = std::unique_ptr<std::remove_pointer_t<Handle>, freed_by<Free>>;
 
@@ -36,6 +39,7 @@ using owned = std::unique_ptr<std::remove_pointer_t<Handle>, freed_by<Free>>;
 template <class T>
 using tee_ptr = owned<T *, TEE_Free>;
 
+/// Overwrites a NUL-terminated text and frees it; NULL is ignored.
 inline void wipe_and_free_text(char *text) {
   if (text == nullptr) return;
   wipe(text, static_cast<uint32_t>(strlen(text)));
@@ -47,14 +51,15 @@ using secret_text = owned<char *, wipe_and_free_text>;
 
 /// Bytes that nobody may find in freed memory. `data` and `len` are filled as out-parameters.
 struct secret_bytes {
-  uint8_t *data = nullptr;
-  uint32_t len = 0;
+  uint8_t *data = nullptr;  // from TEE_Malloc
+  uint32_t len = 0;         // bytes
 
   secret_bytes() = default;
   secret_bytes(const secret_bytes &) = delete;
   secret_bytes &operator=(const secret_bytes &) = delete;
   ~secret_bytes() { reset(); }
 
+  /// Overwrites and frees the bytes, if there are any.
   void reset() {
     if (data != nullptr) {
       wipe(data, len);
@@ -64,6 +69,7 @@ struct secret_bytes {
     len = 0;
   }
 
+  /// Hands the bytes over: the caller frees them.
   uint8_t *release() {
     uint8_t *bytes = data;
     data = nullptr;
@@ -72,8 +78,11 @@ struct secret_bytes {
   }
 };
 
+/// A transient object, usually a key.
 using key_object = owned<TEE_ObjectHandle, TEE_FreeTransientObject>;
+/// A persistent object. Closing it makes durable what was written.
 using stored_object = owned<TEE_ObjectHandle, TEE_CloseObject>;
+/// A cryptographic operation.
 using operation = owned<TEE_OperationHandle, TEE_FreeOperation>;
 
 /// Lets a plain out-parameter fill an owner: f(out(owner)). The owner has it, and its old content
@@ -81,10 +90,12 @@ using operation = owned<TEE_OperationHandle, TEE_FreeOperation>;
 template <class T, class Deleter>
 class out {
  public:
+  /// For one call that fills `owner`, which must live longer.
   explicit out(std::unique_ptr<T, Deleter> &owner) : owner_(owner) {}
   ~out() { owner_.reset(handle_); }
   out(const out &) = delete;
   out &operator=(const out &) = delete;
+  /// What the call writes to; NULL until then.
   operator T **() { return &handle_; }
 
  private:

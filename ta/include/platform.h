@@ -6,6 +6,7 @@
 #include <stdint.h>
 #include <tee_internal_api.h>
 
+/// Never defined: names the type that the last parameter of a function points to.
 template <class R, class A, class B, class C, class D, class Length>
 Length length_parameter(R (*)(A, B, C, D, Length *));
 

@@ -1,14 +1,14 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// IDs of the agent's persistent objects: a prefix followed by the record's own name, or a fixed
-/// ID.
+/// ID. An ID has at most TEE_OBJECT_ID_MAX_LEN bytes, which bounds the names.
 #ifndef RECORD_NAMES_H
 #define RECORD_NAMES_H
 
-#define SD_LIST_ID "SD_LIST_ID"
-#define SD_INFO_PREFIX "SD_INFO_"
-#define SP_INFO_PREFIX "SP_INFO_"
-#define TA_INFO_PREFIX "TA_INFO_"
-#define TSM_INFO_PREFIX "TSM_INFO_"
-#define TA_REGISTER_ID "OTRP_TA_REGISTER_INFO"
+#define SD_LIST_ID "SD_LIST_ID"                 // the names of all SDs, in their order
+#define SD_INFO_PREFIX "SD_INFO_"               // an SD, by its name
+#define SP_INFO_PREFIX "SP_INFO_"               // an SP with its AIK, by its ID
+#define TA_INFO_PREFIX "TA_INFO_"               // a TA, by its ID
+#define TSM_INFO_PREFIX "TSM_INFO_"             // a TSM's key, by its ID
+#define TA_REGISTER_ID "OTRP_TA_REGISTER_INFO"  // the digests of the TA images
 
 #endif

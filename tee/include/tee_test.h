@@ -16,6 +16,7 @@
 
 namespace tee::test {
 
+/// What may be made to go wrong.
 enum class Fault {
   kAllocation,  // TEE_Malloc returns NULL
   kStorage,     // a persistent-object call (open, create, read, write, close-and-delete) fails
@@ -27,16 +28,17 @@ enum class Fault {
 
 /// Tells of the latest fault: what was hit, for messages of a failing sweep.
 struct FaultReport {
-  bool fired = false;
-  std::string call;  // for example "TEE_WriteObjectData"
+  bool fired = false;  // a plan has been carried out since the last was made
+  std::string call;    // for example "TEE_WriteObjectData"
 };
 
+/// What an image's header would say of a trusted application.
 struct TaProperties {
-  TEE_UUID uuid{};
-  uint32_t data_size = 0x200000;
-  uint32_t stack_size = 0x2000;
-  std::string trace_prefix = "TA: test";
-  uint32_t trace_level = 1;
+  TEE_UUID uuid{};                        // whose objects it sees
+  uint32_t data_size = 0x200000;          // bytes of heap
+  uint32_t stack_size = 0x2000;           // bytes; nothing enforces it
+  std::string trace_prefix = "TA: test";  // begins its log lines
+  uint32_t trace_level = 1;               // highest TEE_TRACE_* that appears
 };
 
 /// A device whose objects live in memory, or in a state directory. Its name is a context name for
@@ -52,6 +54,7 @@ class Device {
   Device(const Device &) = delete;
   Device &operator=(const Device &) = delete;
 
+  /// The context name; lives as long as the Device.
   const char *name() const;
 
   /// Uses these functions as the trusted application `properties.uuid` in place of an image.
@@ -62,7 +65,11 @@ class Device {
   /// earlier plan of the same kind.
   void fail(const TEE_UUID &uuid, Fault fault, unsigned nth, bool and_after = false,
             TEE_Result code = 0);
+
+  /// Drops all plans, and the report.
   void clear_faults();
+
+  /// What the plans have hit since the last was made.
   FaultReport fault_report() const;
 
   /// After kPowerCut fired: gives back what storage really holds and lets writes happen again.
@@ -70,13 +77,19 @@ class Device {
 
   /// All objects of a trusted application: ID to raw data stream.
   std::map<std::string, std::string> objects(const TEE_UUID &uuid) const;
+
+  /// Creates or replaces an object, past all faults.
   void put_object(const TEE_UUID &uuid, const std::string &id, const std::string &data);
+
+  /// Removes an object, if there is one, past all faults.
   void remove_object(const TEE_UUID &uuid, const std::string &id);
 
   /// Durable writes (object creations, closes after writing, deletions) so far, of all TAs.
   uint64_t durable_writes() const;
 
   struct Impl;
+
+  /// The host TEE's own.
   Impl *impl() const { return impl_.get(); }
 
  private:
@@ -87,11 +100,14 @@ class Device {
 /// that a unit test may call TEE_* functions, or code that does, directly.
 class InsideTa {
  public:
+  /// An instance with a heap of its own; its entry points are not called. `device` must live
+  /// longer.
   explicit InsideTa(Device &device, const TaProperties &properties = {});
   ~InsideTa();
   InsideTa(const InsideTa &) = delete;
   InsideTa &operator=(const InsideTa &) = delete;
 
+  /// Figures of the instance.
   tee_heap_stats stats() const;
 
  private:
@@ -107,12 +123,17 @@ class TraceSink {
   TraceSink(const TraceSink &) = delete;
   TraceSink &operator=(const TraceSink &) = delete;
 
+  /// One call of tee_trace() that its level let through.
   struct Line {
     std::string tag;       // "ERR"
     std::string function;  // "init_dsi"
     std::string message;   // formatted, without a final line feed
   };
+
+  /// The lines so far, oldest first.
   const std::vector<Line> &lines() const;
+
+  /// Forgets them.
   void clear();
 
   struct Impl;

@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// The trace facility of the TEE: one log line per call, on standard error or in a test's sink.
 ///
-/// A line reads "LEVEL [0xTHREAD] PREFIX:FUNCTION:LINE: MESSAGE", without the bracket where the
-/// thread has no ID. The prefix and the highest level that appears come from the image header of
-/// the trusted application that calls.
+/// A line reads "LEVEL [0xTHREAD] PREFIX:FUNCTION:LINE: MESSAGE". The prefix and the highest level
+/// that appears come from the image header of the trusted application that calls.
 #ifndef TEE_TRACE_H
 #define TEE_TRACE_H
 
@@ -11,15 +10,18 @@
 extern "C" {
 #endif
 
+/// Levels of log lines, the most important first.
+/// @{
 #define TEE_TRACE_ALWAYS 0
 #define TEE_TRACE_ERROR 1
 #define TEE_TRACE_INFO 2
 #define TEE_TRACE_DEBUG 3
 #define TEE_TRACE_FLOW 4
+/// @}
 
-/// `level` is one of the above: tags "MSG" (logged whatever the TA's level), "ERR", "INF", "DBG",
-/// "FLW"; any other level is tagged "UKN". `format` is printf's; a line feed is added at its end
-/// unless it has one.
+/// Logs a line, as from line `line` of `function`. `level` is one of the above: tags "MSG" (logged
+/// whatever the TA's level), "ERR", "INF", "DBG", "FLW"; any other level is tagged "UKN". `format`
+/// is printf's; a line feed is added at its end unless it has one.
 void tee_trace(const char *function, int line, int level, const char *format, ...)
     __attribute__((format(printf, 4, 5)));
 
