@@ -35,3 +35,29 @@ file(RELATIVE_PATH pc_to_prefix /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 configure_file(cmake/otrp-tee.pc.in otrp-tee.pc @ONLY)
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/otrp-tee.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+# ---- Packages: cpack -G DEB
+
+set(CPACK_GENERATOR DEB)
+set(CPACK_PACKAGE_NAME otrp)
+set(CPACK_PACKAGE_VENDOR "OTrP device side authors")
+set(CPACK_PACKAGE_CONTACT "OTrP device side authors <authors@otrp.invalid>")
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "device side of the Open Trust Protocol")
+set(CPACK_PACKAGE_DESCRIPTION
+"An OTrP agent for GlobalPlatform TEEs, a TEE to run it on any Linux machine,
+a key service, and command lines for the device and for a Trusted Service
+Manager, with what is needed to write other clients of the TEE.
+
+It is for development and simulation: the TEE isolates nothing.")
+set(CPACK_STRIP_FILES ON)
+set(CPACK_VERBATIM_VARIABLES ON)
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_RELEASE 1)
+set(CPACK_DEBIAN_PACKAGE_SECTION utils)
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
+set(CPACK_DEBIAN_PACKAGE_CONTROL_EXTRA ${PROJECT_SOURCE_DIR}/cmake/package/triggers)
+set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
+set(CPACK_PRE_BUILD_SCRIPTS ${PROJECT_SOURCE_DIR}/cmake/package/finish.cmake)
+include(CPack)
