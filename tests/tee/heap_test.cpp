@@ -1,7 +1,4 @@
 // SPDX-License-Identifier: BSD-2-Clause
-#include <cstring>
-#include <vector>
-
 #include "tee_support.h"
 
 using namespace tee::test;
@@ -37,29 +34,6 @@ TEST(Heap, ChargesRoundedBlocksAndTheirHeaders) {
     EXPECT_EQ(ta.stats().in_use, 0u);
     EXPECT_EQ(ta.stats().peak, c.charge);
   }
-}
-
-// Many more blocks than the table of blocks begins with, freed in an order that leaves gaps.
-TEST(Heap, KeepsTrackOfManyBlocks) {
-  Device device;
-  const InsideTa ta(device);
-  constexpr uint32_t kBlocks = 5000;
-  std::vector<uint8_t *> blocks;
-  for (uint32_t i = 0; i < kBlocks; ++i) {
-    const uint32_t len = 1 + i % 100;
-    blocks.push_back(static_cast<uint8_t *>(TEE_Malloc(len, TEE_MALLOC_FILL_ZERO)));
-    ASSERT_NE(blocks[i], nullptr);
-    EXPECT_EQ(blocks[i][len - 1], 0);
-    std::memset(blocks[i], 0xFF, len);
-    if (i % 3 == 2) TEE_Free(std::exchange(blocks[i - 1], nullptr));
-  }
-  EXPECT_EQ(ta.stats().live_blocks, kBlocks - kBlocks / 3);
-  for (uint32_t step = 0; step < 7; ++step) {
-    for (uint32_t i = step; i < kBlocks; i += 7) TEE_Free(blocks[i]);
-  }
-  EXPECT_EQ(ta.stats().live_blocks, 0u);
-  EXPECT_EQ(ta.stats().in_use, 0u);
-  EXPECT_GT(ta.stats().peak_blocks, kBlocks / 2);
 }
 
 TEST(HeapDeathTest, MisusePanics) {
