@@ -21,14 +21,16 @@ class Random {
   std::minstd_rand engine_;
 };
 
+/// Changes an input of the target. A target without a function of its own gets one that changes
+/// the bytes of the input, or the JSON text in it. What is longer than `max_len` counts for
+/// nothing.
+std::string mutate(std::string_view input, size_t max_len, Random &random);
+
 /// What the fuzzer itself does to bytes.
 std::string mutate_bytes(std::string_view bytes, size_t max_len);
 
 /// Changes one thing about a JSON text: its bytes, or a member, an element, a name or a value.
 std::string mutate_json(std::string_view text, size_t max_len, Random &random);
-
-/// Hands a mutator's work to the fuzzer. What is too long is cut.
-size_t give(std::string_view bytes, uint8_t *data, size_t max_size);
 
 }  // namespace fuzz
 
