@@ -112,20 +112,13 @@ class Life {
   std::string dsi_text_;
 };
 
-class Corpora {
- public:
-  explicit Corpora(const std::string &folder) : folder_(folder) {
-    std::filesystem::remove_all(folder);
-  }
+static std::string g_folder;
 
-  void keep(const std::string &target, const std::string &name, std::string_view bytes) const {
-    std::filesystem::create_directories(folder_ + target);
-    tools::write_file(folder_ + target + "/" + name, bytes);
-  }
-
- private:
-  std::string folder_;
-};
+static void keep(const std::string &target, const std::string &name, std::string_view bytes) {
+  const std::string corpus = g_folder + "/corpus/" + target;
+  std::filesystem::create_directories(corpus);
+  tools::write_file(corpus + "/" + name, bytes);
+}
 
 // What stands in an encrypted content, as the "content" target takes it.
 static std::string content_of(const Seed &seed, const StoredDevice &device) {
@@ -138,41 +131,40 @@ static std::string content_of(const Seed &seed, const StoredDevice &device) {
   return tsm::request_content(seed.id, options, device.tsm.tsmid).dump();
 }
 
-static void keep_messages(const Corpora &corpora, const Life &life, const StoredDevice &device) {
+static void keep_messages(const Life &life, const StoredDevice &device) {
   for (const Seed &seed : kSeeds) {
     const auto id = static_cast<uint32_t>(seed.id);
     const std::string text = life.request(seed);
     const std::string content = content_of(seed, device);
     const std::string &image = seed.options.image;
-    corpora.keep("frame", seed.name, device::build_frame(id, text));
-    corpora.keep("content", seed.name,
-                 std::to_string(id) + content + (image.empty() ? "" : '\0' + image));
-    corpora.keep("token_reader", seed.name, "tsmid\n" + text);
-    corpora.keep("json", seed.name, content + '\0' + "edits");
-    corpora.keep("jwe", seed.name, tsm::jwe_encrypt(device.tee_key(), content).dump());
+    keep("frame", seed.name, device::build_frame(id, text));
+    keep("content", seed.name, std::to_string(id) + content + (image.empty() ? "" : '\0' + image));
+    keep("token_reader", seed.name, "tsmid\n" + text);
+    keep("json", seed.name, content + '\0' + "edits");
+    keep("jwe", seed.name, tsm::jwe_encrypt(device.tee_key(), content).dump());
   }
   const Json gcm = tsm::jwe_encrypt(device.tee_key(), R"({"a":[1,true,"text"]})",
                                     {.cipher = tsm::ContentCipher::kA128Gcm});
-  corpora.keep("jwe", "gcm", gcm.dump());
-  corpora.keep("query", "recorded", device::build_query(kWallet));
-  corpora.keep("query", "unknown", device::build_query(kTicket));
-  corpora.keep("json", "state-document", device.dsi_text);
-  corpora.keep("json", "numbers", R"([0,-1,1.5,1e21,-2.5e-7,9007199254740993,true,false,null])");
-  corpora.keep("base64", "state-document", tsm::base64_encode(device.dsi_text));
+  keep("jwe", "gcm", gcm.dump());
+  keep("query", "recorded", device::build_query(kWallet));
+  keep("query", "unknown", device::build_query(kTicket));
+  keep("json", "state-document", device.dsi_text);
+  keep("json", "numbers", R"([0,-1,1.5,1e21,-2.5e-7,9007199254740993,true,false,null])");
+  keep("base64", "state-document", tsm::base64_encode(device.dsi_text));
 }
 
-static void keep_records(const Corpora &corpora, const StoredDevice &device) {
+static void keep_records(const StoredDevice &device) {
   for (const auto &[id, data] : device.agent) {
     const std::string payload = data.substr(4);
-    corpora.keep("records", id, serialize_objects({{id, data}}));
-    corpora.keep("json", id, payload);
+    keep("records", id, serialize_objects({{id, data}}));
+    keep("json", id, payload);
     const Json record = tsm::parse_json(payload).value_or(nullptr);
     const std::string *aik = tsm::find_string(record, "aik");
     if (aik == nullptr) continue;
-    corpora.keep("base64", id, *aik);
-    corpora.keep("tlv", id, tsm::base64_decode(*aik).value());
+    keep("base64", id, *aik);
+    keep("tlv", id, tsm::base64_decode(*aik).value());
   }
-  corpora.keep("records", "all", serialize_objects(device.agent));
+  keep("records", "all", serialize_objects(device.agent));
 }
 
 }  // namespace fuzz
@@ -182,12 +174,12 @@ int main(int argc, char **argv) {
     std::fprintf(stderr, "usage: fuzz_make_seeds FOLDER\n");
     return 2;
   }
-  const std::string folder = argv[1];
+  fuzz::g_folder = argv[1];
   const fuzz::Life life;
   const fuzz::StoredDevice device = life.stored();
-  const fuzz::Corpora corpora(folder + "/corpus/");
-  fuzz::write_stored_device(device, folder + "/device.json");
-  keep_messages(corpora, life, device);
-  keep_records(corpora, device);
+  std::filesystem::remove_all(fuzz::g_folder + "/corpus");
+  fuzz::write_stored_device(device, fuzz::g_folder + "/device.json");
+  keep_messages(life, device);
+  keep_records(device);
   return 0;
 }

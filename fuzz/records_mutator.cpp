@@ -28,11 +28,10 @@ static std::string mutate_data(const std::string &data, Random &random) {
 
 std::string mutate(std::string_view input, size_t, Random &random) {
   Objects objects = parse_objects(input);
-  const auto any_of = [&random](const Objects &all) {
-    return *std::next(all.begin(), static_cast<ptrdiff_t>(random.below(all.size())));
-  };
   const bool takes_another = objects.empty() || random.one_in(16);
-  auto [id, data] = any_of(takes_another ? stored_device().agent : objects);
+  const Objects &all = takes_another ? stored_device().agent : objects;
+  auto [id, data] = std::pair<std::string, std::string>(
+      *std::next(all.begin(), static_cast<ptrdiff_t>(random.below(all.size()))));
   objects.erase(id);
   if (random.one_in(16)) {
     id = mutate_bytes(id, 64);

