@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
+#include <vector>
+
 #include "tee_support.h"
 
 using namespace tee::test;
@@ -34,6 +36,20 @@ TEST(Heap, ChargesRoundedBlocksAndTheirHeaders) {
     EXPECT_EQ(ta.stats().in_use, 0u);
     EXPECT_EQ(ta.stats().peak, c.charge);
   }
+}
+
+// Many more blocks than the table of blocks begins with, freed in an order that leaves gaps.
+TEST(Heap, KeepsTrackOfManyBlocks) {
+  Device device;
+  const InsideTa ta(device);
+  std::vector<void *> blocks(5000);
+  for (void *&block : blocks) block = TEE_Malloc(100, TEE_MALLOC_FILL_ZERO);
+  EXPECT_EQ(ta.stats().live_blocks, blocks.size());
+  for (size_t step = 0; step < 7; ++step) {
+    for (size_t i = step; i < blocks.size(); i += 7) TEE_Free(blocks[i]);
+  }
+  EXPECT_EQ(ta.stats().live_blocks, 0u);
+  EXPECT_EQ(ta.stats().in_use, 0u);
 }
 
 TEST(HeapDeathTest, MisusePanics) {

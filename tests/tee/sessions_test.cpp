@@ -143,6 +143,18 @@ TEST_F(Sessions, TheCalleeKnowsItsCallerAndSeesItsMemory) {
 
 // ---- Parameters
 
+TEST_F(Sessions, ValuesGoBothWays) {
+  script<0>.invoke = [](uint32_t, TEE_Param *params) {
+    params[0].value.b = params[0].value.a + 1;
+    return TEE_SUCCESS;
+  };
+  TEEC_Operation operation{.paramTypes = TEEC_VALUE_INOUT};
+  operation.params[0].value = {41, 0};
+  ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
+  EXPECT_EQ(client.invoke(0, &operation), TEEC_SUCCESS);
+  EXPECT_EQ(operation.params[0].value.b, 42u);
+}
+
 struct MemoryCase {
   const char *name;
   uint32_t type;
@@ -156,10 +168,10 @@ constexpr uint32_t kSeenOut = TEE_PARAM_TYPE_MEMREF_OUTPUT;
 constexpr uint32_t kSeenBoth = TEE_PARAM_TYPE_MEMREF_INOUT;
 
 TEST_F(Sessions, MemoryReachesTheTrustedApplicationOrIsRefused) {
-  char bytes[8];
   TEEC_SharedMemory none{};
-  TEEC_SharedMemory both{bytes, 8, TEEC_MEM_INPUT | TEEC_MEM_OUTPUT, nullptr};
-  TEEC_SharedMemory out{bytes, 8, TEEC_MEM_OUTPUT, nullptr};
+  TEEC_SharedMemory both{nullptr, 8, TEEC_MEM_INPUT | TEEC_MEM_OUTPUT, nullptr};
+  ASSERT_EQ(TEEC_AllocateSharedMemory(&client.context, &both), TEEC_SUCCESS);
+  TEEC_SharedMemory out{both.buffer, 8, TEEC_MEM_OUTPUT, nullptr};
   const MemoryCase kCases[] = {
       {"TempInput", TEEC_MEMREF_TEMP_INPUT, {&both, 8, 0}, kSeenIn, 0, 8, 8},
       {"TempOutput", TEEC_MEMREF_TEMP_OUTPUT, {&both, 8, 0}, kSeenOut, 0, 8, 3},
@@ -194,10 +206,11 @@ TEST_F(Sessions, MemoryReachesTheTrustedApplicationOrIsRefused) {
               c.seen_type != 0 ? TEEC_ERROR_SHORT_BUFFER : TEEC_ERROR_BAD_PARAMETERS);
     EXPECT_EQ(seen_type, c.seen_type);
     if (c.seen_type == 0) continue;
-    EXPECT_EQ(seen.memref.buffer, bytes + c.offset);
+    EXPECT_EQ(seen.memref.buffer, static_cast<char *>(both.buffer) + c.offset);
     EXPECT_EQ(seen.memref.size, c.size);
     EXPECT_EQ(is_temporary ? param.tmpref.size : param.memref.size, c.size_after);
   }
+  TEEC_ReleaseSharedMemory(&both);
 }
 
 }  // namespace

@@ -219,6 +219,12 @@ TEST_F(DeviceProgram, WrongUsageIsOneLine) {
   }
 }
 
+TEST_F(DeviceProgram, InfoNamesTheDeviceAndItsKey) {
+  const Outcome id = run("device-id");
+  EXPECT_THAT(run("info").out, StartsWith("{\"device_id\":\"" + id.out.substr(0, 32) +
+                                          "\",\"tee_public_key\":\"AAEAA"));  // 256 bytes
+}
+
 TEST_F(DeviceProgram, FailedMessageLeavesNoFile) {
   const Outcome sent = run("--stats send get-device-state - -o response --image-out image", "{}");
   EXPECT_EQ(sent.exit_code, 1);

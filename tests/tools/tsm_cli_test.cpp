@@ -36,6 +36,7 @@ TEST_F(TsmProgram, InitMakesAnIdentityOnceAndKeepsItsKeysPrivate) {
   const std::string key = read("tsm/tsm-key.pem");
   EXPECT_EQ(run("init --ca ca.pem").exit_code, 2);
   EXPECT_EQ(read("tsm/tsm-key.pem"), key);
+  EXPECT_EQ(run("--home other init").exit_code, 0) << "with the development CA";
 }
 
 TEST_F(TsmProgram, ResponsesAreShownKeptAndUsedForTheNextRequest) {
@@ -66,6 +67,10 @@ TEST_F(TsmProgram, ResponsesAreShownKeptAndUsedForTheNextRequest) {
   const Outcome unpacked = run(install + "--sp sp --image ca.pem");
   EXPECT_EQ(unpacked.exit_code, 2);
   EXPECT_NE(unpacked.err.find("image pack"), std::string::npos);
+  std::filesystem::remove(path("tsm/ca-tsm.pem"));
+  EXPECT_EQ(run(install + "--sp sp --image app.img").exit_code, 2);
+  const std::string create = "request create-sd --device device.json --sp sp --sd sd --sp-cert ";
+  EXPECT_EQ(run(create + "\"$(printf '\\377')\"").exit_code, 2);
 }
 
 TEST_F(TsmProgram, RefusalsAndUnverifiedResponsesAreToldApart) {
