@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <set>
 
 #include "state/dsi.h"
 #include "tsm/response.h"
@@ -36,13 +37,9 @@ uint32_t word_at(std::string_view bytes, size_t offset) {
 }
 
 // Compares the bytes with themselves one further on: these are long, and looked at in every run.
-bool all_alike(std::string_view bytes) {
-  return bytes.empty() || std::memcmp(bytes.data(), bytes.data() + 1, bytes.size() - 1) == 0;
-}
-
 bool untouched(std::string_view bytes) {
-  return all_alike(bytes) &&
-         (bytes.empty() || static_cast<uint8_t>(bytes.front()) == device::kUntouched);
+  return bytes.empty() || (static_cast<uint8_t>(bytes.front()) == device::kUntouched &&
+                           std::memcmp(bytes.data(), bytes.data() + 1, bytes.size() - 1) == 0);
 }
 
 // Where the payload stood there are zeros, up to where it ended.
@@ -51,41 +48,25 @@ bool wiped_or_untouched(std::string_view bytes) {
   return end == std::string_view::npos || untouched(bytes.substr(end));
 }
 
-// Whether a verified response says "pass". An AIK signs what GetTAInfo answers.
-bool says_pass(std::string_view response, const tsm::RsaKey &tee_key) {
-  try {
-    const tsm::Envelope envelope = tsm::parse_envelope(response);
-    require(envelope.message->id == tsm::MessageId::kGetTaInfo ||
-                tsm::signature_verifies(envelope, tee_key),
-            "a response's signature verifies");
-    const tsm::Json *tbs = tsm::find_object(envelope.payload, envelope.message->tbs_response);
-    const std::string *status = tbs == nullptr ? nullptr : tsm::find_string(*tbs, "status");
-    return status != nullptr && *status == "pass";
-  } catch (const tsm::NotVerified &error) {
-    require(false, error.what());
-    throw;
-  }
+// The response, to be verified. An answer that is not well-formed throws, which ends the process.
+std::string require_answer(const device::Reply &reply, std::string_view output) {
+  const device::Answer answer = device::parse_answer(output, reply.size);
+  const size_t image_len = answer.image ? kWordLen + answer.image->size() : 0;
+  const size_t end = kHeaderLen + answer.response.size() + image_len;
+  require(answer.status != TEE_SUCCESS || !answer.response.empty(), "a success has a response");
+  require(wiped_or_untouched(output.substr(end)), "nothing stands behind the answer");
+  return answer.response;
 }
 
-// Gives the response, which is to be verified.
-std::string_view require_answer(const device::Reply &reply, std::string_view output) {
-  require(output.size() >= kHeaderLen && reply.size >= kHeaderLen, "an answer has a header");
-  const uint32_t status = word_at(output, 0);
-  const size_t response_len = word_at(output, kWordLen);
-  require(response_len <= output.size() - kHeaderLen, "a response fits");
-  size_t end = kHeaderLen + response_len;
-  require(reply.size >= end, "the size covers the response");
-  if (status == TEE_SUCCESS) {
-    require(response_len != 0, "a success has a response");
-    require(reply.size <= output.size(), "a success fits");
-    if (reply.size != end) {
-      require(reply.size > end + kWordLen, "an image has a length and is not empty");
-      require(word_at(output, end) == reply.size - end - kWordLen, "an image's length is right");
-      end = reply.size;
-    }
-  }
-  require(wiped_or_untouched(output.substr(end)), "nothing stands behind the answer");
-  return output.substr(kHeaderLen, response_len);
+// Whether the response, which is verified, says "pass". An AIK signs what GetTAInfo answers.
+bool says_pass(std::string_view response, const tsm::RsaKey &tee_key) {
+  const tsm::Envelope envelope = tsm::parse_envelope(response);
+  const tsm::Message &message = *envelope.message;
+  require(message.id == tsm::MessageId::kGetTaInfo || tsm::signature_verifies(envelope, tee_key),
+          "a response's signature verifies");
+  const tsm::Json *tbs = tsm::find_object(envelope.payload, message.tbs_response);
+  const std::string *status = tbs == nullptr ? nullptr : tsm::find_string(*tbs, "status");
+  return status != nullptr && *status == "pass";
 }
 
 void require_refusal(const device::Reply &reply, std::string_view output) {
@@ -111,16 +92,10 @@ void require_query_answer(const device::Reply &reply) {
   require(untouched(output.substr(reply.size)), "nothing stands behind the answer");
 }
 
-// The entries of a list, sorted: a new instance has them in the order in which they are stored.
-std::string in_any_order(const char *list) {
-  const std::optional<tsm::Json> entries = tsm::parse_json(list);
-  if (!entries) return list;
-  std::vector<std::string> texts;
-  for (const tsm::Json &entry : *entries) texts.push_back(entry.dump());
-  std::ranges::sort(texts);
-  std::string sorted;
-  for (const std::string &text : texts) sorted += text + "\n";
-  return sorted;
+// The entries of a list: a new instance has them in the order in which they are stored.
+std::multiset<tsm::Json> entries_of(const char *list) {
+  const tsm::Json entries = tsm::parse_json(list).value_or(list);
+  return {entries.begin(), entries.end()};
 }
 
 std::string state() {
@@ -197,7 +172,7 @@ void TargetDevice::require_message_answer(const device::Reply &reply) {
     require_refusal(reply, output);
     return;
   }
-  const std::string_view response = require_answer(reply, output);
+  const std::string response = require_answer(reply, output);
   if (response.empty()) return;
   // The key service makes the key when it is first asked.
   if (!tee_key_) tee_key_ = tee_key_of(key_service_objects());
@@ -211,10 +186,10 @@ void TargetDevice::store(const Objects &objects) {
 
 void TargetDevice::restore() {
   if (host_.durable_writes() == writes_ && state() == first_state_) return;
-  const std::string known = in_any_order(g_dsi->sdl_json_str);
+  const std::multiset<tsm::Json> known = entries_of(g_dsi->sdl_json_str);
   close();
   require(open(), "the agent starts with what it has stored");
-  require(!passed_ || in_any_order(g_dsi->sdl_json_str) == known,
+  require(!passed_ || entries_of(g_dsi->sdl_json_str) == known,
           "a new instance knows the same security domains");
   close();
   store(first_);

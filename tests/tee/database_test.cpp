@@ -67,16 +67,29 @@ int exit_code_of(pid_t process) {
   return WEXITSTATUS(status);
 }
 
-TEST_F(StateDirectory, IsSharedWithinAProcessOnly) {
-  const Client first(state), second(state.string() + "/../b/");
-  EXPECT_EQ(first.result, TEEC_SUCCESS);
-  EXPECT_EQ(second.result, TEEC_SUCCESS);
+TEST_F(StateDirectory, BelongsToOneProcess) {
   const auto is_turned_away = [&] {
     const Client other(state);
     return other.result == TEEC_ERROR_BUSY && other.context.imp == nullptr &&
            tee_inspect_last_error() ==
                "state directory " + state.string() + " is in use by another process";
   };
+  int ready[2];
+  ASSERT_EQ(::pipe(ready), 0);
+  const pid_t owner = spawn([&] {
+    const Device device(state);
+    return ::write(ready[1], "!", 1) == 1 ? ::pause() : 1;
+  });
+  char byte;
+  ASSERT_EQ(::read(ready[0], &byte, 1), 1);
+  EXPECT_TRUE(is_turned_away());
+  ::kill(owner, SIGKILL);
+  ::waitpid(owner, nullptr, 0);
+
+  const Client first(state), second(state.string() + "/../b/");
+  EXPECT_EQ(first.result, TEEC_SUCCESS);
+  EXPECT_EQ(second.result, TEEC_SUCCESS);
+  // Nor may a child go on with what its parent opened.
   EXPECT_EQ(exit_code_of(spawn(is_turned_away)), true);
 }
 

@@ -50,6 +50,10 @@ TEST_P(Persistent, ObjectsOutliveTheirDeviceUntilTheyAreDeleted) {
   reopen();
   EXPECT_EQ(stored(), objects);
   EXPECT_TRUE(device->objects(inner(kTaA)).empty());
+  {
+    const InsideTa other(*device, {.uuid = inner(kTaA)});
+    EXPECT_EQ(open_object("empty", kRead, &object), TEE_ERROR_ITEM_NOT_FOUND);
+  }
   EXPECT_EQ(open_object(std::string("\0", 1), kRead, &object), TEE_ERROR_ITEM_NOT_FOUND);
 
   ASSERT_EQ(open_object("empty", kMeta, &object), TEE_SUCCESS);
