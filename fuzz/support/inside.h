@@ -13,19 +13,30 @@
 
 namespace fuzz {
 
-/// While it lives, this thread runs as an instance; at its end that must have nothing left.
+/// While it lives, a run of a target: it happens in an instance that lives as long as the process,
+/// and leaves nothing behind.
 class Inside {
  public:
+  Inside() : world_(world()) {}
   ~Inside() {
-    const tee_heap_stats now = inside_.stats();
+    const tee_heap_stats now = world_.inside.stats();
     require(now.live_blocks == 0, "no block is left on the heap");
     require(now.open_objects == 0 && now.open_operations == 0, "no handle is left open");
+    world_.log.clear();
   }
 
  private:
-  tee::test::Device device_;
-  tee::test::InsideTa inside_{device_};
-  tee::test::TraceSink log_;
+  struct World {
+    tee::test::Device device;
+    tee::test::InsideTa inside{device};
+    tee::test::TraceSink log;
+  };
+  static World &world() {
+    static World world;
+    return world;
+  }
+
+  World &world_;
 };
 
 /// A NUL-terminated copy of exact size, so that the sanitizer sees a character too far.

@@ -1,11 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// The fuzzer's way into a target, and mutations of texts.
 #include "support/mutation.h"
 
 #include <algorithm>
 #include <vector>
 
-#include "support/require.h"
 #include "tsm/crypto.h"
 
 extern "C" size_t LLVMFuzzerMutate(uint8_t *data, size_t size, size_t max_size);
@@ -86,15 +84,6 @@ void mutate_node(const std::vector<Json *> &nodes, Random &random) {
 
 }  // namespace
 
-// A text begins with the first brace, and ends with the input or a NUL.
-__attribute__((weak)) std::string mutate(std::string_view input, size_t max_len, Random &random) {
-  const size_t at = input.find('{');
-  if (at == std::string_view::npos || random.one_in(3)) return mutate_bytes(input, max_len);
-  const std::string_view text = input.substr(at, input.find('\0', at) - at);
-  return std::string(input.substr(0, at)) + mutate_json(text, max_len, random) +
-         std::string(input.substr(at + text.size()));
-}
-
 std::string mutate_bytes(std::string_view bytes, size_t max_len) {
   std::string work(bytes.substr(0, max_len));
   const size_t len = work.size();
@@ -115,11 +104,6 @@ std::string mutate_json(std::string_view text, size_t max_len, Random &random) {
 }
 
 }  // namespace fuzz
-
-extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-  fuzz::check({reinterpret_cast<const char *>(data), size});
-  return 0;
-}
 
 extern "C" size_t LLVMFuzzerCustomMutator(uint8_t *data, size_t size, size_t max_size,
                                           unsigned seed) {

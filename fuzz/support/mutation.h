@@ -21,8 +21,7 @@ class Random {
   std::minstd_rand engine_;
 };
 
-/// Changes an input of the target. A target without a function of its own gets one that changes
-/// the bytes of the input, or the JSON text in it. What is longer than `max_len` counts for
+/// What a target's mutator defines: changes an input. One that is longer than `max_len` counts for
 /// nothing.
 std::string mutate(std::string_view input, size_t max_len, Random &random);
 

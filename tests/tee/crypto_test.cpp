@@ -219,4 +219,13 @@ TEST_F(Crypto, MisuseOfAnOperationPanics) {
   EXPECT_DEATH(TEE_CipherDoFinal(cbc.get(), "x", 1, out.data(), &len), "whole blocks");
 }
 
+TEST_F(Crypto, OperationsOutliveTheirKeyObjectsAndTakeNewKeys) {
+  Key key = secret_key(TEE_TYPE_AES, Bytes(16, 9));
+  const Operation cipher = make_operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, key);
+  key = secret_key(TEE_TYPE_AES, kCbcKey);
+  EXPECT_EQ(TEE_SetOperationKey(cipher.get(), key.get()), TEE_SUCCESS);
+  key.reset();
+  EXPECT_EQ(cbc_in_place(cipher, kCbcPlaintext, 16), kCbcCiphertext);
+}
+
 }  // namespace
