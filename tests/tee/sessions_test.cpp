@@ -4,6 +4,7 @@
 #include <chrono>
 #include <thread>
 
+#include "device/device_client.h"
 #include "tee_support.h"
 
 using namespace tee::test;
@@ -26,6 +27,16 @@ TEST(Loading, AMissingOrWrongImageIsNamed) {
   EXPECT_NE(std::string(tee_inspect_last_error()).find(folder.path), std::string::npos);
   EXPECT_EQ(client.open(kTaB), TEEC_ERROR_BAD_FORMAT);
   set_ta_directory("");
+}
+
+// At its end an instance of the agent frees what its globals hold; another's would make it panic.
+TEST(Loading, EachInstanceHasGlobalsOfItsOwn) {
+  Device one, two;
+  Client client(one.name()), other(two.name());
+  ASSERT_EQ(client.open(device::kAgentUuid), TEEC_SUCCESS) << tee_inspect_last_error();
+  ASSERT_EQ(other.open(device::kAgentUuid), TEEC_SUCCESS) << tee_inspect_last_error();
+  client.close();
+  other.close();
 }
 
 class Sessions : public testing::Test {
