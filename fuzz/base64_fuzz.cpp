@@ -1,31 +1,13 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// Base64: encoders against OpenSSL's, decoders against it on what it takes, and against a reader of
-// a few lines on everything else.
-#include <openssl/evp.h>
-
-#include <vector>
-
+// Base64: encoders against the TSM's, decoders against what a reader of a few lines makes of any
+// bytes.
+#include "common/encoding.h"
 #include "crypto/base64.h"
 #include "support/inside.h"
 
-namespace {
+namespace fuzz {
 
-using fuzz::require;
-
-std::string encode_with_openssl(std::string_view bytes) {
-  std::vector<uint8_t> text(bytes.size() / 3 * 4 + 5);
-  const int len = EVP_EncodeBlock(text.data(), reinterpret_cast<const uint8_t *>(bytes.data()),
-                                  static_cast<int>(bytes.size()));
-  return {reinterpret_cast<const char *>(text.data()), static_cast<size_t>(len)};
-}
-
-std::string as_url(std::string text) {
-  text.resize(std::min(text.size(), text.find('=')));
-  for (char &c : text) c = c == '+' ? '-' : c == '/' ? '_' : c;
-  return text;
-}
-
-int sextet(char c, bool url) {
+static int sextet(char c, bool url) {
   static const std::string_view kLetters =
       "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
   if (url && c == '-') c = '+';
@@ -35,7 +17,7 @@ int sextet(char c, bool url) {
 }
 
 // What is not in the alphabet is passed over, and bits that fill no byte are dropped.
-std::string decode_plainly(std::string_view text, bool url) {
+static std::string decode_plainly(std::string_view text, bool url) {
   std::string bytes;
   unsigned bits = 0;
   unsigned num_bits = 0;
@@ -51,60 +33,44 @@ std::string decode_plainly(std::string_view text, bool url) {
   return bytes;
 }
 
-std::string decode(std::string_view text) {
+template <class Decoder, class... Input>
+static std::string decode(Decoder decoder, Input... input) {
   uint8_t *bytes = nullptr;
-  const uint32_t len = base64DecodeStringRemoveEndZero(fuzz::ExactText(text).get(), &bytes);
-  return fuzz::take_bytes(bytes, len);
+  const uint32_t len = decoder(input..., &bytes);
+  return take_bytes(bytes, len);
 }
 
-std::string decode_url(std::string_view text) {
+static void check_encoders(std::string_view bytes, uint32_t len) {
+  const std::string text = take_text(base64EncodeAddEndZero(u8(bytes), len));
+  const std::string url = take_text(base64urlEncodeAddEndZero(u8(bytes), len));
+  require(text == tools::base64_encode(bytes), "the encoding is the TSM's");
+  require(url == tools::base64url_encode(bytes), "so is that for URLs");
+  require(decode(base64DecodeStringRemoveEndZero, ExactText(text).get()) == bytes &&
+              decode(base64urlDecodeStringRemoveEndZero, ExactText(url).get()) == bytes,
+          "what was encoded is decoded");
+}
+
+static void check_decoders(std::string_view slice, uint32_t len) {
+  const ExactText text(slice.substr(0, slice.find('\0')));
+  require(decode(base64DecodeStringRemoveEndZero, text.get()) == decode_plainly(text.get(), false),
+          "base64 is read as it stands");
+  require(
+      decode(base64urlDecodeStringRemoveEndZero, text.get()) == decode_plainly(text.get(), true),
+      "base64url is read as it stands");
+  require(decode(base64urlDecodeStringRemoveEndZeroV2, slice.data(), len) ==
+              decode_plainly(slice, true),
+          "a slice is read up to its end");
   uint8_t *bytes = nullptr;
-  const uint32_t len = base64urlDecodeStringRemoveEndZero(fuzz::ExactText(text).get(), &bytes);
-  return fuzz::take_bytes(bytes, len);
+  const uint32_t bytes_len = base64urlDecodeStringAddEndZeroV2(slice.data(), len, &bytes);
+  require(bytes != nullptr && bytes[bytes_len] == 0, "a NUL stands behind a text");
+  require(take_bytes(bytes, bytes_len) == decode_plainly(slice, true), "that is read likewise");
 }
 
-std::string decode_slice(std::string_view text) {
-  const fuzz::ExactBytes exact(text);
-  uint8_t *bytes = nullptr;
-  const uint32_t len = base64urlDecodeStringRemoveEndZeroV2(
-      reinterpret_cast<const char *>(exact.get()), static_cast<uint32_t>(text.size()), &bytes);
-  return fuzz::take_bytes(bytes, len);
+void check(std::string_view input) {
+  const Inside inside;
+  const device::Buffer exact(input);
+  check_encoders(exact.bytes(), static_cast<uint32_t>(input.size()));
+  check_decoders(exact.bytes(), static_cast<uint32_t>(input.size()));
 }
 
-std::string decode_slice_to_text(std::string_view text) {
-  const fuzz::ExactBytes exact(text);
-  uint8_t *bytes = nullptr;
-  const uint32_t len = base64urlDecodeStringAddEndZeroV2(
-      reinterpret_cast<const char *>(exact.get()), static_cast<uint32_t>(text.size()), &bytes);
-  require(bytes != nullptr && bytes[len] == 0, "a NUL stands behind a text");
-  return fuzz::take_bytes(bytes, len);
-}
-
-void check_encoders(std::string_view bytes) {
-  const fuzz::ExactBytes exact(bytes);
-  const auto len = static_cast<uint32_t>(bytes.size());
-  const std::string text = fuzz::take_text(base64EncodeAddEndZero(exact.get(), len));
-  const std::string url = fuzz::take_text(base64urlEncodeAddEndZero(exact.get(), len));
-  require(text == encode_with_openssl(bytes), "the encoding is OpenSSL's");
-  require(url == as_url(text), "the URL encoding differs by its alphabet and padding");
-  require(decode(text) == bytes && decode_url(url) == bytes, "what was encoded is decoded");
-}
-
-void check_decoders(std::string_view text) {
-  const std::string_view to_nul = text.substr(0, text.find('\0'));
-  require(decode(to_nul) == decode_plainly(to_nul, false), "base64 is read as it stands");
-  require(decode_url(to_nul) == decode_plainly(to_nul, true), "base64url is read as it stands");
-  require(decode_slice(text) == decode_plainly(text, true), "a slice is read up to its end");
-  require(decode_slice_to_text(text) == decode_plainly(text, true), "so is one that is a text");
-}
-
-}  // namespace
-
-int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-  fuzz::Inside &inside = fuzz::Inside::instance();
-  const std::string_view input = fuzz::as_view(data, size);
-  check_encoders(input);
-  check_decoders(input);
-  inside.require_clean();
-  return 0;
-}
+}  // namespace fuzz

@@ -2,65 +2,72 @@
 // A change anywhere in a signed message is found out at the signature. So messages are opened,
 // changed inside, and closed again.
 #include "support/mutation.h"
-#include "support/require.h"
 #include "support/sealed_request.h"
 #include "tsm/dsi.h"
 #include "tsm/jwe.h"
 
-using namespace fuzz;
+namespace fuzz {
+
+using tsm::ContentCipher;
 using tsm::Json;
 
-namespace {
+constexpr size_t kWordLen = 4;
 
-void mutate_content(OpenedRequest *request, size_t max_len, Random &random) {
-  static const tsm::RsaKey tee_key = stored_device().tee_key();
-  request->content = mutate_json(*request->content, max_len, random);
-  const auto cipher =
-      random.one_in(4) ? tsm::ContentCipher::kA128Gcm : tsm::ContentCipher::kA128CbcHs256;
-  (*request->members())["content"] =
-      tsm::jwe_encrypt(tee_key, *request->content, {.cipher = cipher});
-}
-
-void mutate_image(OpenedRequest *request, size_t max_len) {
-  static const tsm::RsaKey aik = tsm::find_aik(stored_device().dsi(), "bank").value();
-  const std::string image = mutate_bytes(std::string(64, 'i'), max_len);
-  (*request->members())["encrypted_ta"] =
-      tsm::encrypted_ta(aik, image, tsm::image_member(request->message->id));
-}
-
-std::string taid_of(const OpenedRequest &request) {
-  const auto content = tsm::parse_json(request.content.value_or(""));
-  const std::string *taid = content ? tsm::find_string(*content, "taid") : nullptr;
-  return taid == nullptr ? "" : *taid;
-}
-
-std::string mutate_message(const std::string &text, size_t max_len, Random &random) {
-  std::optional<OpenedRequest> request = open_request(text);
-  if (!request || random.one_in(4)) return mutate_json(text, max_len, random);
-  if (request->content && !random.one_in(3)) {
-    mutate_content(&*request, max_len, random);
-    request->payload = tsm::serialize_as_device(request->tbs);
-  } else if (request->members() != nullptr && random.one_in(4) &&
-             !tsm::image_member(request->message->id).empty()) {
-    mutate_image(&*request, max_len / 4);
-    request->payload = tsm::serialize_as_device(request->tbs);
-  } else {
-    request->payload = mutate_json(request->payload, max_len, random);
+static const tsm::Message *message_of_request(const Json &envelope) {
+  const std::string name =
+      envelope.is_object() && envelope.size() == 1 ? envelope.begin().key() : "";
+  for (const tsm::Message &message : tsm::messages()) {
+    if (message.request == name && !message.tbs_request.empty()) return &message;
   }
-  return seal_payload(*request->message, request->payload, taid_of(*request));
+  return nullptr;
 }
 
-}  // namespace
-
-extern "C" size_t LLVMFuzzerCustomMutator(uint8_t *data, size_t size, size_t max_size,
-                                          unsigned seed) {
-  Random random(seed);
-  const std::string_view input = as_view(data, size);
-  std::optional<Frame> frame = parse_frame(input);
-  if (!frame || random.one_in(8)) return give(mutate_bytes(input, max_size), data, max_size);
-  frame->text = mutate_message(frame->text, max_size, random);
-  if (random.one_in(16)) frame->message_id = static_cast<uint32_t>(1 + random.below(8));
-  const std::string mutated = serialize_frame(*frame);
-  if (mutated.size() > max_size) return give(mutate_bytes(input, max_size), data, max_size);
-  return give(mutated, data, max_size);
+// The content's "taid", over which a message with an image is signed a second time.
+static std::string mutate_content(Json *content, size_t max_len, Random &random) {
+  static const tsm::RsaKey tee_key = stored_device().tee_key();
+  std::string text = tsm::jwe_decrypt(tee_key, *content).value_or("");
+  if (!text.empty() && !random.one_in(3)) {
+    text = mutate_json(text, max_len, random);
+    const auto cipher = random.one_in(4) ? ContentCipher::kA128Gcm : ContentCipher::kA128CbcHs256;
+    *content = tsm::jwe_encrypt(tee_key, text, {.cipher = cipher});
+  }
+  return taid_of(text);
 }
+
+static std::string mutate_message(const std::string &text, size_t max_len, Random &random) {
+  static const tsm::RsaKey aik = tsm::find_aik(stored_device().dsi(), "bank").value();
+  const Json root = tsm::parse_json(text).value_or(nullptr);
+  const tsm::Message *message = message_of_request(root);
+  const std::string *encoded = message ? tsm::find_string(*root.begin(), "payload") : nullptr;
+  const auto payload = encoded ? tsm::base64url_decode(*encoded) : std::nullopt;
+  const auto tbs = payload ? tsm::parse_json(*payload) : std::nullopt;
+  const Json *found = tbs ? tsm::find_object(*tbs, message->tbs_request) : nullptr;
+  if (found == nullptr || random.one_in(4)) return mutate_json(text, max_len, random);
+
+  Json members = *found;
+  std::string taid;
+  if (tsm::find_object(members, "content")) {
+    taid = mutate_content(&members["content"], max_len, random);
+  }
+  const std::string_view image_name = tsm::image_member(message->id);
+  if (!image_name.empty() && random.one_in(4)) {
+    const std::string image = mutate_bytes(std::string(64, 'i'), max_len / 4);
+    members["encrypted_ta"] = tsm::encrypted_ta(aik, image, image_name);
+  }
+  std::string changed = tsm::serialize_as_device({{std::string(message->tbs_request), members}});
+  if (members == *found) changed = mutate_json(*payload, max_len, random);
+  return seal_payload(*message, changed, taid);
+}
+
+// The message is the text that ends the frame; its ID and its length stand before it.
+std::string mutate(std::string_view input, size_t max_len, Random &random) {
+  const size_t at = input.find('{');
+  if (at == std::string_view::npos || at < 2 * kWordLen) return "";
+  const std::string text = mutate_message(std::string(input.substr(at)), max_len, random);
+  const std::string head(input.substr(0, at - 2 * kWordLen));
+  const std::string id = random.one_in(16) ? tsm::little_endian(1 + random.below(8), kWordLen)
+                                           : std::string(input.substr(head.size(), kWordLen));
+  return head + id + tsm::little_endian(text.size(), kWordLen) + text;
+}
+
+}  // namespace fuzz

@@ -5,17 +5,17 @@
 #include <algorithm>
 
 #include "support/mutation.h"
-#include "support/require.h"
 #include "support/stored_device.h"
 #include "tsm/jwe.h"
 
-using namespace fuzz;
+namespace fuzz {
 
-namespace {
+using tsm::ContentCipher;
+using tsm::Json;
 
-tsm::JweOptions mutated_options(Random &random) {
+static tsm::JweOptions mutated_options(Random &random) {
   tsm::JweOptions options;
-  if (random.one_in(2)) options.cipher = tsm::ContentCipher::kA128Gcm;
+  if (random.one_in(2)) options.cipher = ContentCipher::kA128Gcm;
   if (random.one_in(4)) {
     const std::string header(tsm::protected_header_of(options.cipher));
     options.protected_header = random.one_in(2) ? header.substr(0, random.below(header.size()))
@@ -24,46 +24,32 @@ tsm::JweOptions mutated_options(Random &random) {
   return options;
 }
 
-// RFC 7518, 5.2.2.1.
-std::string cbc_tag(const std::string &mac_key, const std::string &signed_text) {
-  uint8_t digest[32];
-  HMAC(EVP_sha256(), mac_key.data(), static_cast<int>(mac_key.size()),
-       reinterpret_cast<const uint8_t *>(signed_text.data()), signed_text.size(), digest, nullptr);
-  return {reinterpret_cast<const char *>(digest), sizeof digest / 2};
-}
-
-// Any bytes and any IV under a tag that is right: what comes out has no good padding, if it can be
-// decrypted at all.
-tsm::Json with_right_tag(std::string_view ciphertext, Random &random) {
-  const auto cipher = tsm::ContentCipher::kA128CbcHs256;
-  const std::string cek = tsm::random_bytes(tsm::cek_len(cipher));
-  const std::string iv =
-      tsm::random_bytes(random.one_in(2) ? tsm::iv_len(cipher) : random.below(20));
-  const std::string header(tsm::protected_header_of(cipher));
+// Any bytes and any IV under a tag that is right (RFC 7518, 5.2.2.1): what comes out has no good
+// padding, if it can be decrypted at all.
+static Json with_right_tag(const tsm::RsaKey &key, const std::string &ciphertext, Random &random) {
+  const std::string cek = tsm::random_bytes(32);
+  const std::string iv = tsm::random_bytes(random.one_in(2) ? 16 : random.below(20));
+  const std::string header(tsm::protected_header_of(ContentCipher::kA128CbcHs256));
   const std::string aad = tsm::base64url_encode(header);
   std::string aad_bits = tsm::little_endian(8 * aad.size(), 8);
   std::ranges::reverse(aad_bits);
-  const std::string tag = cbc_tag(cek.substr(0, 16), aad + iv + std::string(ciphertext) + aad_bits);
-  return tsm::jwe_object(header, tsm::rsa1_5_encrypt(stored_device().tsm.key, cek), iv,
-                         {std::string(ciphertext), tag});
+  const std::string signed_text = aad + iv + ciphertext + aad_bits;
+  uint8_t digest[32];
+  HMAC(EVP_sha256(), cek.data(), 16, reinterpret_cast<const uint8_t *>(signed_text.data()),
+       signed_text.size(), digest, nullptr);
+  const std::string tag(reinterpret_cast<const char *>(digest), 16);
+  return tsm::jwe_object(header, tsm::rsa1_5_encrypt(key, cek), iv, {ciphertext, tag});
 }
 
-}  // namespace
-
-extern "C" size_t LLVMFuzzerCustomMutator(uint8_t *data, size_t size, size_t max_size,
-                                          unsigned seed) {
-  Random random(seed);
-  const std::string_view input = as_view(data, size);
-  const std::optional<tsm::Json> jwe = tsm::parse_json(input);
-  const auto opened = jwe ? tsm::jwe_decrypt(stored_device().tsm.key, *jwe) : std::nullopt;
-  if (!opened || random.one_in(3)) {
-    return give(mutate_json(input, max_size, random), data, max_size);
-  }
-  const std::string plaintext = mutate_json(*opened, max_size / 2, random);
-  const tsm::Json mutated = random.one_in(8) ? with_right_tag(plaintext, random)
-                                             : tsm::jwe_encrypt(stored_device().tsm.key, plaintext,
-                                                                mutated_options(random));
-  const std::string text = mutated.dump();
-  if (text.size() > max_size) return give(mutate_json(input, max_size, random), data, max_size);
-  return give(text, data, max_size);
+std::string mutate(std::string_view input, size_t max_len, Random &random) {
+  static const tsm::RsaKey key = stored_device().tee_key();
+  const std::optional<Json> jwe = tsm::parse_json(input);
+  const auto opened = jwe ? tsm::jwe_decrypt(key, *jwe) : std::nullopt;
+  if (!opened || random.one_in(3)) return mutate_json(input, max_len, random);
+  const std::string plaintext = mutate_json(*opened, max_len / 2, random);
+  const Json mutated = random.one_in(8) ? with_right_tag(key, plaintext, random)
+                                        : tsm::jwe_encrypt(key, plaintext, mutated_options(random));
+  return mutated.dump();
 }
+
+}  // namespace fuzz

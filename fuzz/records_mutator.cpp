@@ -2,17 +2,13 @@
 // Records change as documents, and the key boxes in them as bytes; the length in front stays right
 // more often than not.
 #include "support/mutation.h"
-#include "support/record_list.h"
-#include "support/require.h"
 #include "support/stored_device.h"
 
-using namespace fuzz;
-
-namespace {
+namespace fuzz {
 
 constexpr size_t kLengthLen = 4;
 
-std::string mutate_aik(const std::string &text, Random &random) {
+static std::string mutate_payload(const std::string &text, Random &random) {
   std::optional<tsm::Json> record = tsm::parse_json(text);
   const std::string *aik = record ? tsm::find_string(*record, "aik") : nullptr;
   const auto box = aik == nullptr ? std::nullopt : tsm::base64_decode(*aik);
@@ -21,35 +17,29 @@ std::string mutate_aik(const std::string &text, Random &random) {
   return tsm::serialize_as_device(*record);
 }
 
-void mutate_data(std::string *data, Random &random) {
-  if (data->size() < kLengthLen || random.one_in(8)) {
-    *data = mutate_bytes(*data, data->size() + 16);
-    return;
-  }
-  std::string prefix = data->substr(0, kLengthLen);
-  const std::string payload = mutate_aik(data->substr(kLengthLen), random);
-  if (!random.one_in(8)) prefix = tsm::little_endian(payload.size(), kLengthLen);
-  *data = prefix + payload;
+static std::string mutate_data(const std::string &data, Random &random) {
+  if (data.size() < kLengthLen || random.one_in(8)) return mutate_bytes(data, data.size() + 16);
+  const std::string payload = mutate_payload(data.substr(kLengthLen), random);
+  const bool keeps_length = random.one_in(8);
+  return (keeps_length ? data.substr(0, kLengthLen)
+                       : tsm::little_endian(payload.size(), kLengthLen)) +
+         payload;
 }
 
-}  // namespace
-
-extern "C" size_t LLVMFuzzerCustomMutator(uint8_t *data, size_t size, size_t max_size,
-                                          unsigned seed) {
-  Random random(seed);
-  std::vector<StoredRecord> records = parse_records(as_view(data, size));
-  if (random.one_in(16)) return give(mutate_bytes(as_view(data, size), max_size), data, max_size);
-  if (records.empty() || random.one_in(16)) {
-    const Objects &agent = stored_device().agent;
-    auto object = agent.begin();
-    std::advance(object, random.below(agent.size()));
-    records.push_back({object->first, object->second});
-  }
-  StoredRecord &record = records[random.below(records.size())];
+std::string mutate(std::string_view input, size_t, Random &random) {
+  Objects objects = parse_objects(input);
+  const bool takes_another = objects.empty() || random.one_in(16);
+  const Objects &all = takes_another ? stored_device().agent : objects;
+  auto [id, data] = std::pair<std::string, std::string>(
+      *std::next(all.begin(), static_cast<ptrdiff_t>(random.below(all.size()))));
+  objects.erase(id);
   if (random.one_in(16)) {
-    record.id = mutate_bytes(record.id, 64);
+    id = mutate_bytes(id, 64);
   } else {
-    mutate_data(&record.data, random);
+    data = mutate_data(data, random);
   }
-  return give(serialize_records(records), data, max_size);
+  objects[id] = data;
+  return serialize_objects(objects);
 }
+
+}  // namespace fuzz

@@ -7,13 +7,12 @@
 #include "support/inside.h"
 #include "tsm/json.h"
 
-namespace {
+namespace fuzz {
 
-using fuzz::require;
 using tsm::Json;
 
-std::optional<std::string_view> look_up(const jsmn_object *object, const char *key,
-                                        std::string_view text) {
+static std::optional<std::string_view> look_up(const jsmn_object *object, const char *key,
+                                               std::string_view text) {
   const slice_ptr slice(jsmn_object_get_string(object, key));
   require(slice != nullptr, "there is memory for a slice");
   if (slice->data == nullptr) return std::nullopt;
@@ -24,7 +23,7 @@ std::optional<std::string_view> look_up(const jsmn_object *object, const char *k
 }
 
 // In strict JSON the first member's name leads to its value.
-void check_first_member(const jsmn_object *object, std::string_view text) {
+static void check_first_member(const jsmn_object *object, std::string_view text) {
   if (text.find('\\') != std::string_view::npos) return;  // escapes are not undone
   const std::optional<Json> document = tsm::parse_json(text);
   if (!document || document->empty()) return;
@@ -39,30 +38,22 @@ void check_first_member(const jsmn_object *object, std::string_view text) {
   require(tsm::parse_json(quote + std::string(*found) + quote) == value, "a member has its value");
 }
 
-}  // namespace
-
-int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-  fuzz::Inside &inside = fuzz::Inside::instance();
-  const std::string_view input = fuzz::as_view(data, size);
+void check(std::string_view input) {
+  const Inside inside;
   const std::string_view key_line = input.substr(0, input.find('\n'));
-  const std::string_view rest = input.substr(std::min(input.size(), key_line.size() + 1));
-  const fuzz::ExactText key(key_line);
-  const fuzz::ExactBytes exact(rest);
-  const jsmn_string slice = {reinterpret_cast<const char *>(exact.get()),
-                             static_cast<uint32_t>(rest.size())};
-  const std::string_view text(slice.data, slice.len);
-  {
-    const token_object_ptr object(jsmn_init_object(&slice));
-    if (object) {
-      require(object->count >= 1, "an object is a token itself");
-      for (const char *name : {key.get(), "header", "tsmid", "payload", ""}) {
-        const auto value = look_up(object.get(), name, text);
-        const token_object_ptr inner(jsmn_object_get_object(object.get(), name));
-        if (inner) look_up(inner.get(), key.get(), *value);
-      }
-      check_first_member(object.get(), text);
-    }
+  const ExactText key(key_line);
+  const device::Buffer exact(input.substr(std::min(input.size(), key_line.size() + 1)));
+  const std::string_view text = exact.bytes();
+  const jsmn_string slice = {text.data(), static_cast<uint32_t>(text.size())};
+  const token_object_ptr object(jsmn_init_object(&slice));
+  if (!object) return;
+  require(object->count >= 1, "an object is a token itself");
+  for (const char *name : {key.get(), "header", "tsmid", "payload", ""}) {
+    const auto value = look_up(object.get(), name, text);
+    const token_object_ptr inner(jsmn_object_get_object(object.get(), name));
+    if (inner) look_up(inner.get(), key.get(), *value);
   }
-  inside.require_clean();
-  return 0;
+  check_first_member(object.get(), text);
 }
+
+}  // namespace fuzz

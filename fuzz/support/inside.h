@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The agent's functions called directly, from inside an instance that lives as long as the
-/// process.
+/// The agent's functions called directly, from inside an instance.
 #ifndef FUZZ_INSIDE_H
 #define FUZZ_INSIDE_H
 
@@ -8,56 +7,55 @@
 
 #include <string>
 
+#include "device/device_client.h"
 #include "ownership.h"
 #include "support/require.h"
 
 namespace fuzz {
 
+/// While it lives, a run of a target: it happens in an instance that lives as long as the process,
+/// and leaves nothing behind.
 class Inside {
  public:
-  static Inside &instance() {
-    static Inside inside;
-    return inside;
-  }
-
-  /// What every run leaves behind: nothing.
-  void require_clean() {
-    const tee_heap_stats now = inside_.stats();
+  Inside() : world_(world()) {}
+  ~Inside() {
+    const tee_heap_stats now = world_.inside.stats();
     require(now.live_blocks == 0, "no block is left on the heap");
     require(now.open_objects == 0 && now.open_operations == 0, "no handle is left open");
-    log_.clear();
+    world_.log.clear();
   }
 
  private:
-  tee::test::Device device_;
-  tee::test::InsideTa inside_{device_};
-  tee::test::TraceSink log_;
+  struct World {
+    tee::test::Device device;
+    tee::test::InsideTa inside{device};
+    tee::test::TraceSink log;
+  };
+  static World &world() {
+    static World world;
+    return world;
+  }
+
+  World &world_;
 };
 
 /// A NUL-terminated copy of exact size, so that the sanitizer sees a character too far.
 class ExactText {
  public:
-  explicit ExactText(std::string_view text) : text_(new char[text.size() + 1]) {
-    text.copy(text_.get(), text.size());
-    text_[text.size()] = 0;
-  }
-  const char *get() const { return text_.get(); }
+  explicit ExactText(std::string_view text) : text_(std::string(text) + '\0') {}
+  const char *get() const { return text_.bytes().data(); }
 
  private:
-  std::unique_ptr<char[]> text_;
+  device::Buffer text_;
 };
 
-/// The same for bytes, without the NUL.
-class ExactBytes {
- public:
-  explicit ExactBytes(std::string_view bytes) : bytes_(new uint8_t[bytes.size()]) {
-    bytes.copy(reinterpret_cast<char *>(bytes_.get()), bytes.size());
-  }
-  const uint8_t *get() const { return bytes_.get(); }
+inline const uint8_t *u8(std::string_view bytes) {
+  return reinterpret_cast<const uint8_t *>(bytes.data());
+}
 
- private:
-  std::unique_ptr<uint8_t[]> bytes_;
-};
+inline std::string_view as_view(const uint8_t *data, size_t size) {
+  return {reinterpret_cast<const char *>(data), size};
+}
 
 /// Takes over a text of the agent.
 inline std::string take_text(char *text) {
@@ -69,7 +67,7 @@ inline std::string take_text(char *text) {
 /// Takes over `len` bytes of the agent.
 inline std::string take_bytes(uint8_t *bytes, uint32_t len) {
   const tee_ptr<uint8_t> owner(bytes);
-  return {reinterpret_cast<const char *>(bytes), len};
+  return std::string(as_view(bytes, len));
 }
 
 }  // namespace fuzz

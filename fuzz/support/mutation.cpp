@@ -21,51 +21,16 @@ const char *const kNames[] = {
     "key",      "name",     "payload",       "protect",      "recipients", "renewteespaik",
     "rid",      "sd",       "sdname",        "signature",    "signature2", "spaiktype",
     "spcert",   "spid",     "ta_version",    "tag",          "taid",       "talist",
-    "tid",      "tsm_list", "tsm_pub_key",   "tsmid",        "ver",        "",
-};
+    "tid",      "tsm_list", "tsm_pub_key",   "tsmid",        "ver",        ""};
 
-const char *const kTexts[] = {
-    "",
-    "true",
-    "false",
-    "bank",
-    "rail",
-    "wallet",
-    "cards",
-    "tickets",
-    "tsm1",
-    "tsm2",
-    "\x01",
-    "/",
-    "\"",
-    "\xC3\xA9",
-    "77a11e7a000000000000000000000001",
-    "71cce700000000000000000000000002",
-};
+const Json kValues = Json::parse(R"([
+    null, true, false, -2, 0, 1, 1e300, [], {}, "", "true", "false", "bank", "rail", "wallet",
+    "cards", "tickets", "tsm1", "tsm2", "\u0001", "/", "\"", "\u00e9",
+    "77a11e7a000000000000000000000001", "71cce700000000000000000000000002"])");
 
-std::string name(Random &random) {
-  return kNames[random.below(std::size(kNames))];
-}
-
-Json value(Random &random) {
-  switch (random.below(8)) {
-    case 0:
-      return nullptr;
-    case 1:
-      return random.one_in(2);
-    case 2:
-      return static_cast<int64_t>(random.below(5)) - 2;
-    case 3:
-      return 1e300;
-    case 4:
-      return Json::array();
-    case 5:
-      return Json::object();
-    case 6:
-      return std::string(random.below(200), 'x');
-    default:
-      return kTexts[random.below(std::size(kTexts))];
-  }
+template <class List>
+auto &one_of(List &list, Random &random) {
+  return *std::next(std::begin(list), static_cast<ptrdiff_t>(random.below(std::size(list))));
 }
 
 void collect(Json &node, std::vector<Json *> *nodes) {
@@ -75,69 +40,55 @@ void collect(Json &node, std::vector<Json *> *nodes) {
 }
 
 // Encoded bytes change as bytes, and stay encoded.
-void mutate_string(Json *node, Random &random) {
-  const std::string text = node->get<std::string>();
-  const std::optional<tsm::Bytes> bytes =
-      random.one_in(2) ? tsm::base64url_decode(text) : std::nullopt;
-  if (bytes && !bytes->empty()) {
-    *node = tsm::base64url_encode(mutate_bytes(*bytes, bytes->size() + kMaxGrowth));
-  } else {
-    *node = mutate_bytes(text, text.size() + kMaxGrowth);
-  }
+std::string mutate_string(const std::string &text, Random &random) {
+  const auto bytes = random.one_in(2) ? tsm::base64url_decode(text) : std::nullopt;
+  if (!bytes || bytes->empty()) return mutate_bytes(text, text.size() + kMaxGrowth);
+  return tsm::base64url_encode(mutate_bytes(*bytes, bytes->size() + kMaxGrowth));
 }
 
 void mutate_object(Json *node, Random &random) {
   if (node->empty() || random.one_in(3)) {
-    (*node)[name(random)] = value(random);
+    (*node)[one_of(kNames, random)] = one_of(kValues, random);
     return;
   }
-  auto member = node->begin();
-  std::advance(member, random.below(node->size()));
-  const std::string old_name = member.key();
+  const auto member = std::next(node->begin(), static_cast<ptrdiff_t>(random.below(node->size())));
   Json moved = *member;
   if (random.one_in(2)) node->erase(member);
-  if (random.one_in(2)) (*node)[name(random)] = std::move(moved);
+  if (random.one_in(2)) (*node)[one_of(kNames, random)] = std::move(moved);
 }
 
 void mutate_array(Json *node, Random &random) {
   if (node->empty() || random.one_in(3)) {
-    node->push_back(value(random));
-    return;
-  }
-  const size_t index = random.below(node->size());
-  if (random.one_in(2)) {
-    node->erase(index);
+    node->push_back(one_of(kValues, random));
+  } else if (random.one_in(2)) {
+    node->erase(random.below(node->size()));
   } else {
-    node->push_back(Json((*node)[index]));
+    node->push_back(Json(one_of(*node, random)));
   }
 }
 
 void mutate_node(const std::vector<Json *> &nodes, Random &random) {
-  Json *node = nodes[random.below(nodes.size())];
+  Json *node = one_of(nodes, random);
   if (random.one_in(6)) {
-    *node = value(random);
-  } else if (random.one_in(6)) {
-    const Json other = *nodes[random.below(nodes.size())];
-    *node = other;
+    *node = Json(*one_of(nodes, random));
+  } else if (node->is_primitive() && (!node->is_string() || random.one_in(6))) {
+    *node = one_of(kValues, random);
   } else if (node->is_string()) {
-    mutate_string(node, random);
+    *node = mutate_string(node->get<std::string>(), random);
   } else if (node->is_object()) {
     mutate_object(node, random);
-  } else if (node->is_array()) {
-    mutate_array(node, random);
   } else {
-    *node = value(random);
+    mutate_array(node, random);
   }
 }
 
 }  // namespace
 
 std::string mutate_bytes(std::string_view bytes, size_t max_len) {
-  max_len = std::max<size_t>(max_len, 1);
   std::string work(bytes.substr(0, max_len));
   const size_t len = work.size();
-  work.resize(max_len);
-  work.resize(LLVMFuzzerMutate(reinterpret_cast<uint8_t *>(work.data()), len, max_len));
+  work.resize(std::max<size_t>(max_len, 1));
+  work.resize(LLVMFuzzerMutate(reinterpret_cast<uint8_t *>(work.data()), len, work.size()));
   return work;
 }
 
@@ -152,8 +103,13 @@ std::string mutate_json(std::string_view text, size_t max_len, Random &random) {
   return tsm::serialize_as_device(*document);
 }
 
-size_t give(std::string_view bytes, uint8_t *data, size_t max_size) {
-  return bytes.copy(reinterpret_cast<char *>(data), max_size);
-}
-
 }  // namespace fuzz
+
+extern "C" size_t LLVMFuzzerCustomMutator(uint8_t *data, size_t size, size_t max_size,
+                                          unsigned seed) {
+  fuzz::Random random(seed);
+  const std::string_view input(reinterpret_cast<const char *>(data), size);
+  std::string mutated = random.one_in(8) ? "" : fuzz::mutate(input, max_size, random);
+  if (mutated.empty() || mutated.size() > max_size) mutated = fuzz::mutate_bytes(input, max_size);
+  return mutated.copy(reinterpret_cast<char *>(data), max_size);
+}

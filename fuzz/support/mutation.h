@@ -21,14 +21,15 @@ class Random {
   std::minstd_rand engine_;
 };
 
+/// What a target's mutator defines: changes an input. One that is longer than `max_len` counts for
+/// nothing.
+std::string mutate(std::string_view input, size_t max_len, Random &random);
+
 /// What the fuzzer itself does to bytes.
 std::string mutate_bytes(std::string_view bytes, size_t max_len);
 
 /// Changes one thing about a JSON text: its bytes, or a member, an element, a name or a value.
 std::string mutate_json(std::string_view text, size_t max_len, Random &random);
-
-/// Hands a mutator's work to the fuzzer. What is too long is cut.
-size_t give(std::string_view bytes, uint8_t *data, size_t max_size);
 
 }  // namespace fuzz
 

@@ -2,65 +2,57 @@
 #include "support/stored_device.h"
 
 #include "common/files.h"
-#include "tsm/dsi.h"
 #include "tsm/trust.h"
 
 namespace fuzz {
-namespace {
 
 using tsm::Json;
 
-constexpr size_t kDeviceIdLen = 32;
+// The key service's one object: the device ID, and a box with the TEE key.
 const char kIdentityId[] = "IDENTITY";
+constexpr size_t kDeviceIdLen = 32;
 
-Json json_of(const Objects &objects) {
-  Json json = Json::object();
-  for (const auto &[id, data] : objects) json[id] = tsm::base64url_encode(data);
-  return json;
+static size_t little_endian_at(std::string_view bytes, size_t at) {
+  return static_cast<uint8_t>(bytes.at(at)) | size_t{static_cast<uint8_t>(bytes.at(at + 1))} << 8;
 }
 
-Objects objects_of(const Json &json) {
+Objects parse_objects(std::string_view bytes) {
   Objects objects;
-  for (const auto &[id, data] : json.items()) {
-    objects[id] = tsm::base64url_decode(data.get<std::string>()).value();
+  for (;;) {
+    const size_t id_len = bytes.empty() ? 0 : static_cast<uint8_t>(bytes[0]);
+    const size_t data_at = 1 + id_len + 2;
+    if (bytes.size() < data_at) return objects;
+    const size_t data_len = little_endian_at(bytes, 1 + id_len);
+    if (bytes.size() < data_at + data_len) return objects;
+    objects[std::string(bytes.substr(1, id_len))] = bytes.substr(data_at, data_len);
+    bytes.remove_prefix(data_at + data_len);
   }
-  return objects;
 }
 
-StoredDevice read_stored_device(const std::string &path) {
-  const Json file = tsm::parse_json(tools::read_file(path)).value();
-  const auto key = tsm::RsaKey::from_pem(file.at("tsm_key").get<std::string>()).value();
-  return {admitted(file.at("tsmid").get<std::string>(), key), file.at("dsi").get<std::string>(),
-          objects_of(file.at("agent")), objects_of(file.at("key_service"))};
-}
-
-}  // namespace
-
-Json StoredDevice::dsi() const {
-  return tsm::parse_json(dsi_text).value();
-}
-
-std::string StoredDevice::dsihash() const {
-  return tsm::dsi_hash_of_text(dsi_text);
+std::string serialize_objects(const Objects &objects) {
+  std::string bytes;
+  for (const auto &[id, data] : objects) {
+    bytes += tsm::little_endian(id.size(), 1) + id + tsm::little_endian(data.size(), 2) + data;
+  }
+  return bytes;
 }
 
 std::string StoredDevice::device_id() const {
   return key_service.at(kIdentityId).substr(0, kDeviceIdLen);
 }
 
-tsm::RsaKey StoredDevice::tee_key() const {
-  return tee_key_of(key_service);
+std::string tee_key_box_of(const Objects &key_service) {
+  return key_service.at(kIdentityId).substr(kDeviceIdLen);
 }
 
-// Behind the device ID stand the modulus and the two exponents, each behind its type and length.
+// Modulus and the two exponents, each behind its type and length.
 tsm::RsaKey tee_key_of(const Objects &key_service) {
-  std::string_view left = std::string_view(key_service.at(kIdentityId)).substr(kDeviceIdLen);
-  std::string_view numbers[3];
-  for (std::string_view &number : numbers) {
-    const size_t low = static_cast<uint8_t>(left.at(2));
-    const size_t len = low | size_t{static_cast<uint8_t>(left.at(3))} << 8;
-    number = left.substr(4, len);
-    left.remove_prefix(4 + len);
+  const std::string box = tee_key_box_of(key_service);
+  std::string numbers[3];
+  size_t at = 0;
+  for (std::string &number : numbers) {
+    number = box.substr(at + 4, little_endian_at(box, at + 2));
+    at += 4 + number.size();
   }
   return tsm::RsaKey::from_numbers(numbers[0], numbers[1], numbers[2]).value();
 }
@@ -71,11 +63,19 @@ const tsm::RsaKey &dev_ca() {
   return key;
 }
 
-tsm::Identity admitted(const std::string &tsmid, const tsm::RsaKey &key) {
-  return {
-      tsmid, key,
-      tsm::key_chain(tsm::ca_tsm_hash(dev_ca()), {tsm::tsm_entry(dev_ca(), tsmid, key.encoded())}),
-      dev_ca()};
+tsm::Identity admitted(const tsm::RsaKey &key) {
+  const Json entry = tsm::tsm_entry(dev_ca(), "tsm1", key.encoded());
+  return {"tsm1", key, tsm::key_chain(tsm::ca_tsm_hash(dev_ca()), {entry}), dev_ca()};
+}
+
+static StoredDevice read_stored_device(const std::string &path) {
+  const Json file = tsm::parse_json(tools::read_file(path)).value();
+  const auto text = [&file](const char *name) { return file.at(name).get<std::string>(); };
+  const auto objects = [&text](const char *name) {
+    return parse_objects(tsm::base64_decode(text(name)).value());
+  };
+  return {admitted(tsm::RsaKey::from_pem(text("tsm_key")).value()), text("dsi"), objects("agent"),
+          objects("key_service")};
 }
 
 const StoredDevice &stored_device() {
@@ -84,11 +84,10 @@ const StoredDevice &stored_device() {
 }
 
 void write_stored_device(const StoredDevice &device, const std::string &path) {
-  const Json file = {{"tsmid", device.tsm.tsmid},
-                     {"tsm_key", device.tsm.key.private_pem()},
+  const Json file = {{"tsm_key", device.tsm.key.private_pem()},
                      {"dsi", device.dsi_text},
-                     {"agent", json_of(device.agent)},
-                     {"key_service", json_of(device.key_service)}};
+                     {"agent", tsm::base64_encode(serialize_objects(device.agent))},
+                     {"key_service", tsm::base64_encode(serialize_objects(device.key_service))}};
   tools::write_file(path, file.dump(1) + "\n");
 }
 

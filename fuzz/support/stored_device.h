@@ -16,7 +16,19 @@ namespace fuzz {
 
 using Objects = std::map<std::string, std::string>;  // ID to raw data stream
 
+/// Objects as one input:
+///
+///     ID length (1) | ID | data length (2, little-endian) | data | more objects
+///
+/// Read up to the first one that is cut short.
+Objects parse_objects(std::string_view bytes);
+std::string serialize_objects(const Objects &objects);
+
 constexpr int kKeyBits = 512;
+
+/// The TEE key as the key service stores it: as a box of records, and with its private half.
+std::string tee_key_box_of(const Objects &key_service);
+tsm::RsaKey tee_key_of(const Objects &key_service);
 
 struct StoredDevice {
   tsm::Identity tsm;
@@ -24,20 +36,16 @@ struct StoredDevice {
   Objects agent;
   Objects key_service;
 
-  tsm::Json dsi() const;
-  std::string dsihash() const;
+  tsm::Json dsi() const { return tsm::parse_json(dsi_text).value(); }
   std::string device_id() const;
-  tsm::RsaKey tee_key() const;
+  tsm::RsaKey tee_key() const { return tee_key_of(key_service); }
 };
-
-/// The TEE key, with its private half, as the key service stores it.
-tsm::RsaKey tee_key_of(const Objects &key_service);
 
 /// The development CA.
 const tsm::RsaKey &dev_ca();
 
-/// The TSM `tsmid` with this key, admitted by the development CA.
-tsm::Identity admitted(const std::string &tsmid, const tsm::RsaKey &key);
+/// The TSM "tsm1" with this key, admitted by the development CA.
+tsm::Identity admitted(const tsm::RsaKey &key);
 
 const StoredDevice &stored_device();
 

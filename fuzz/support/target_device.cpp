@@ -5,11 +5,20 @@
 
 #include <algorithm>
 #include <cstring>
+#include <set>
 
 #include "state/dsi.h"
-#include "support/corvel_entry_points.h"
-#include "support/require.h"
 #include "tsm/response.h"
+
+// The key service's entry points under names of their own: the agent's are in the same program.
+extern "C" {
+TEE_Result corvel_create(void);
+void corvel_destroy(void);
+TEE_Result corvel_open(uint32_t param_types, TEE_Param params[4], void **session_context);
+void corvel_close(void *session_context);
+TEE_Result corvel_invoke(void *session_context, uint32_t command_id, uint32_t param_types,
+                         TEE_Param params[4]);
+}
 
 namespace fuzz {
 namespace {
@@ -28,13 +37,9 @@ uint32_t word_at(std::string_view bytes, size_t offset) {
 }
 
 // Compares the bytes with themselves one further on: these are long, and looked at in every run.
-bool all_alike(std::string_view bytes) {
-  return bytes.empty() || std::memcmp(bytes.data(), bytes.data() + 1, bytes.size() - 1) == 0;
-}
-
 bool untouched(std::string_view bytes) {
-  return all_alike(bytes) &&
-         (bytes.empty() || static_cast<uint8_t>(bytes.front()) == device::kUntouched);
+  return bytes.empty() || (static_cast<uint8_t>(bytes.front()) == device::kUntouched &&
+                           std::memcmp(bytes.data(), bytes.data() + 1, bytes.size() - 1) == 0);
 }
 
 // Where the payload stood there are zeros, up to where it ended.
@@ -43,46 +48,25 @@ bool wiped_or_untouched(std::string_view bytes) {
   return end == std::string_view::npos || untouched(bytes.substr(end));
 }
 
-tsm::Envelope verified(std::string_view response, const tsm::RsaKey &tee_key) {
-  try {
-    tsm::Envelope envelope = tsm::parse_envelope(response);
-    // An AIK signs what GetTAInfo answers.
-    require(envelope.message->id == tsm::MessageId::kGetTaInfo ||
-                tsm::signature_verifies(envelope, tee_key),
-            "a response's signature verifies");
-    return envelope;
-  } catch (const tsm::NotVerified &error) {
-    require(false, error.what());
-    throw;
-  }
+// The response, to be verified. An answer that is not well-formed throws, which ends the process.
+std::string require_answer(const device::Reply &reply, std::string_view output) {
+  const device::Answer answer = device::parse_answer(output, reply.size);
+  const size_t image_len = answer.image ? kWordLen + answer.image->size() : 0;
+  const size_t end = kHeaderLen + answer.response.size() + image_len;
+  require(answer.status != TEE_SUCCESS || !answer.response.empty(), "a success has a response");
+  require(wiped_or_untouched(output.substr(end)), "nothing stands behind the answer");
+  return answer.response;
 }
 
-bool says_pass(const tsm::Envelope &envelope) {
-  const tsm::Json *tbs = tsm::find_object(envelope.payload, envelope.message->tbs_response);
+// Whether the response, which is verified, says "pass". An AIK signs what GetTAInfo answers.
+bool says_pass(std::string_view response, const tsm::RsaKey &tee_key) {
+  const tsm::Envelope envelope = tsm::parse_envelope(response);
+  const tsm::Message &message = *envelope.message;
+  require(message.id == tsm::MessageId::kGetTaInfo || tsm::signature_verifies(envelope, tee_key),
+          "a response's signature verifies");
+  const tsm::Json *tbs = tsm::find_object(envelope.payload, message.tbs_response);
   const std::string *status = tbs == nullptr ? nullptr : tsm::find_string(*tbs, "status");
   return status != nullptr && *status == "pass";
-}
-
-// `response` becomes what is to be verified.
-void require_answer(const device::Reply &reply, std::string_view output,
-                    std::string_view *response) {
-  require(output.size() >= kHeaderLen && reply.size >= kHeaderLen, "an answer has a header");
-  const uint32_t status = word_at(output, 0);
-  const size_t response_len = word_at(output, kWordLen);
-  require(response_len <= output.size() - kHeaderLen, "a response fits");
-  size_t end = kHeaderLen + response_len;
-  require(reply.size >= end, "the size covers the response");
-  *response = output.substr(kHeaderLen, response_len);
-  if (status == TEE_SUCCESS) {
-    require(response_len != 0, "a success has a response");
-    require(reply.size <= output.size(), "a success fits");
-    if (reply.size != end) {
-      require(reply.size > end + kWordLen, "an image has a length and is not empty");
-      require(word_at(output, end) == reply.size - end - kWordLen, "an image's length is right");
-      end = reply.size;
-    }
-  }
-  require(wiped_or_untouched(output.substr(end)), "nothing stands behind the answer");
 }
 
 void require_refusal(const device::Reply &reply, std::string_view output) {
@@ -108,25 +92,14 @@ void require_query_answer(const device::Reply &reply) {
   require(untouched(output.substr(reply.size)), "nothing stands behind the answer");
 }
 
-// The entries of a list, sorted: a new instance has them in the order in which they are stored.
-std::string in_any_order(const char *list) {
-  const std::optional<tsm::Json> entries = tsm::parse_json(list);
-  if (!entries) return list;
-  std::vector<std::string> texts;
-  for (const tsm::Json &entry : *entries) texts.push_back(entry.dump());
-  std::ranges::sort(texts);
-  std::string sorted;
-  for (const std::string &text : texts) sorted += text + "\n";
-  return sorted;
+// The entries of a list: a new instance has them in the order in which they are stored.
+std::multiset<tsm::Json> entries_of(const char *list) {
+  const tsm::Json entries = tsm::parse_json(list).value_or(list);
+  return {entries.begin(), entries.end()};
 }
 
-void require_clean(device::Device &door) {
-  tee_heap_stats now{};
-  const TEEC_Result found = tee_inspect_stats(door.context(), &device::kAgentUuid, &now);
-  require(found == TEEC_SUCCESS, "the instance lives on");
-  require(now.live_blocks == kDsiBlocks, "only the state document is left on the heap");
-  require(now.open_objects == 0 && now.open_operations == 0 && now.open_sessions == 0,
-          "no handle is left open");
+std::string state() {
+  return std::string(g_dsi->sdl_json_str) + g_dsi->spl_json_str + g_dsi->tal_json_str;
 }
 
 }  // namespace
@@ -136,14 +109,17 @@ uint32_t capacity_of(std::string_view frame) {
   return word == 0 ? kMaxCapacity : std::min(word, kMaxCapacity);
 }
 
-TargetDevice::TargetDevice(const Objects &agent, const Objects &key_service)
-    : door_(host_.name()), first_(agent) {
+TargetDevice::TargetDevice() {
   host_.register_ta({.uuid = kAgent},
                     {TA_CreateEntryPoint, TA_DestroyEntryPoint, TA_OpenSessionEntryPoint,
                      TA_CloseSessionEntryPoint, TA_InvokeCommandEntryPoint});
   host_.register_ta({.uuid = kKeyService},
                     {corvel_create, corvel_destroy, corvel_open, corvel_close, corvel_invoke});
-  for (const auto &[id, data] : key_service) host_.put_object(kKeyService, id, data);
+}
+
+TargetDevice::TargetDevice(const StoredDevice &stored) : TargetDevice() {
+  for (const auto &[id, data] : stored.key_service) host_.put_object(kKeyService, id, data);
+  first_ = stored.agent;
   store(first_);
   require(open(), "the agent starts");
   first_state_ = state();
@@ -157,8 +133,17 @@ bool TargetDevice::open() {
     require_clean_failure();
     return false;
   }
-  require_clean(door_);
+  require_clean();
   return true;
+}
+
+void TargetDevice::require_clean() {
+  tee_heap_stats now{};
+  require(tee_inspect_stats(door_.context(), &device::kAgentUuid, &now) == TEEC_SUCCESS,
+          "the instance lives on");
+  require(now.live_blocks == kDsiBlocks, "only the state document is left on the heap");
+  require(now.open_objects == 0 && now.open_operations == 0 && now.open_sessions == 0,
+          "no handle is left open");
 }
 
 // The instance is gone, and its heap with it. So the same is tried again from inside.
@@ -170,16 +155,12 @@ void TargetDevice::require_clean_failure() {
           "a start that fails leaves nothing behind");
 }
 
-void TargetDevice::close() {
-  session_.reset();
-}
-
 device::Reply TargetDevice::run(uint32_t command, std::string_view input, uint32_t capacity) {
   device::Reply reply = session_->invoke(
       {.command_id = command, .input = device::Buffer(input), .capacity = capacity});
   if (command == kMessageCommand) require_message_answer(reply);
   if (command == kQueryCommand) require_query_answer(reply);
-  require_clean(door_);
+  require_clean();
   log_.clear();
   return reply;
 }
@@ -191,28 +172,24 @@ void TargetDevice::require_message_answer(const device::Reply &reply) {
     require_refusal(reply, output);
     return;
   }
-  std::string_view response;
-  require_answer(reply, output, &response);
-  if (!response.empty()) passed_ = says_pass(verified(response, tee_key()));
-}
-
-// The key service makes it when it is first asked.
-const tsm::RsaKey &TargetDevice::tee_key() {
+  const std::string response = require_answer(reply, output);
+  if (response.empty()) return;
+  // The key service makes the key when it is first asked.
   if (!tee_key_) tee_key_ = tee_key_of(key_service_objects());
-  return *tee_key_;
+  passed_ = says_pass(response, *tee_key_);
 }
 
 void TargetDevice::store(const Objects &objects) {
-  for (const auto &[id, data] : agent_objects()) host_.remove_object(kAgent, id);
+  for (const auto &[id, data] : host_.objects(kAgent)) host_.remove_object(kAgent, id);
   for (const auto &[id, data] : objects) host_.put_object(kAgent, id, data);
 }
 
 void TargetDevice::restore() {
   if (host_.durable_writes() == writes_ && state() == first_state_) return;
-  const std::string known = in_any_order(g_dsi->sdl_json_str);
+  const std::multiset<tsm::Json> known = entries_of(g_dsi->sdl_json_str);
   close();
   require(open(), "the agent starts with what it has stored");
-  require(!passed_ || in_any_order(g_dsi->sdl_json_str) == known,
+  require(!passed_ || entries_of(g_dsi->sdl_json_str) == known,
           "a new instance knows the same security domains");
   close();
   store(first_);
@@ -226,10 +203,6 @@ Objects TargetDevice::agent_objects() const {
 
 Objects TargetDevice::key_service_objects() const {
   return host_.objects(kKeyService);
-}
-
-std::string TargetDevice::state() const {
-  return std::string(g_dsi->sdl_json_str) + g_dsi->spl_json_str + g_dsi->tal_json_str;
 }
 
 }  // namespace fuzz

@@ -10,6 +10,7 @@
 #include <optional>
 
 #include "device/device_client.h"
+#include "support/require.h"
 #include "support/stored_device.h"
 
 namespace fuzz {
@@ -24,11 +25,13 @@ uint32_t capacity_of(std::string_view frame);
 
 class TargetDevice {
  public:
-  TargetDevice(const Objects &agent, const Objects &key_service);
+  /// With the objects of `stored`, or none.
+  explicit TargetDevice(const StoredDevice &stored);
+  TargetDevice();
 
   /// False when the instance cannot be created.
   bool open();
-  void close();
+  void close() { session_.reset(); }
 
   /// A command to the open instance. Ends the process unless the answer is well-formed, the rest
   /// of the output buffer untouched, and nothing left on the heap or open but the state document.
@@ -42,19 +45,18 @@ class TargetDevice {
   /// passed the new instance must know the same security domains.
   void restore();
 
+  device::Device &door() { return door_; }
   Objects agent_objects() const;
   Objects key_service_objects() const;
-  device::Device &door() { return door_; }
 
  private:
-  std::string state() const;
+  void require_clean();
   void require_clean_failure();
   void require_message_answer(const device::Reply &reply);
-  const tsm::RsaKey &tee_key();
 
   tee::test::TraceSink log_;
   tee::test::Device host_;
-  device::Device door_;
+  device::Device door_{host_.name()};
   Objects first_;
   std::string first_state_;
   uint64_t writes_ = 0;

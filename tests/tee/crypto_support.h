@@ -3,12 +3,11 @@
 #ifndef CRYPTO_SUPPORT_H
 #define CRYPTO_SUPPORT_H
 
-#include <openssl/evp.h>
+#include <gtest/gtest.h>
 #include <tee_internal_api.h>
 #include <tee_test.h>
 
 #include <algorithm>
-#include <cstdint>
 #include <memory>
 #include <string>
 #include <type_traits>
@@ -16,27 +15,20 @@
 #include <vector>
 
 #include "../support/published_vectors.h"
+#include "common/encoding.h"
 
 using Bytes = std::vector<uint8_t>;
 
-inline Bytes from_hex(const std::string &hex) {
-  Bytes bytes;
-  for (size_t i = 0; i + 1 < hex.size(); i += 2) {
-    bytes.push_back(static_cast<uint8_t>(std::stoul(hex.substr(i, 2), nullptr, 16)));
-  }
-  return bytes;
+inline Bytes as_bytes(const std::string &text) {
+  return {text.begin(), text.end()};
 }
 
-inline Bytes from_base64url(std::string text) {
-  std::replace(text.begin(), text.end(), '-', '+');
-  std::replace(text.begin(), text.end(), '_', '/');
-  const size_t padding = (4 - text.size() % 4) % 4;
-  text.append(padding, '=');
-  Bytes bytes(text.size() / 4 * 3);
-  EVP_DecodeBlock(bytes.data(), reinterpret_cast<const uint8_t *>(text.data()),
-                  static_cast<int>(text.size()));
-  bytes.resize(bytes.size() - padding);
-  return bytes;
+inline Bytes from_hex(const std::string &hex) {
+  return as_bytes(tools::hex_decode(hex).value());
+}
+
+inline Bytes from_base64url(const std::string &text) {
+  return as_bytes(tools::base64url_decode(text).value());
 }
 
 inline uint32_t size_of(const Bytes &bytes) {
@@ -61,16 +53,16 @@ inline TEE_Result populate(TEE_ObjectHandle object, const AttributeList &attribu
   return TEE_PopulateTransientObject(object, refs.data(), static_cast<uint32_t>(refs.size()));
 }
 
+/// NULL when there is no such key.
 inline Key blank_key(uint32_t type, uint32_t max_size) {
   TEE_ObjectHandle object = TEE_HANDLE_NULL;
   TEE_AllocateTransientObject(type, max_size, &object);
   return Key(object);
 }
 
-/// NULL when the attributes are refused.
 inline Key make_key(uint32_t type, uint32_t max_size, const AttributeList &attributes) {
   Key key = blank_key(type, max_size);
-  if (key == nullptr || populate(key.get(), attributes) != TEE_SUCCESS) return nullptr;
+  EXPECT_EQ(populate(key.get(), attributes), TEE_SUCCESS);
   return key;
 }
 
@@ -86,15 +78,11 @@ inline Operation make_operation(uint32_t algorithm, uint32_t mode, uint32_t max_
   return Operation(operation);
 }
 
-/// A published key pair without its CRT components.
-inline AttributeList published_key(const char *modulus, const char *private_exponent) {
-  return {{TEE_ATTR_RSA_MODULUS, from_base64url(modulus)},
-          {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}},
-          {TEE_ATTR_RSA_PRIVATE_EXPONENT, from_base64url(private_exponent)}};
-}
-
+/// The published key pair, without CRT components.
 inline AttributeList rfc7515_private() {
-  return published_key(rfc7515_a2::kModulus, rfc7515_a2::kPrivateExponent);
+  return {{TEE_ATTR_RSA_MODULUS, from_base64url(rfc7515_a2::kModulus)},
+          {TEE_ATTR_RSA_PUBLIC_EXPONENT, {1, 0, 1}},
+          {TEE_ATTR_RSA_PRIVATE_EXPONENT, from_base64url(rfc7515_a2::kPrivateExponent)}};
 }
 
 inline AttributeList rfc7515_public() {
@@ -102,5 +90,11 @@ inline AttributeList rfc7515_public() {
   key.pop_back();
   return key;
 }
+
+class Crypto : public testing::Test {
+ protected:
+  tee::test::Device device_;
+  tee::test::InsideTa inside_{device_};
+};
 
 #endif

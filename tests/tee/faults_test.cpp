@@ -32,35 +32,56 @@ TEST(Faults, HitTheNthCallOnceOrFromThereOn) {
   EXPECT_FALSE(device.fault_report().fired);
 }
 
-TEST(Faults, StorageCallsFailOneAfterTheOther) {
-  const char *const calls[] = {"TEE_OpenPersistentObject", "TEE_CreatePersistentObject",
-                               "TEE_WriteObjectData",      "TEE_OpenPersistentObject",
-                               "TEE_ReadObjectData",       "TEE_CloseAndDeletePersistentObject1"};
-  for (unsigned n = 1; n <= std::size(calls); ++n) {
-    SCOPED_TRACE(calls[n - 1]);
-    Device device;
-    const InsideTa ta(device);
-    device.fail({}, Fault::kStorage, n, false, TEE_ERROR_CORRUPT_OBJECT);
-    TEE_ObjectHandle object = TEE_HANDLE_NULL;
-    TEE_Result result = open_object("id", 0, &object);
-    if (result == TEE_ERROR_ITEM_NOT_FOUND) result = write_object("id", "data");
-    if (result == TEE_SUCCESS) {
-      result =
-          open_object("id", TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE_META, &object);
-    }
-    char byte;
-    uint32_t count;
-    if (result == TEE_SUCCESS) result = TEE_ReadObjectData(object, &byte, 1, &count);
-    if (result == TEE_SUCCESS) {
-      result = TEE_CloseAndDeletePersistentObject1(object);
-    } else {
-      TEE_CloseObject(object);
-    }
-    EXPECT_EQ(result, TEE_ERROR_CORRUPT_OBJECT);
-    EXPECT_EQ(device.fault_report().call, calls[n - 1]);
-    EXPECT_EQ(ta.stats().open_objects, 0u);
-    EXPECT_EQ(device.objects({}).contains("id"), n > 2);
+struct Call {
+  const char *name;
+  std::function<TEE_Result()> make;
+};
+
+void expect_each_to_fail_once(Device &device, Fault fault, const std::vector<Call> &calls) {
+  for (const auto &[name, make] : calls) {
+    SCOPED_TRACE(name);
+    device.fail({}, fault, 1, false, TEE_ERROR_BUSY);
+    EXPECT_EQ(make(), TEE_ERROR_BUSY);
+    EXPECT_EQ(device.fault_report().call, name);
+    EXPECT_EQ(make(), TEE_SUCCESS);
   }
+}
+
+TEST(Faults, EachCallFailsInItsTurnAndCanBeMadeAgain) {
+  Device device;
+  const InsideTa ta(device);
+  TEE_ObjectHandle key, object;
+  TEE_OperationHandle mac;
+  expect_each_to_fail_once(
+      device, Fault::kCrypto,
+      {{"TEE_AllocateTransientObject",
+        [&] { return TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, 256, &key); }},
+       {"TEE_GenerateKey", [&] { return TEE_GenerateKey(key, 256, nullptr, 0); }},
+       {"TEE_AllocateOperation",
+        [&] { return TEE_AllocateOperation(&mac, TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256); }},
+       {"TEE_SetOperationKey", [&] { return TEE_SetOperationKey(mac, key); }}});
+  TEE_FreeOperation(mac);
+  TEE_FreeTransientObject(key);
+
+  char byte;
+  uint32_t count;
+  const uint32_t access = TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE_META;
+  expect_each_to_fail_once(
+      device, Fault::kStorage,
+      {{"TEE_CreatePersistentObject",
+        [&] { return create_object("id", "", TEE_DATA_FLAG_ACCESS_WRITE, &object); }},
+       {"TEE_WriteObjectData", [&] { return TEE_WriteObjectData(object, "x", 1); }},
+       {"TEE_OpenPersistentObject",
+        [&] {
+          TEE_CloseObject(std::exchange(object, nullptr));
+          return open_object("id", access, &object);
+        }},
+       {"TEE_ReadObjectData", [&] { return TEE_ReadObjectData(object, &byte, 1, &count); }},
+       // Gives the handle up whatever the result.
+       {"TEE_CloseAndDeletePersistentObject1",
+        [&] { return TEE_CloseAndDeletePersistentObject1(std::exchange(object, nullptr)); }}});
+  EXPECT_EQ(ta.stats().open_objects + ta.stats().open_operations, 0u);
+  EXPECT_EQ(device.objects({})["id"], "x");
 }
 
 TEST(Faults, AShortReadGivesHalf) {
@@ -70,12 +91,8 @@ TEST(Faults, AShortReadGivesHalf) {
   device.fail({}, Fault::kShortRead, 1);
   TEE_ObjectHandle object;
   ASSERT_EQ(open_object("id", TEE_DATA_FLAG_ACCESS_READ, &object), TEE_SUCCESS);
-  char data[8];
-  uint32_t count;
-  EXPECT_EQ(TEE_ReadObjectData(object, data, 8, &count), TEE_SUCCESS);
-  EXPECT_EQ(count, 4u);
-  EXPECT_EQ(TEE_ReadObjectData(object, data, 8, &count), TEE_SUCCESS);
-  EXPECT_EQ(std::string(data, count), "5678");
+  EXPECT_EQ(read_on(object, 8), "1234");
+  EXPECT_EQ(read_on(object, 8), "5678");
   TEE_CloseObject(object);
 }
 

@@ -9,6 +9,7 @@
 #include <tee_internal_api.h>
 #include <tee_test.h>
 
+#include <bit>
 #include <cstdlib>
 #include <filesystem>
 #include <functional>
@@ -16,12 +17,9 @@
 
 constexpr TEEC_UUID kTaA = {1, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xA}};
 constexpr TEEC_UUID kTaB = {2, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xB}};
-constexpr TEEC_UUID kEchoTa = {0, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xEC}};
 
 inline TEE_UUID inner(const TEEC_UUID &uuid) {
-  TEE_UUID result = {uuid.timeLow, uuid.timeMid, uuid.timeHiAndVersion, {}};
-  std::copy_n(uuid.clockSeqAndNode, 8, result.clockSeqAndNode);
-  return result;
+  return std::bit_cast<TEE_UUID>(uuid);
 }
 
 class TempFolder {
@@ -39,7 +37,7 @@ class TempFolder {
 struct Script {
   std::function<TEE_Result()> create = [] { return TEE_SUCCESS; };
   std::function<void()> destroy = [] {};
-  std::function<TEE_Result(TEE_Param *)> open = [](TEE_Param *) { return TEE_SUCCESS; };
+  std::function<TEE_Result()> open = [] { return TEE_SUCCESS; };
   std::function<TEE_Result(uint32_t types, TEE_Param *)> invoke = [](uint32_t, TEE_Param *) {
     return TEE_SUCCESS;
   };
@@ -56,18 +54,11 @@ void register_script(tee::test::Device &device, const TEEC_UUID &uuid) {
       {
           .create = [] { return script<N>.create(); },
           .destroy = [] { script<N>.destroy(); },
-          .open_session = [](uint32_t, TEE_Param *params,
-                             void **) { return script<N>.open(params); },
+          .open_session = [](uint32_t, TEE_Param *, void **) { return script<N>.open(); },
           .close_session = [](void *) {},
           .invoke_command = [](void *, uint32_t, uint32_t types,
                                TEE_Param *params) { return script<N>.invoke(types, params); },
       });
-}
-
-inline TEEC_Operation operation_of(uint32_t types) {
-  TEEC_Operation operation{};
-  operation.paramTypes = types;
-  return operation;
 }
 
 /// A client of the normal world, with one session at a time.
@@ -97,17 +88,11 @@ class Client {
   uint32_t origin = 0;
 };
 
-/// Writes an object, whole, as the running trusted application.
-inline TEE_Result write_object(const std::string &id, const std::string &data,
-                               uint32_t flags = TEE_DATA_FLAG_OVERWRITE) {
-  TEE_ObjectHandle object;
-  TEE_Result result = TEE_CreatePersistentObject(
-      TEE_STORAGE_PRIVATE, id.data(), static_cast<uint32_t>(id.size()),
-      flags | TEE_DATA_FLAG_ACCESS_WRITE, TEE_HANDLE_NULL, nullptr, 0, &object);
-  if (result != TEE_SUCCESS) return result;
-  result = TEE_WriteObjectData(object, data.data(), static_cast<uint32_t>(data.size()));
-  TEE_CloseObject(object);
-  return result;
+inline TEE_Result create_object(const std::string &id, const std::string &data, uint32_t flags,
+                                TEE_ObjectHandle *object) {
+  return TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, id.data(),
+                                    static_cast<uint32_t>(id.size()), flags, TEE_HANDLE_NULL,
+                                    data.data(), static_cast<uint32_t>(data.size()), object);
 }
 
 inline TEE_Result open_object(const std::string &id, uint32_t flags, TEE_ObjectHandle *object) {
@@ -115,18 +100,22 @@ inline TEE_Result open_object(const std::string &id, uint32_t flags, TEE_ObjectH
                                   flags, object);
 }
 
-/// Reads an object, whole; "(none)" when it cannot be opened.
-inline std::string read_object(const std::string &id) {
+/// Writes an object, whole, as the running trusted application.
+inline TEE_Result write_object(const std::string &id, const std::string &data,
+                               uint32_t flags = TEE_DATA_FLAG_OVERWRITE) {
   TEE_ObjectHandle object;
-  if (open_object(id, TEE_DATA_FLAG_ACCESS_READ, &object) != TEE_SUCCESS) return "(none)";
-  TEE_ObjectInfo info;
-  EXPECT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
-  std::string data(info.dataSize, '\0');
-  uint32_t count = 0;
-  EXPECT_EQ(TEE_ReadObjectData(object, data.data(), info.dataSize, &count), TEE_SUCCESS);
-  EXPECT_EQ(count, info.dataSize);
+  TEE_Result result = create_object(id, "", flags | TEE_DATA_FLAG_ACCESS_WRITE, &object);
+  if (result != TEE_SUCCESS) return result;
+  result = TEE_WriteObjectData(object, data.data(), static_cast<uint32_t>(data.size()));
   TEE_CloseObject(object);
-  return data;
+  return result;
+}
+
+inline std::string read_on(TEE_ObjectHandle object, uint32_t len) {
+  std::string data(len, '?');
+  uint32_t count = 0;
+  EXPECT_EQ(TEE_ReadObjectData(object, data.data(), len, &count), TEE_SUCCESS);
+  return data.substr(0, count);
 }
 
 #endif

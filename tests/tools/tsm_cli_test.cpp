@@ -1,64 +1,32 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// The program otrp-tsm as an operator meets it: exit codes, error lines, files left behind.
-#include <gtest/gtest.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 
-#include <cstdlib>
-#include <filesystem>
+#include <algorithm>
 
-#include "common/files.h"
+#include "program.h"
 #include "tsm/dsi.h"
-#include "tsm/home.h"
 #include "tsm/image.h"
 #include "tsm_fake_device.h"
 
 namespace tsm {
 namespace {
 
-namespace fs = std::filesystem;
-
-struct Outcome {
-  int exit_code;
-  std::string out;
-  std::string err;
-};
-
-class Cli : public testing::Test {
+class TsmProgram : public Program {
  protected:
-  void SetUp() override {
-    directory_ = fs::path(testing::TempDir()) / ("tsm_cli_" + std::to_string(getpid()));
-    fs::remove_all(directory_);
-    fs::create_directory(directory_);
-    write("ca.pem", ca_key().private_pem());
+  TsmProgram() : Program(OTRP_TSM_PROGRAM) {
+    write("ca.pem", key_of(kCa).private_pem());
     write("device.json", device_info_json(test_device()).dump());
-  }
-  void TearDown() override { fs::remove_all(directory_); }
-
-  std::string path(const std::string &name) const { return (directory_ / name).string(); }
-  void write(const std::string &name, const std::string &bytes) const {
-    tools::write_file(path(name), bytes);
-  }
-  std::string read(const std::string &name) const { return tools::read_file(path(name)); }
-
-  Outcome run(const std::string &arguments) const {
-    const std::string command =
-        "cd " + directory_.string() + " && " + OTRP_TSM_PROGRAM + " " + arguments + " > out 2> err";
-    const int status = std::system(command.c_str());
-    return {WEXITSTATUS(status), read("out"), read("err")};
   }
 
   /// A home whose identity the fake device's responses are encrypted for.
   void settle() const {
     ASSERT_EQ(run("init --tsmid tsm1 --ca ca.pem").exit_code, 0);
-    tools::write_file(path("tsm/tsm-key.pem"), test_tsm().key.private_pem());
+    write("tsm/tsm-key.pem", test_tsm().key.private_pem());
   }
-
- private:
-  fs::path directory_;
+  bool exists(const std::string &name) const { return std::filesystem::exists(path(name)); }
 };
 
-TEST_F(Cli, InitMakesAnIdentityOnceAndKeepsItsKeysPrivate) {
+TEST_F(TsmProgram, InitMakesAnIdentityOnceAndKeepsItsKeysPrivate) {
   ASSERT_EQ(run("init --tsmid tsm1 --ca ca.pem").exit_code, 0);
   for (const char *file : {"tsm/tsm-key.pem", "tsm/ca-tsm.pem"}) {
     struct stat info;
@@ -68,17 +36,16 @@ TEST_F(Cli, InitMakesAnIdentityOnceAndKeepsItsKeysPrivate) {
   const std::string key = read("tsm/tsm-key.pem");
   EXPECT_EQ(run("init --ca ca.pem").exit_code, 2);
   EXPECT_EQ(read("tsm/tsm-key.pem"), key);
-  EXPECT_EQ(Home(path("tsm")).load_identity().tsmid, "tsm1");
   EXPECT_EQ(run("--home other init").exit_code, 0) << "with the development CA";
 }
 
-TEST_F(Cli, ResponsesAreShownKeptAndUsedForTheNextRequest) {
+TEST_F(TsmProgram, ResponsesAreShownKeptAndUsedForTheNextRequest) {
   settle();
   const std::string dsi_text = serialize_as_device(test_dsi());
   write("response.json", state_response(dsi_text));
   const Outcome shown = run("response response.json --device device.json --dsi-out dsi.json");
   EXPECT_EQ(shown.exit_code, 0) << shown.err;
-  EXPECT_NE(shown.out.find("AIK " + aik_key().fingerprint()), std::string::npos);
+  EXPECT_NE(shown.out.find("AIK " + key_of(kAik).fingerprint()), std::string::npos);
   EXPECT_EQ(read("dsi.json"), dsi_text);
   EXPECT_NE(run("show").out.find("`-- TA ta"), std::string::npos);
 
@@ -91,20 +58,24 @@ TEST_F(Cli, ResponsesAreShownKeptAndUsedForTheNextRequest) {
     EXPECT_EQ(parse_json(payload)->at("DeleteSDTBSRequest").at("dsihash"), dsi_hash(test_dsi()));
   }
 
-  write("app.img", pack_image("code"));
+  EXPECT_EQ(run("image pack - -o app.img", "code").exit_code, 0);
   const std::string install =
-      "request install-ta --device device.json --sd sd --sp sp --ta-version 1 --ta "
-      "00112233445566778899aabbccddeeff --image ";
-  EXPECT_EQ(run(install + "app.img").exit_code, 0);
-  const Outcome unpacked = run(install + "ca.pem");
+      "request install-ta --device device.json --sd sd --ta-version 1 --ta "
+      "00112233445566778899aabbccddeeff ";
+  EXPECT_EQ(run(install + "--sp sp --image app.img").exit_code, 0);
+  EXPECT_EQ(run(install + "--sp unknown --image app.img").exit_code, 2);
+  const Outcome unpacked = run(install + "--sp sp --image ca.pem");
   EXPECT_EQ(unpacked.exit_code, 2);
   EXPECT_NE(unpacked.err.find("image pack"), std::string::npos);
+  std::filesystem::remove(path("tsm/ca-tsm.pem"));
+  EXPECT_EQ(run(install + "--sp sp --image app.img").exit_code, 2);
+  const std::string create = "request create-sd --device device.json --sp sp --sd sd --sp-cert ";
+  EXPECT_EQ(run(create + "\"$(printf '\\377')\"").exit_code, 2);
 }
 
-TEST_F(Cli, RefusalsAndUnverifiedResponsesAreToldApart) {
+TEST_F(TsmProgram, RefusalsAndUnverifiedResponsesAreToldApart) {
   settle();
-  write("refused.json",
-        create_sd_response({{"reason", {{"error_code", 0xDEAD0002}}}, {"status", "fail"}}));
+  write("refused.json", create_sd_response(refusal(0xDEAD0002)));
   const Outcome refused = run("response refused.json --device device.json --dsi-out dsi.json");
   EXPECT_EQ(refused.exit_code, 1);
   EXPECT_NE(refused.err.find("0xdead0002 (OTRP_SD_EXISTS)"), std::string::npos);
@@ -118,13 +89,12 @@ TEST_F(Cli, RefusalsAndUnverifiedResponsesAreToldApart) {
     EXPECT_EQ(outcome.exit_code, 3);
     EXPECT_EQ(outcome.out, "");
   }
-  EXPECT_FALSE(fs::exists(path("dsi.json")));
-  EXPECT_FALSE(fs::exists(path("tsm/devices")));
+  EXPECT_FALSE(exists("dsi.json"));
+  EXPECT_FALSE(exists("tsm/devices"));
 }
 
-TEST_F(Cli, WrongInputGetsOneLineAndLeavesNoFile) {
+TEST_F(TsmProgram, WrongInputGetsOneLineAndLeavesNoFile) {
   settle();
-  write("public.pem", read("device.json"));
   const std::string device = " --device device.json -o made.json";
   const std::string sd = "request create-sd --sp sp --sp-cert c --sd ";
   const std::string kCases[] = {
@@ -140,6 +110,7 @@ TEST_F(Cli, WrongInputGetsOneLineAndLeavesNoFile) {
       sd + "sd --dsi device.json" + device,
       sd + "''" + device,
       sd + "$(printf 's\\001')" + device,
+      sd + "$(printf '\\377')" + device,
       sd + std::string(57, 'x') + device,
       "request install-ta --sd sd --sp sp --ta short --ta-version 1 --image ca.pem" + device,
       "request delete-sd --sd sd --delete-ta maybe" + device,
@@ -148,7 +119,7 @@ TEST_F(Cli, WrongInputGetsOneLineAndLeavesNoFile) {
       "image pack missing -o made.json",
       "--home nowhere request get-device-state" + device,
       "--home new init --tsmid 'a b' --ca ca.pem",
-      "--home new init --ca public.pem",
+      "--home new init --ca device.json",
       "manage --state made.json get-device-state --home nowhere",
   };
   for (const std::string &arguments : kCases) {
@@ -157,16 +128,22 @@ TEST_F(Cli, WrongInputGetsOneLineAndLeavesNoFile) {
     EXPECT_EQ(outcome.exit_code, 2);
     EXPECT_EQ(outcome.out, "");
     EXPECT_EQ(outcome.err.substr(0, 10), "otrp-tsm: ");
-    EXPECT_EQ(std::count(outcome.err.begin(), outcome.err.end(), '\n'), 1) << outcome.err;
-    for (const char *file : {"made.json", "new", "nowhere"}) EXPECT_FALSE(fs::exists(path(file)));
+    EXPECT_EQ(std::ranges::count(outcome.err, '\n'), 1) << outcome.err;
+    for (const char *file : {"made.json", "new", "nowhere"}) EXPECT_FALSE(exists(file));
   }
 }
 
-TEST_F(Cli, StandardStreamsStandForFiles) {
-  EXPECT_EQ(run("image pack - -o - < ca.pem").out, pack_image(read("ca.pem")));
-  const Outcome help = run("request create-sd --help");
-  EXPECT_EQ(help.exit_code, 0);
-  EXPECT_NE(help.out.find("Example: otrp-tsm request"), std::string::npos);
+TEST(Image, HeaderCarriesTheDigestOfThePayload) {
+  Bytes image = pack_image("payload");
+  EXPECT_EQ(hex_encode(image.substr(16, 4)), "20000000");
+  EXPECT_EQ(image.substr(20, 32), sha256("payload"));
+  EXPECT_TRUE(parse_image(image)->digest_matches);
+  EXPECT_EQ(parse_image(image)->payload, "payload");
+  EXPECT_FALSE(parse_image(image.substr(0, kImageHeaderLen - 1)));
+  image.back() = '!';
+  EXPECT_FALSE(parse_image(image)->digest_matches);
+  image[16] = 48;
+  EXPECT_FALSE(parse_image(image));
 }
 
 }  // namespace

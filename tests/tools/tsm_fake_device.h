@@ -11,67 +11,55 @@
 
 namespace tsm {
 
-/// Key generation takes a while; tests that need any key share these.
-inline const RsaKey &test_key(int index) {
+/// Making a key takes a while: one for each role, made once in a process.
+enum Role { kTee, kAik, kCa, kStranger };
+inline const RsaKey &key_of(Role role) {
   static const RsaKey keys[] = {RsaKey::generate(), RsaKey::generate(), RsaKey::generate(),
                                 RsaKey::generate()};
-  return keys[index];
-}
-inline const RsaKey &tee_key() {
-  return test_key(0);
-}
-inline const RsaKey &aik_key() {
-  return test_key(1);
-}
-inline const RsaKey &ca_key() {
-  return test_key(2);
-}
-inline const RsaKey &stranger_key() {
-  return test_key(3);
+  return keys[role];
 }
 
 inline const Identity &test_tsm() {
-  static const Identity tsm = make_identity("tsm1", ca_key());
+  static const Identity tsm = make_identity("tsm1", key_of(kCa));
   return tsm;
 }
 
 inline DeviceInfo test_device() {
-  return {"device-1", RsaKey::from_encoded(tee_key().encoded()).value()};
+  return {"device-1", RsaKey::from_encoded(key_of(kTee).encoded()).value()};
 }
 
 /// A state with one SP, "sp", and its SD and TA.
 inline Json test_dsi() {
   const Json sd = {{"name", "sd/1"}, {"spid", "sp"}, {"talist", {{{"taid", "ta"}}}}};
-  const Json aik = {{"spaik", base64url_encode(aik_key().encoded())}, {"spid", "sp"}};
-  return {{"dsi",
-           {{"tee",
-             {{"sdlist", {{"cnt", 1}, {"sd", Json::array({sd})}}},
-              {"teeaiklist", Json::array({aik})}}}}}};
+  const Json aik = {{"spaik", base64url_encode(key_of(kAik).encoded())}, {"spid", "sp"}};
+  const Json tee = {{"sdlist", {{"cnt", 1}, {"sd", Json::array({sd})}}},
+                    {"teeaiklist", Json::array({aik})}};
+  return {{"dsi", {{"tee", tee}}}};
 }
 
-inline std::string sign_response(std::string_view payload, std::string_view response_name,
-                                 const RsaKey &key = tee_key()) {
-  const std::string protect = base64url_encode(R"({"alg":"RS256"})");
-  const std::string payload_text = base64url_encode(payload);
-  const Json envelope = {
-      {"payload", payload_text},
-      {"signature", base64url_encode(rs256_sign(key, protect + "." + payload_text))},
-      {"protect", protect},
-      {"header", {{"deviceId", "test_device_id"}}}};
-  return Json{{std::string(response_name), envelope}}.dump();
+inline std::string sign_response(const Json &payload, const std::string &response_name,
+                                 Role signer = kTee, const char *header = R"({"alg":"RS256"})") {
+  const std::string protect = base64url_encode(header);
+  const std::string payload_text = base64url_encode(payload.dump());
+  const Bytes signature = rs256_sign(key_of(signer), protect + "." + payload_text);
+  const Json envelope = {{"payload", payload_text},
+                         {"signature", base64url_encode(signature)},
+                         {"protect", protect},
+                         {"header", {{"deviceId", "test_device_id"}}}};
+  return Json{{response_name, envelope}}.dump();
 }
 
 inline std::string state_response(std::string_view dsi_text) {
-  const Json payload = {{"ver", "1.0"},
-                        {"rid", "r"},
-                        {"tid", "t"},
-                        {"signerreq", "true"},
-                        {"edsi", jwe_encrypt(test_tsm().key, dsi_text)}};
-  return sign_response(payload.dump(), "GetDeviceTEEStateResponse");
+  return sign_response({{"signerreq", "true"}, {"edsi", jwe_encrypt(test_tsm().key, dsi_text)}},
+                       "GetDeviceTEEStateResponse");
 }
 
 inline std::string create_sd_response(const Json &members) {
-  return sign_response(Json{{"CreateSDTBSResponse", members}}.dump(), "CreateSDResponse");
+  return sign_response({{"CreateSDTBSResponse", members}}, "CreateSDResponse");
+}
+
+inline Json refusal(const Json &code) {
+  return {{"reason", {{"error_code", code}, {"error_message", ""}}}, {"status", "fail"}};
 }
 
 }  // namespace tsm
