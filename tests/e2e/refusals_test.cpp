@@ -150,7 +150,7 @@ void expect_refusal(const RefusalCase &c, const Outcome &outcome) {
   EXPECT_FALSE(outcome.reply.image);
   ASSERT_TRUE(outcome.response);
   const Json &members = outcome.response->members;
-  EXPECT_EQ(outcome.response->status, "fail");
+  ASSERT_EQ(outcome.response->status, "fail");
   EXPECT_EQ(members["reason"]["error_message"], "");
   EXPECT_EQ(members.contains("rid"), c.has_ids);
   EXPECT_EQ(members.contains("tid"), c.has_ids);

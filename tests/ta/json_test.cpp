@@ -230,6 +230,8 @@ TEST_F(Json, EditsRefuseWhatIsNoValue) {
   EXPECT_EQ(json_object_set_number(object, "a", std::nan("")), JSONFailure);
   EXPECT_EQ(json_object_set_number(object, "a", -HUGE_VAL), JSONFailure);
   EXPECT_EQ(json_array_append_value(nullptr, value.get()), JSONFailure);
+  const json_ptr list(json_value_init_array());
+  EXPECT_EQ(json_array_append_string(json_value_get_array(list.get()), nullptr), JSONFailure);
   EXPECT_EQ(compact(value.get()), "{}");
 }
 

@@ -63,10 +63,12 @@ TEST_F(TlvBox, LookupsThatFailLeaveTheirOutputsAlone) {
   const box_ptr box = parse({0x11, 0, 3, 0, 7, 8, 9});
   uint32_t number = 5;
   EXPECT_EQ(tlv_box_get_int(box.get(), 0x11, &number), TLV_ERROR);  // too short for one
+  EXPECT_EQ(tlv_box_get_int(box.get(), 0x12, &number), TLV_ERROR);
   EXPECT_EQ(number, 5u);
   Bytes bytes(5, 0xEE);
   uint32_t len = 2;
   EXPECT_EQ(tlv_box_get_bytes(box.get(), 0x11, bytes.data(), &len), TLV_ERROR);
+  EXPECT_EQ(tlv_box_get_bytes(box.get(), 0x12, bytes.data(), &len), TLV_ERROR);
   EXPECT_EQ(bytes, Bytes(5, 0xEE));
   const uint8_t *own = nullptr;
   EXPECT_EQ(tlv_box_get_bytes_ptr(box.get(), 0x12, &own, &len), TLV_NOT_FOUND);
