@@ -64,10 +64,6 @@ void write_json(const std::string &file, const Json &json) {
   tools::write_file(file, json.dump(2) + "\n");
 }
 
-Json read_json(const std::string &file) {
-  return Json::parse(tools::read_file(file));
-}
-
 void write_examples(const std::string &folder) {
   std::filesystem::create_directories(folder);
   Scene scene;
@@ -92,18 +88,14 @@ void write_examples(const std::string &folder) {
   }
 }
 
-/// What differs from one answer to the next: keys that were made for it, and encrypted texts.
-void mask(Json *json) {
-  for (const auto &[name, value] : json->items()) {
-    if (value.is_structured()) mask(&value);
+/// Without what differs from one answer to the next: keys that were made for it, encrypted texts.
+Json masked(Json json) {
+  for (const auto &[name, value] : json.items()) {
+    if (value.is_structured()) value = masked(value);
     for (const char *fresh : {"teespaik", "spaik", "encrypted_key", "iv", "ciphertext", "tag"}) {
-      if (json->is_object() && name == fresh) value = "*";
+      if (json.is_object() && name == fresh) value = "*";
     }
   }
-}
-
-Json masked(Json json) {
-  mask(&json);
   return json;
 }
 
@@ -112,7 +104,7 @@ TEST(Examples, AreAnsweredAsTheyWereThen) {
   if (folder != nullptr) return write_examples(folder);
 
   const tee::test::TraceSink log;
-  const Json keys = read_json(kExamples + "/keys.json");
+  const Json keys = Json::parse(tools::read_file(kExamples + "/keys.json"));
   const tsm::RsaKey tsm_key = tsm::RsaKey::from_pem(keys["tsm_key"].get<std::string>()).value();
   const tsm::RsaKey tee_key =
       tsm::RsaKey::from_encoded(
@@ -120,7 +112,7 @@ TEST(Examples, AreAnsweredAsTheyWereThen) {
           .value();
   for (const Step &step : kSteps) {
     SCOPED_TRACE(std::string(tsm::message_of(step.id).command));
-    const Json example = read_json(file_of(kExamples, step.id));
+    const Json example = Json::parse(tools::read_file(file_of(kExamples, step.id)));
     AgentDevice device({as_objects(example["objects_before"]), as_objects(keys["key_service"])});
     ASSERT_TRUE(device.open());
     const Reply reply = device.send(static_cast<uint32_t>(step.id), example["request"].dump());

@@ -5,9 +5,10 @@
 #ifndef FAULTS_SWEEP_H
 #define FAULTS_SWEEP_H
 
+#include <tee_test.h>
+
 #include <set>
 #include <string>
-#include <vector>
 
 #include "support/scene.h"
 
@@ -19,26 +20,23 @@ enum class Ask { kMessage, kCreation, kStatusQuery, kDeviceId };
 struct Scenario {
   const char *name;
   void (*prepare)(Scene &scene);  // brings the device to the state before
-  Ask ask = Ask::kMessage;
   MessageId id = MessageId::kGetDeviceState;
-  tsm::RequestOptions options = {};
+  void (*change)(tsm::RequestOptions &) = nullptr;  // of the usual request
   /// Codes with which a repeated request may be refused, because it has been carried out.
   std::set<uint32_t> done_codes = {};
   /// Records that a failure may leave behind, outside the order of writes.
   std::set<std::string> may_stay = {};
+  Ask ask = Ask::kMessage;
 };
 
 struct FaultKind {
   const char *name;
   tee::test::Fault fault;
-  bool and_after;
+  bool and_after = false;
 };
 
 /// Runs the whole sweep. Returns the number of points tried, and fails the test that calls it.
 unsigned sweep(const Scenario &scenario, const FaultKind &kind);
-
-/// The scenarios that the sweeps go through, by name.
-const std::vector<Scenario> &scenarios();
 
 }  // namespace otrp_test
 

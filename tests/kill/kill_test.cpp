@@ -18,40 +18,23 @@ namespace {
 
 constexpr int kNumKills = 200;
 
-std::string any_of(std::mt19937 *random, const char *prefix) {
-  return prefix + std::to_string((*random)() % 5);
-}
-
 // Manages the device until it is killed. A request that a kill has made obsolete may be refused.
 [[noreturn]] void manage_for_ever(const std::string &directory, unsigned seed) {
   const tee::test::TraceSink log;
   std::mt19937 random(seed);
+  const auto any = [&](const char *prefix) { return prefix + std::to_string(random() % 5); };
   Scene scene("tsm1", directory);
   scene.get_device_state();
   for (;;) {
-    const std::string sp = any_of(&random, "sp");
-    const std::string sd = any_of(&random, "sd");
-    const std::string ta = taid(any_of(&random, "ta"));
-    switch (random() % 6) {
-      case 0:
-        scene.create_sd(sp, sd);
-        break;
-      case 1:
-        scene.install_ta(sp, sd, ta);
-        break;
-      case 2:
-        scene.update_ta(sp, sd, ta);
-        break;
-      case 3:
-        scene.delete_ta(sd, ta);
-        break;
-      case 4:
-        scene.update_sd(sp, sd);
-        break;
-      case 5:
-        scene.delete_sd(sd, "true");
-        break;
-    }
+    const auto id = static_cast<MessageId>(2 + random() % 6);  // what changes something
+    scene.run(id, {.spid = any("sp"),
+                   .sdname = any("sd"),
+                   .spcert = "certificate",
+                   .taid = taid(any("ta")),
+                   .ta_version = "1",
+                   .image = make_image(1000),
+                   .renew_aik = true,
+                   .deleteta = "true"});
     scene.get_device_state();
   }
 }
@@ -60,7 +43,7 @@ std::string any_of(std::mt19937 *random, const char *prefix) {
 bool is_whole(const std::string &directory) {
   const tee::test::TraceSink log;
   Scene scene("tsm1", directory);
-  return scene.get_device_state().response && scene.create_sd("checker", "checked").passed() &&
+  return scene.get_device_state().passed() && scene.create_sd("checker", "checked").passed() &&
          scene.delete_sd("checked", "true").passed();
 }
 

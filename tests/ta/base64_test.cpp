@@ -1,68 +1,45 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/base64.h"
 
-#include <openssl/evp.h>
-
 #include <algorithm>
 #include <random>
 
 #include "support/inside_agent.h"
-#include "ta/allocation_sweep.h"
 
 namespace otrp_test {
 namespace {
 
 class Base64 : public InsideAgent {};
 
-uint32_t len_of(const std::string &s) {
-  return static_cast<uint32_t>(s.size());
-}
+using Encoder = char *(const uint8_t *, uint32_t);
+using Decoder = uint32_t(const char *, uint8_t **);
 
-template <class Encoder>
-std::string encode(Encoder encoder, const std::string &data) {
+std::string encode(Encoder *encoder, const std::string &data) {
   // A copy of exact size, so that a byte too far is seen.
-  const std::vector<uint8_t> exact(data.begin(), data.end());
-  static const uint8_t kNothing = 0;
-  const tee_ptr<char> text(encoder(exact.empty() ? &kNothing : exact.data(), len_of(data)));
+  const auto exact = std::make_unique<uint8_t[]>(data.size());
+  std::copy(data.begin(), data.end(), exact.get());
+  const tee_ptr<char> text(encoder(exact.get(), len_of(data)));
   return text ? text.get() : "NULL";
 }
 
-std::string standard(const std::string &data) {
-  return encode(base64EncodeAddEndZero, data);
-}
-
-std::string url(const std::string &data) {
-  return encode(base64urlEncodeAddEndZero, data);
-}
-
-std::string from_slice(const std::string &text) {
-  const std::vector<char> exact(text.begin(), text.end());
-  static const char kNothing = 0;
-  secret_bytes bytes;
-  bytes.len = base64urlDecodeStringRemoveEndZeroV2(exact.empty() ? &kNothing : exact.data(),
-                                                   len_of(text), &bytes.data);
-  return str(bytes);
-}
-
-template <class Decoder>
-std::string decode(Decoder decoder, const std::string &text) {
+std::string decode(Decoder *decoder, const std::string &text) {
   secret_bytes bytes;
   bytes.len = decoder(text.c_str(), &bytes.data);
   EXPECT_NE(bytes.data, nullptr);
   return str(bytes);
 }
 
-std::string from_standard(const std::string &text) {
-  return decode(base64DecodeStringRemoveEndZero, text);
-}
-
-std::string from_url(const std::string &text) {
-  return decode(base64urlDecodeStringRemoveEndZero, text);
+std::string from_slice(const std::string &text) {
+  const auto exact = std::make_unique<char[]>(text.size());
+  std::copy(text.begin(), text.end(), exact.get());
+  secret_bytes bytes;
+  bytes.len = base64urlDecodeStringRemoveEndZeroV2(exact.get(), len_of(text), &bytes.data);
+  return str(bytes);
 }
 
 // RFC 4648, section 10
 TEST_F(Base64, KnownAnswers) {
-  const std::pair<const char *, const char *> kCases[] = {
+  const std::pair<std::string, std::string> cases[] = {
       {"", ""},
       {"f", "Zg=="},
       {"fo", "Zm8="},
@@ -71,43 +48,36 @@ TEST_F(Base64, KnownAnswers) {
       {"fooba", "Zm9vYmE="},
       {"foobar", "Zm9vYmFy"},
   };
-  for (const auto &[data, text] : kCases) {
-    EXPECT_EQ(standard(data), text);
-    EXPECT_EQ(from_standard(text), data);
-    const std::string unpadded(text, std::find(text, text + strlen(text), '='));
-    EXPECT_EQ(url(data), unpadded);
-    EXPECT_EQ(from_url(unpadded), data);
+  for (const auto &[data, text] : cases) {
+    const std::string unpadded = text.substr(0, text.find('='));
+    EXPECT_EQ(encode(base64EncodeAddEndZero, data), text);
+    EXPECT_EQ(encode(base64urlEncodeAddEndZero, data), unpadded);
+    EXPECT_EQ(decode(base64DecodeStringRemoveEndZero, text), data);
+    EXPECT_EQ(decode(base64urlDecodeStringRemoveEndZero, unpadded), data);
   }
 }
 
-TEST_F(Base64, AgreesWithOpenSslOnRandomBytesOfEveryLength) {
+TEST_F(Base64, AgreesWithTheTsmOnRandomBytesOfEveryLength) {
   std::mt19937 random(1);
   for (size_t len = 0; len < 200; ++len) {
     std::string data(len, 0);
     for (char &c : data) c = static_cast<char>(random());
-    std::string expected(4 * len / 3 + 5, 0);
-    const int expected_len = EVP_EncodeBlock(reinterpret_cast<uint8_t *>(expected.data()), u8(data),
-                                             static_cast<int>(len));
-    expected.resize(static_cast<size_t>(expected_len));
-    EXPECT_EQ(standard(data), expected);
-    EXPECT_EQ(from_standard(expected), data);
-    std::replace(expected.begin(), expected.end(), '+', '-');
-    std::replace(expected.begin(), expected.end(), '/', '_');
-    expected.resize(std::min(expected.find('='), expected.size()));
-    EXPECT_EQ(url(data), expected);
-    EXPECT_EQ(from_slice(expected), data);
+    const std::string text = tools::base64_encode(data);
+    const std::string url = tools::base64url_encode(data);
+    EXPECT_EQ(encode(base64EncodeAddEndZero, data), text);
+    EXPECT_EQ(encode(base64urlEncodeAddEndZero, data), url);
+    EXPECT_EQ(decode(base64DecodeStringRemoveEndZero, text), data);
+    EXPECT_EQ(from_slice(url), data);
   }
 }
 
-struct LenientCase {
-  const char *name;
-  std::string text;
-  std::string from_standard;
-  std::string from_url;
-};
-
 TEST_F(Base64, DecodersSkipWhatIsNotTheirs) {
-  const LenientCase kCases[] = {
+  const struct {
+    const char *name;
+    std::string text;
+    std::string from_standard;
+    std::string from_url;
+  } cases[] = {
       {"PaddingInTheMiddle", "QQ==QQ==", "\x41\x04\x10", "\x41\x04\x10"},
       {"LineFeed", "QU\nJD", "ABC", "ABC"},
       {"BitsLeftOver", "QR", "A", "A"},
@@ -116,54 +86,50 @@ TEST_F(Base64, DecodersSkipWhatIsNotTheirs) {
       {"UrlAlphabet", "-_8", "", "\xFB\xFF"},
       {"StandardAlphabet", "+/8", "\xFB\xFF", "\xFB\xFF"},
       {"Mixture", "+_8", "\xFB", "\xFB\xFF"},
-      {"NothingValid", "\x80\xFF@[`{:,.", "", ""},
       {"InALaterBlock", "QUJDQUJDQUJDQUJDQUJD\r\nQUJDQUJDQUJDQUJDQUJDQUJD QQ",
        "ABCABCABCABCABCABCABCABCABCABCABCA", "ABCABCABCABCABCABCABCABCABCABCABCA"},
   };
-  for (const auto &c : kCases) {
+  for (const auto &c : cases) {
     SCOPED_TRACE(c.name);
-    EXPECT_EQ(from_standard(c.text), c.from_standard);
-    EXPECT_EQ(from_url(c.text), c.from_url);
+    EXPECT_EQ(decode(base64DecodeStringRemoveEndZero, c.text), c.from_standard);
+    EXPECT_EQ(decode(base64urlDecodeStringRemoveEndZero, c.text), c.from_url);
     EXPECT_EQ(from_slice(c.text), c.from_url);
   }
   EXPECT_EQ(from_slice(std::string("QU\0JD", 5)), "ABC");
-  secret_bytes first;
-  first.len = base64urlDecodeStringRemoveEndZeroV2("QUJDRA==", 4, &first.data);
-  EXPECT_EQ(str(first), "ABC");
   secret_bytes text;
-  text.len = base64urlDecodeStringAddEndZeroV2("QUJD", 4, &text.data);
+  text.len = base64urlDecodeStringAddEndZeroV2("QUJDRA==", 4, &text.data);
   EXPECT_EQ(text.len, 3u);
   EXPECT_STREQ(reinterpret_cast<char *>(text.data), "ABC");
 }
 
 TEST_F(Base64, EveryByteHasItsValueOrIsSkipped) {
-  const std::string kSymbols = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/-_";
+  const std::string symbols = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/-_";
   for (int byte = 1; byte < 256; ++byte) {
     SCOPED_TRACE(byte);
     const std::string symbol(1, static_cast<char>(byte));
-    const size_t at = kSymbols.find(symbol);
+    const size_t at = symbols.find(symbol);
     const auto value = static_cast<char>(at < 64 ? at << 2 : (at - 2) << 2);
     const std::string decoded = at == std::string::npos ? "" : std::string(1, value);
     EXPECT_EQ(from_slice(symbol + "A"), decoded);
-    EXPECT_EQ(from_standard(symbol + "A"), at < 64 ? decoded : "");
+    EXPECT_EQ(decode(base64DecodeStringRemoveEndZero, symbol + "A"), at < 64 ? decoded : "");
   }
 }
 
 TEST_F(Base64, NullAndNoMemory) {
   auto *const untouched = reinterpret_cast<uint8_t *>(this);
   uint8_t *bytes = untouched;
+  const uint8_t byte = 0;
   EXPECT_EQ(base64EncodeAddEndZero(nullptr, 3), nullptr);
   EXPECT_EQ(base64DecodeStringRemoveEndZero(nullptr, &bytes), 0u);
   EXPECT_EQ(base64urlDecodeStringRemoveEndZeroV2(nullptr, 3, &bytes), 0u);
   EXPECT_EQ(bytes, untouched);
-  EXPECT_EQ(lines_of(log).size(), 0u);
-  EXPECT_EQ(base64urlEncodeAddEndZero(nullptr, 3), nullptr);
-
   // Lengths that cannot be met: nothing is read.
-  const uint8_t byte = 0;
   EXPECT_EQ(base64EncodeAddEndZero(&byte, UINT32_MAX), nullptr);
   EXPECT_EQ(base64EncodeAddEndZero(&byte, UINT32_MAX / 4 * 3), nullptr);
+  EXPECT_TRUE(log.lines().empty());
+
   device.fail({}, tee::test::Fault::kAllocation, 1, true);
+  EXPECT_EQ(base64urlEncodeAddEndZero(nullptr, 3), nullptr);
   EXPECT_EQ(base64urlEncodeAddEndZero(&byte, 1), nullptr);
   EXPECT_EQ(base64DecodeStringRemoveEndZero("QQ", &bytes), 0u);
   EXPECT_EQ(bytes, nullptr);
@@ -179,10 +145,6 @@ TEST_F(Base64, PiecesGiveWhatTheWholeGives) {
   for (int i = 0; i < 2000; ++i) {
     std::string text;
     for (size_t n = random() % 120; n > 0; --n) text += characters[random() % characters.size()];
-    secret_bytes whole;
-    whole.len = base64urlDecodeStringRemoveEndZeroV2(
-        text.data(), static_cast<uint32_t>(text.size()), &whole.data);
-
     std::string bytes(text.size() + 3, 0);
     uint32_t num_bytes = 0;
     std::string piece;
@@ -190,13 +152,13 @@ TEST_F(Base64, PiecesGiveWhatTheWholeGives) {
       const size_t taken = std::min<size_t>(1 + random() % 40, text.size() - offset);
       piece += text.substr(offset, taken);
       offset += taken;
-      auto len = static_cast<uint32_t>(piece.size());
+      uint32_t len = len_of(piece);
       num_bytes += base64urlDecodePiece(piece.data(), &len, offset == text.size(),
                                         reinterpret_cast<uint8_t *>(bytes.data()) + num_bytes);
       ASSERT_LE(len, 3u);
       piece.resize(len);
     }
-    EXPECT_EQ(bytes.substr(0, num_bytes), str(whole)) << text;
+    EXPECT_EQ(bytes.substr(0, num_bytes), from_slice(text)) << text;
   }
 }
 

@@ -1,8 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // Signatures and encrypted contents against vectors of the standards, and what the agent refuses.
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
 #include "otrp_result.h"
@@ -19,10 +16,6 @@ class Security : public InsideAgent {};
 
 std::string unbase64url(const std::string &text) {
   return tools::base64url_decode(text).value();
-}
-
-uint32_t len_of(const std::string &bytes) {
-  return static_cast<uint32_t>(bytes.size());
 }
 
 // The agent makes its keys from boxes.
@@ -113,78 +106,51 @@ TEST_F(Security, KeyUnwrappingAnswersRfc7516) {
   EXPECT_EQ(str(plain), known::kPlaintext);
 }
 
-struct ContentCase {
-  const char *path;  // of the member that is changed
-  const char *value;
-};
-
 TEST_F(Security, ContentsOpenUnchangedOrNotAtAll) {
   const key_object key = key_pair(rfc7516_a2::kModulus, rfc7516_a2::kPrivateExponent);
   const json_ptr secret(json_parse_string(R"({"a":"\/","n":[1,2.5]})"));
-  const ContentCase cases[] = {{"protect", "eyJhbGciOiJub25lIn0"},
-                               {"iv", "AAAAAAAAAAAAAAAA"},
-                               {"iv", "AAAA"},
-                               {"ciphertext", "AAAA"},
-                               {"ciphertext", ""},
-                               {"tag", "AAAAAAAAAAAAAAAAAAAAAA"},
-                               {"encrypted_key", "AAAA"}};
+  const std::pair<const char *, const char *> cases[] = {
+      {"protect", "eyJhbGciOiJub25lIn0"},
+      {"iv", "AAAAAAAAAAAAAAAA"},
+      {"iv", "AAAA"},
+      {"ciphertext", "AAAA"},
+      {"ciphertext", ""},
+      {"encrypted_key", "AAAA"},
+      {"tag", "AAAAAAAAAAAAAAAAAAAAAA"},
+  };
   for (const char *header : {JWE_HEADER_A128CBC_HS256, JWE_HEADER_A128GCM}) {
     const json_ptr jwe(encrypt_json(key.get(), secret.get(), header));
     ASSERT_TRUE(jwe);
     const json_ptr opened(decrypt_json(key.get(), jwe.get()));
     const json_text text(json_serialize_to_string(opened.get()));
     EXPECT_STREQ(text.get(), R"({"a":"\/","n":[1,2.500000]})");
-    for (const ContentCase &c : cases) {
-      SCOPED_TRACE(std::string(c.path) + " " + c.value);
+    for (const auto &[member, value] : cases) {
+      SCOPED_TRACE(member);
       const json_ptr changed(json_value_deep_copy(jwe.get()));
       JSON_Object *members = json_value_get_object(changed.get());
-      if (c.path == std::string("encrypted_key")) {
+      if (member == std::string("encrypted_key")) {
         members = json_array_get_object(json_object_get_array(members, "recipients"), 0);
       }
-      ASSERT_EQ(json_object_set_string(members, c.path, c.value), JSONSuccess);
+      ASSERT_EQ(json_object_set_string(members, member, value), JSONSuccess);
       EXPECT_EQ(decrypt_json(key.get(), changed.get()), nullptr);
     }
   }
   EXPECT_EQ(encrypt_json(key.get(), secret.get(), "{}"), nullptr);
 }
 
-TEST_F(Security, KeyBoxesGiveBackTheKeyTheyWereMadeOf) {
-  key_object key;
-  ASSERT_EQ(allocate_rsa_key_object(512, out(key)), TEE_SUCCESS);
-  box_ptr box;
-  ASSERT_EQ(serialize_rsa_key_to_tlv(key.get(), out(box)), TEE_SUCCESS);
-  ASSERT_EQ(tlv_box_serialize(box.get()), 0);
-  const box_ptr parsed(tlv_box_parse(tlv_box_get_buffer(box.get()), tlv_box_get_size(box.get())));
-  const key_object same(deserialize_rsa_key_from_tlv(parsed.get()));
-  ASSERT_TRUE(same);
-  secret_bytes wrapped;
-  secret_bytes plain;
-  ASSERT_EQ(rsa_encrypt(key.get(), u8("secret"), 6, &wrapped.data, &wrapped.len), TEE_SUCCESS);
-  ASSERT_EQ(rsa_decrypt(same.get(), wrapped.data, wrapped.len, &plain.data, &plain.len),
-            TEE_SUCCESS);
-  EXPECT_EQ(str(plain), "secret");
-}
-
 TEST_F(Security, EncodedPublicKeysMustHoldWhatTheyClaim) {
   const std::string encoded("\2\0\0\0nn\1\0\0\0e", 11);
-  const auto read = [](const std::string &bytes, std::string *n, std::string *e) {
-    secret_bytes modulus;
-    secret_bytes exponent;
-    const TEE_Result result = read_pubkey_buf_to_n_and_e(
-        u8(bytes), len_of(bytes), &modulus.data, &modulus.len, &exponent.data, &exponent.len);
-    if (result != TEE_SUCCESS) return result;
-    *n = str(modulus);
-    *e = str(exponent);
-    return result;
+  secret_bytes n;
+  secret_bytes e;
+  const auto read = [&](const std::string &bytes) {
+    return read_pubkey_buf_to_n_and_e(u8(bytes), len_of(bytes), &n.data, &n.len, &e.data, &e.len);
   };
-  std::string n;
-  std::string e;
-  ASSERT_EQ(read(encoded, &n, &e), TEE_SUCCESS);
-  EXPECT_EQ(n + "|" + e, "nn|e");
   for (size_t len = 0; len < encoded.size(); ++len) {
-    EXPECT_EQ(read(encoded.substr(0, len), &n, &e), OTRP_NO_MEMORY) << len;
+    EXPECT_EQ(read(encoded.substr(0, len)), OTRP_NO_MEMORY) << len;
   }
-  EXPECT_EQ(read(std::string("\xFF\xFF\xFF\xFFn", 5), &n, &e), OTRP_NO_MEMORY);
+  EXPECT_EQ(read(std::string("\xFF\xFF\xFF\xFFn", 5)), OTRP_NO_MEMORY);
+  ASSERT_EQ(read(encoded), TEE_SUCCESS);
+  EXPECT_EQ(str(n) + "|" + str(e), "nn|e");
 }
 
 }  // namespace

@@ -2,10 +2,6 @@
 // Known answers of others, and what the wrappers add: padding, truncation, refusals.
 #include "crypto/symmetric.h"
 
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
-#include "ownership.h"
 #include "support/inside_agent.h"
 
 namespace otrp_test {
@@ -74,9 +70,9 @@ TEST_F(Symmetric, AesGcmAnswersTheGcmProposal) {
 }
 
 TEST_F(Symmetric, HmacAnswersRfc4231) {
-  struct {
+  const struct {
     std::string key, data, mac;
-  } const cases[] = {
+  } cases[] = {
       // Test cases 1 and 3.
       {std::string(20, 0x0b), "Hi There",
        "b0344c61d8db38535ca8afceaf0bf12b881dc200c9833da726e9376c2e32cff7"},
@@ -84,71 +80,71 @@ TEST_F(Symmetric, HmacAnswersRfc4231) {
        "773ea91e36800e46854db8ebd09181a72959098b3ef8c122d9635514ced565fe"},
   };
   for (const auto &c : cases) {
+    const std::string known = hex(c.mac);
     secret_bytes mac;
-    const auto key_len = static_cast<uint32_t>(c.key.size());
-    const auto data_len = static_cast<uint32_t>(c.data.size());
-    ASSERT_EQ(Compute_HmacSha256(u8(c.data), data_len, u8(c.key), key_len, &mac.data, &mac.len),
+    ASSERT_EQ(Compute_HmacSha256(u8(c.data), len_of(c.data), u8(c.key), len_of(c.key), &mac.data,
+                                 &mac.len),
               TEE_SUCCESS);
     EXPECT_EQ(mac.len, 16u);
-    EXPECT_EQ(std::string(reinterpret_cast<char *>(mac.data), 32), hex(c.mac));
-    const auto verify = [&](const std::string &claimed) {
-      return Verify_HmacSha256(u8(c.data), data_len, u8(c.key), key_len, u8(claimed),
-                               static_cast<uint32_t>(claimed.size()));
-    };
-    EXPECT_EQ(verify(hex(c.mac).substr(0, 16)), TEE_SUCCESS);
-    EXPECT_EQ(verify(hex(c.mac)), TEE_SUCCESS);
-    EXPECT_EQ(verify(hex(c.mac) + "x"), TEE_ERROR_MAC_INVALID);
-    std::string changed = hex(c.mac).substr(0, 16);
-    changed[15] = static_cast<char>(changed[15] ^ 0x80);
-    EXPECT_EQ(verify(changed), TEE_ERROR_MAC_INVALID);
+    EXPECT_EQ(std::string(reinterpret_cast<char *>(mac.data), 32), known);
+    // A claim counts for as many bytes as it has.
+    for (const size_t len : {1u, 16u, 32u}) {
+      std::string claimed = known.substr(0, len);
+      const auto verify = [&] {
+        return Verify_HmacSha256(u8(c.data), len_of(c.data), u8(c.key), len_of(c.key), u8(claimed),
+                                 len_of(claimed));
+      };
+      EXPECT_EQ(verify(), TEE_SUCCESS) << len;
+      claimed.back() = static_cast<char>(claimed.back() ^ 0x80);
+      EXPECT_EQ(verify(), TEE_ERROR_MAC_INVALID) << len;
+      claimed = known + "x";
+      EXPECT_EQ(verify(), TEE_ERROR_MAC_INVALID);
+    }
   }
 }
 
 TEST_F(Symmetric, PaddingIsWholeOrRefused) {
   const struct {
     const char *name;
-    std::string data;
+    std::vector<uint8_t> data;  // on the heap, exactly as long as it is
     TEE_Result result;
     uint32_t unpadded;
   } cases[] = {
-      {"one byte", "abc\1", TEE_SUCCESS, 3},
-      {"whole block", std::string(16, 16), TEE_SUCCESS, 0},
-      {"nothing", "", TEE_ERROR_BAD_FORMAT, 0},
-      {"zero", std::string("abc\0", 4), TEE_ERROR_BAD_FORMAT, 0},
-      {"seventeen", std::string(32, 17), TEE_ERROR_BAD_FORMAT, 0},
-      {"uneven", "\3\3\2", TEE_ERROR_BAD_FORMAT, 0},
-      {"longer than the data", "\4\4\4", TEE_ERROR_BAD_FORMAT, 0},
+      {"one byte", {'a', 'b', 'c', 1}, TEE_SUCCESS, 3},
+      {"whole block", std::vector<uint8_t>(16, 16), TEE_SUCCESS, 0},
+      {"nothing", {}, TEE_ERROR_BAD_FORMAT, 0},
+      {"zero", {'a', 0}, TEE_ERROR_BAD_FORMAT, 0},
+      {"seventeen", std::vector<uint8_t>(32, 17), TEE_ERROR_BAD_FORMAT, 0},
+      {"uneven", {3, 3, 2}, TEE_ERROR_BAD_FORMAT, 0},
+      {"longer than the data", {4, 4, 4}, TEE_ERROR_BAD_FORMAT, 0},
   };
   for (const auto &c : cases) {
+    SCOPED_TRACE(c.name);
     uint32_t unpadded = 0;
-    // On the heap, exactly as long as it is.
-    const std::vector<uint8_t> data(c.data.begin(), c.data.end());
-    EXPECT_EQ(remove_pkcs_pading_length(data.data(), static_cast<uint32_t>(data.size()), &unpadded),
-              c.result)
-        << c.name;
-    EXPECT_EQ(unpadded, c.unpadded) << c.name;
+    const auto len = static_cast<uint32_t>(c.data.size());
+    EXPECT_EQ(remove_pkcs_pading_length(c.data.data(), len, &unpadded), c.result);
+    EXPECT_EQ(unpadded, c.unpadded);
   }
 }
 
 TEST_F(Symmetric, LengthsThatASenderGetsWrongAreRefusedAndTheBufferFreed) {
-  const std::string key(16, 'k');
-  const std::string iv(17, 'i');
-  for (const uint32_t iv_len : {1u, 15u, 17u}) {
+  const std::string text(17, 'x');
+  const struct {
+    uint32_t iv_len;
+    uint32_t cipher_len;
+    TEE_Result result;
+  } cases[] = {{1, 16, TEE_ERROR_BAD_PARAMETERS},  {15, 16, TEE_ERROR_BAD_PARAMETERS},
+               {17, 16, TEE_ERROR_BAD_PARAMETERS}, {16, 0, TEE_ERROR_BAD_FORMAT},
+               {16, 1, TEE_ERROR_BAD_FORMAT},      {16, 17, TEE_ERROR_BAD_FORMAT}};
+  for (const auto &c : cases) {
     secret_bytes out;
-    EXPECT_EQ(aes_cbc_decrypt(u8(key), 16, u8(iv), iv_len, u8(key), 16, &out.data, &out.len),
-              TEE_ERROR_BAD_PARAMETERS);
-    EXPECT_EQ(aes_cbc_decrypt_with_update_block(u8(key), 16, u8(iv), iv_len, allocate_bytes(16), 16,
+    EXPECT_EQ(aes_cbc_decrypt(u8(text), 16, u8(text), c.iv_len, u8(text), c.cipher_len, &out.data,
+                              &out.len),
+              c.result);
+    EXPECT_EQ(aes_cbc_decrypt_with_update_block(u8(text), 16, u8(text), c.iv_len,
+                                                allocate_bytes(c.cipher_len), c.cipher_len,
                                                 &out.data, &out.len),
-              TEE_ERROR_BAD_PARAMETERS);
-  }
-  for (const uint32_t len : {0u, 1u, 17u}) {
-    secret_bytes out;
-    const std::string cipher(len, 'c');
-    EXPECT_EQ(aes_cbc_decrypt(u8(key), 16, u8(iv), 16, u8(cipher), len, &out.data, &out.len),
-              TEE_ERROR_BAD_FORMAT);
-    EXPECT_EQ(aes_cbc_decrypt_with_update_block(u8(key), 16, u8(iv), 16, allocate_bytes(len), len,
-                                                &out.data, &out.len),
-              TEE_ERROR_BAD_FORMAT);
+              c.result);
   }
 }
 
