@@ -114,7 +114,7 @@ TEST_F(State, OnlyTextsThatComeBackCanBeStored) {
   EXPECT_TRUE(can_be_stored(nullptr));
 }
 
-TEST_F(State, AnEmptyDeviceHasTheKnownHash) {
+TEST_F(State, AnEmptyDeviceHasTheKnownHashAndTakesAnAikOnce) {
   g_dsi = init_dsi();
   EXPECT_EQ(object("SD_LIST_ID"), stored(R"({"sd_list":[]})"));
   const std::string known = "bbdc1d13e56fe3b3d81a742a6f9de14c813b002661c90f39cfe1bfd324bea9e5";
@@ -125,6 +125,11 @@ TEST_F(State, AnEmptyDeviceHasTheKnownHash) {
     EXPECT_EQ(dsi_validate_dsi_hash(g_dsi, wrong.c_str()), TEE_ERROR_MAC_INVALID);
   }
   EXPECT_EQ(dsi_validate_dsi_hash(g_dsi, nullptr), TEE_ERROR_MAC_INVALID);
+  // A second key for an SP changes nothing.
+  for (const char *key : {"key", "another"}) {
+    ASSERT_EQ(dsi_add_sp_aik(g_dsi, "sp", u8(key), 3, "RSA"), TEE_SUCCESS);
+    EXPECT_STREQ(g_dsi->spl_json_str, R"([{"spaik":"a2V5","spaiktype":"RSA","spid":"sp"}])");
+  }
   dsi_json_str_free(g_dsi);
   g_dsi = nullptr;
 }
