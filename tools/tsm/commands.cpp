@@ -29,15 +29,11 @@ void print_json(const Json &value) {
   print(value.dump(2) + "\n");
 }
 
-/// Beside an installed program, or in the tree it was built from.
+/// Beside the program, in a build as in an installation.
 std::string default_ca_file() {
   std::error_code failure;
   const std::filesystem::path program = std::filesystem::read_symlink("/proc/self/exe", failure);
-  const std::filesystem::path installed =
-      program.parent_path().parent_path() / "share" / "otrp" / kDevCaName;
-  const bool is_in_its_tree = !std::filesystem::exists(installed, failure) &&
-                              std::filesystem::exists(OTRP_DEV_CA_TSM_KEY, failure);
-  return is_in_its_tree ? OTRP_DEV_CA_TSM_KEY : installed.string();
+  return program.parent_path().parent_path() / "share" / "otrp" / kDevCaName;
 }
 
 /// The state that the operator names, or the one that the home keeps.
