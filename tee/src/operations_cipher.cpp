@@ -35,22 +35,11 @@ uint32_t feed(EVP_CIPHER_CTX *cipher, const void *src, uint32_t len, void *dest,
   return produced;
 }
 
-// Whole blocks with nothing pending pass straight through, without OpenSSL's own buffering: a
-// caller may come with one block at a time.
-bool pass_blocks(EVP_CIPHER_CTX *cipher, const void *src, uint32_t len, void *dest) {
-  return EVP_Cipher(cipher, static_cast<uint8_t *>(dest), static_cast<const uint8_t *>(src), len) ==
-         static_cast<int>(len);
-}
-
 // With bytes pending, the output runs ahead of the input: in place it would overwrite what is
 // still to be read.
-uint32_t feed_blocks(__TEE_OperationHandle &operation, const void *src, uint32_t len, void *dest,
+uint32_t feed_pieces(__TEE_OperationHandle &operation, const void *src, uint32_t len, void *dest,
                      const char *call) {
   EVP_CIPHER_CTX *cipher = operation.cipher.get();
-  if (operation.pending == 0 && len % kBlockLen == 0 && len <= kMaxStep) {
-    if (len != 0 && !pass_blocks(cipher, src, len, dest)) panic(call, "OpenSSL failed");
-    return len;
-  }
   const bool runs_ahead = operation.pending != 0 && src == dest;
   operation.pending = (operation.pending + len) % kBlockLen;
   if (!runs_ahead) return feed(cipher, src, len, dest, call);
@@ -60,6 +49,18 @@ uint32_t feed_blocks(__TEE_OperationHandle &operation, const void *src, uint32_t
   const uint32_t produced = feed(cipher, copy.data(), len, dest, call);
   OPENSSL_cleanse(copy.data(), copy.size());
   return produced;
+}
+
+// Whole blocks with nothing pending pass straight through, without OpenSSL's own buffering: a
+// caller may come with one block at a time.
+inline uint32_t feed_blocks(__TEE_OperationHandle &operation, const void *src, uint32_t len,
+                            void *dest, const char *call) {
+  const bool whole = operation.pending == 0 && len % kBlockLen == 0;
+  if (!whole || len == 0 || len > kMaxStep) return feed_pieces(operation, src, len, dest, call);
+  const int produced = EVP_Cipher(operation.cipher.get(), static_cast<uint8_t *>(dest),
+                                  static_cast<const uint8_t *>(src), len);
+  if (produced != static_cast<int>(len)) panic(call, "OpenSSL failed");
+  return len;
 }
 
 // To OpenSSL, input without a destination is AAD.
