@@ -1,43 +1,11 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include <gtest/gtest.h>
 
-#include "support/published_vectors.h"
 #include "tsm/jwe.h"
 #include "tsm_fake_device.h"
 
 namespace tsm {
 namespace {
-
-Bytes unbase64url(std::string_view text) {
-  return base64url_decode(text).value();
-}
-
-RsaKey published_key(std::string_view n, std::string_view d) {
-  return RsaKey::from_numbers(unbase64url(n), unbase64url("AQAB"), unbase64url(d)).value();
-}
-
-TEST(Crypto, Rs256OfTheStandard) {
-  namespace known = rfc7515_a2;
-  const RsaKey key = published_key(known::kModulus, known::kPrivateExponent);
-  const std::string input = std::string(known::kProtect) + "." + known::kPayload;
-  EXPECT_EQ(base64url_encode(rs256_sign(key, input)), known::kSignature);
-  EXPECT_TRUE(rs256_verify(key, input, unbase64url(known::kSignature)));
-  EXPECT_FALSE(rs256_verify(key, input + "A", unbase64url(known::kSignature)));
-  EXPECT_FALSE(rs256_verify(key, input, ""));
-}
-
-// Its members in the places where the protocol carries them.
-TEST(Jwe, Rsa1_5AndA128CbcHs256OfTheStandard) {
-  namespace known = rfc7516_a2;
-  const RsaKey key = published_key(known::kModulus, known::kPrivateExponent);
-  const Json recipient = {{"header", {{"alg", "RSA1_5"}}}, {"encrypted_key", known::kEncryptedKey}};
-  const Json jwe = {{"protect", known::kProtect},
-                    {"recipients", Json::array({recipient})},
-                    {"iv", known::kIv},
-                    {"ciphertext", known::kCiphertext},
-                    {"tag", known::kTag}};
-  EXPECT_EQ(jwe_decrypt(key, jwe), known::kPlaintext);
-}
 
 TEST(Jwe, EveryDamagedMemberIsNoticed) {
   const RsaKey &key = key_of(kTee);

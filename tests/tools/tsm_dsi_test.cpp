@@ -7,18 +7,6 @@
 namespace tsm {
 namespace {
 
-TEST(DsiHash, OfAnEmptyDeviceFromItsTextAndFromItsDocument) {
-  const char text[] =
-      R"({"dsi":{"tfwdata":{"tbs":"TFW to be signed data is the tid","cert":"BASE64 encoded TFW )"
-      R"(certificate","sigalg":"Signing method","sig":"Tfw signed data,  BASE64 encoded"},"tee":{)"
-      R"("name":"TEE name","ver":"TEE version","cert":"BASE64 encoded TEE cert","cacert":"JSON )"
-      R"(array value of CA certificates up to the root CA","sdlist":{"cnt":0,"sd":[]},)"
-      R"("teeaiklist":[]}}})";
-  const char hash[] = "bbdc1d13e56fe3b3d81a742a6f9de14c813b002661c90f39cfe1bfd324bea9e5";
-  EXPECT_EQ(dsi_hash_of_text(text), hash);
-  EXPECT_EQ(dsi_hash(parse_json(parse_json(text)->dump(2)).value()), hash);
-}
-
 TEST(DeviceJson, IsWrittenAsTheDeviceWritesIt) {
   const std::pair<const char *, const char *> kCases[] = {
       {R"({ "b":1, "a":[ ], "c":{ } })", R"({"b":1,"a":[],"c":{}})"},

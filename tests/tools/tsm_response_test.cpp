@@ -18,24 +18,6 @@ std::string created(const Json &content, const RsaKey &recipient = test_tsm().ke
   return create_sd_response({{"status", "pass"}, {"content", sealed}});
 }
 
-TEST(Response, BothWaysToTheDeviceStateGiveTheSameDocument) {
-  const std::string dsi_text = serialize_as_device(test_dsi());
-  ASSERT_NE(dsi_text.find("sd\\/1"), std::string::npos);
-  EXPECT_EQ(open(state_response(dsi_text)).dsi_text, dsi_text);
-  const Response response = open(created({{"sdname", "sd"}, {"dsi", test_dsi().at("dsi")}}));
-  EXPECT_EQ(response.dsi_text, dsi_text);
-  EXPECT_EQ(response.status, "pass");
-  EXPECT_EQ(response.content.at("sdname"), "sd");
-  EXPECT_FALSE(response.error_code);
-}
-
-TEST(Response, RefusalCarriesItsCode) {
-  const Response response = open(create_sd_response(refusal(0xDEAD0002)));
-  EXPECT_EQ(response.status, "fail");
-  EXPECT_EQ(response.error_code, 0xDEAD0002);
-  EXPECT_FALSE(response.dsi_text);
-}
-
 TEST(Response, TaInfoIsSignedByTheSp) {
   const auto info = [](const char *spid, Role signer) {
     const Json members = {{"taid", "ta"}, {"spid", spid}, {"ta_version", "1"}};
