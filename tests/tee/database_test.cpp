@@ -6,8 +6,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <random>
-
 #include "common/files.h"
 #include "tee_support.h"
 
@@ -93,73 +91,51 @@ TEST_F(StateDirectory, BelongsToOneProcess) {
   EXPECT_EQ(exit_code_of(spawn(is_turned_away)), true);
 }
 
-// Saves the object "n", round after round, and tells each round that was closed.
-int save_for_ever(const fs::path &state, int told) {
-  Device device(state);
-  const InsideTa ta(device);
-  for (uint32_t n = 1;; ++n) {
-    TEE_ObjectHandle object;
-    const uint32_t flags = TEE_DATA_FLAG_ACCESS_WRITE | TEE_DATA_FLAG_OVERWRITE;
-    if (create_object("n", "", flags, &object) != TEE_SUCCESS) return 1;
-    for (int part = 0; part < 1000; ++part) TEE_WriteObjectData(object, &n, sizeof(n));
-    TEE_CloseObject(object);
-    if (::write(told, &n, sizeof(n)) < 0) return 1;
-  }
-}
-
-TEST_F(StateDirectory, AProcessKilledAtAnyMomentLosesNothingThatWasClosed) {
-  std::mt19937 random(1);
-  for (int round = 0; round < 25; ++round) {
-    SCOPED_TRACE(round);
-    // Every third round meets the creation of the database.
-    const bool is_fresh = round % 3 == 0;
-    if (is_fresh) fs::remove_all(state);
+// The first rounds meet the creation of the database.
+TEST_F(StateDirectory, AProcessKilledAtAnyMomentLosesNothingThatWasStored) {
+  for (useconds_t delay = 0; delay < 10000; delay += 500) {
+    SCOPED_TRACE(delay);
+    fs::remove_all(state);
     int told[2];
     ASSERT_EQ(::pipe(told), 0);
-    const pid_t child = spawn([&] { return save_for_ever(state, told[1]); });
+    const pid_t child = spawn([&] {
+      Device device(state);
+      for (uint32_t n = 1;; ++n) {
+        device.put_object({}, "n", std::to_string(n));
+        if (::write(told[1], &n, sizeof(n)) < 0) return 1;
+      }
+    });
     ::close(told[1]);
-    ::usleep(std::uniform_int_distribution<useconds_t>(0, is_fresh ? 8000 : 40000)(random));
+    ::usleep(delay);
     ::kill(child, SIGKILL);
     ::waitpid(child, nullptr, 0);
-    uint32_t closed = 0, found = 0;
-    while (::read(told[0], &closed, sizeof(closed)) > 0) continue;
+    uint32_t latest = 0;
+    while (::read(told[0], &latest, sizeof(latest)) > 0) continue;
     ::close(told[0]);
-
-    const std::string data = stored("n");
-    data.copy(reinterpret_cast<char *>(&found), sizeof(found));
-    EXPECT_GE(found, closed);
-    EXPECT_EQ(data.size(), found == 0 ? 0 : 1000 * sizeof(found));
-    EXPECT_EQ(data.substr(0, data.size() / 2), data.substr(data.size() / 2));
-    EXPECT_TRUE(data.empty() || data.substr(4) == data.substr(0, data.size() - 4));
+    EXPECT_GE(std::stoul("0" + stored("n")), latest);
   }
 }
 
 // ---- Damage
 
-struct DamageCase {
-  const char *name;
-  void (*damage)(std::string &bytes);
-};
-
-const DamageCase kDamages[] = {
-    {"NoDatabase", [](std::string &bytes) { bytes = "This is no database, but a text.\n"; }},
-    {"OneByte", [](std::string &bytes) { bytes.resize(1); }},
-    {"FirstPage", [](std::string &bytes) { bytes.resize(4096); }},
-    {"HalfAPageMissing", [](std::string &bytes) { bytes.resize(bytes.size() - 2048); }},
-    {"ForeignApplication", [](std::string &bytes) { bytes[68] ^= 1; }},
-    {"OtherVersion", [](std::string &bytes) { bytes[63] ^= 2; }},
-    {"OtherSchema", [](std::string &bytes) { bytes[bytes.find("digest BLOB")] = 'D'; }},
-    {"ByteInsideAnObject", [](std::string &bytes) { bytes[bytes.rfind("LLLL")] ^= 1; }},
-    {"ByteInsideAnId", [](std::string &bytes) { bytes[bytes.find("id49") + 1] ^= 1; }},
-};
-
 TEST_F(StateDirectory, DamageIsReportedAndTheFileLeftAsItIs) {
+  const std::pair<const char *, void (*)(std::string &)> kDamages[] = {
+      {"NoDatabase", [](std::string &bytes) { bytes = "This is no database, but a text.\n"; }},
+      {"OneByte", [](std::string &bytes) { bytes.resize(1); }},
+      {"FirstPage", [](std::string &bytes) { bytes.resize(4096); }},
+      {"HalfAPageMissing", [](std::string &bytes) { bytes.resize(bytes.size() - 2048); }},
+      {"ForeignApplication", [](std::string &bytes) { bytes[68] ^= 1; }},
+      {"OtherVersion", [](std::string &bytes) { bytes[63] ^= 2; }},
+      {"OtherSchema", [](std::string &bytes) { bytes[bytes.find("digest BLOB")] = 'D'; }},
+      {"ByteInsideAnObject", [](std::string &bytes) { bytes[bytes.rfind("LLLL")] ^= 1; }},
+      {"ByteInsideAnId", [](std::string &bytes) { bytes[bytes.find("id49") + 1] ^= 1; }},
+  };
   fill();
   const std::string sound = tools::read_file(database);
-  for (const DamageCase &c : kDamages) {
-    SCOPED_TRACE(c.name);
+  for (const auto &[name, damage] : kDamages) {
+    SCOPED_TRACE(name);
     std::string bytes = sound;
-    c.damage(bytes);
+    damage(bytes);
     tools::write_file(database, bytes);
     EXPECT_EQ(Client(state).result, TEEC_ERROR_CORRUPT_OBJECT);
     EXPECT_NE(std::string(tee_inspect_last_error()).find("objects.db is damaged"),

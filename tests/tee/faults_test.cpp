@@ -32,54 +32,48 @@ TEST(Faults, HitTheNthCallOnceOrFromThereOn) {
   EXPECT_FALSE(device.fault_report().fired);
 }
 
-struct Call {
-  const char *name;
-  std::function<TEE_Result()> make;
-};
-
-void expect_each_to_fail_once(Device &device, Fault fault, const std::vector<Call> &calls) {
-  for (const auto &[name, make] : calls) {
+TEST(Faults, EachCallFailsInItsTurnAndCanBeMadeAgain) {
+  Device device;
+  const InsideTa ta(device);
+  TEE_ObjectHandle key, object;
+  TEE_OperationHandle mac;
+  char byte;
+  uint32_t count;
+  const uint32_t access = TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE_META;
+  struct {
+    Fault fault;
+    const char *name;
+    std::function<TEE_Result()> make;
+  } const kCalls[] = {
+      {Fault::kCrypto, "TEE_AllocateTransientObject",
+       [&] { return TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, 256, &key); }},
+      {Fault::kCrypto, "TEE_GenerateKey", [&] { return TEE_GenerateKey(key, 256, nullptr, 0); }},
+      {Fault::kCrypto, "TEE_AllocateOperation",
+       [&] { return TEE_AllocateOperation(&mac, TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256); }},
+      {Fault::kCrypto, "TEE_SetOperationKey", [&] { return TEE_SetOperationKey(mac, key); }},
+      {Fault::kStorage, "TEE_CreatePersistentObject",
+       [&] { return create_object("id", "", TEE_DATA_FLAG_ACCESS_WRITE, &object); }},
+      {Fault::kStorage, "TEE_WriteObjectData", [&] { return TEE_WriteObjectData(object, "x", 1); }},
+      {Fault::kStorage, "TEE_OpenPersistentObject",
+       [&] {
+         TEE_CloseObject(std::exchange(object, nullptr));
+         return open_object("id", access, &object);
+       }},
+      {Fault::kStorage, "TEE_ReadObjectData",
+       [&] { return TEE_ReadObjectData(object, &byte, 1, &count); }},
+      // Gives the handle up whatever the result.
+      {Fault::kStorage, "TEE_CloseAndDeletePersistentObject1",
+       [&] { return TEE_CloseAndDeletePersistentObject1(std::exchange(object, nullptr)); }},
+  };
+  for (const auto &[fault, name, make] : kCalls) {
     SCOPED_TRACE(name);
     device.fail({}, fault, 1, false, TEE_ERROR_BUSY);
     EXPECT_EQ(make(), TEE_ERROR_BUSY);
     EXPECT_EQ(device.fault_report().call, name);
     EXPECT_EQ(make(), TEE_SUCCESS);
   }
-}
-
-TEST(Faults, EachCallFailsInItsTurnAndCanBeMadeAgain) {
-  Device device;
-  const InsideTa ta(device);
-  TEE_ObjectHandle key, object;
-  TEE_OperationHandle mac;
-  expect_each_to_fail_once(
-      device, Fault::kCrypto,
-      {{"TEE_AllocateTransientObject",
-        [&] { return TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, 256, &key); }},
-       {"TEE_GenerateKey", [&] { return TEE_GenerateKey(key, 256, nullptr, 0); }},
-       {"TEE_AllocateOperation",
-        [&] { return TEE_AllocateOperation(&mac, TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256); }},
-       {"TEE_SetOperationKey", [&] { return TEE_SetOperationKey(mac, key); }}});
   TEE_FreeOperation(mac);
   TEE_FreeTransientObject(key);
-
-  char byte;
-  uint32_t count;
-  const uint32_t access = TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE_META;
-  expect_each_to_fail_once(
-      device, Fault::kStorage,
-      {{"TEE_CreatePersistentObject",
-        [&] { return create_object("id", "", TEE_DATA_FLAG_ACCESS_WRITE, &object); }},
-       {"TEE_WriteObjectData", [&] { return TEE_WriteObjectData(object, "x", 1); }},
-       {"TEE_OpenPersistentObject",
-        [&] {
-          TEE_CloseObject(std::exchange(object, nullptr));
-          return open_object("id", access, &object);
-        }},
-       {"TEE_ReadObjectData", [&] { return TEE_ReadObjectData(object, &byte, 1, &count); }},
-       // Gives the handle up whatever the result.
-       {"TEE_CloseAndDeletePersistentObject1",
-        [&] { return TEE_CloseAndDeletePersistentObject1(std::exchange(object, nullptr)); }}});
   EXPECT_EQ(ta.stats().open_objects + ta.stats().open_operations, 0u);
   EXPECT_EQ(device.objects({})["id"], "x");
 }
