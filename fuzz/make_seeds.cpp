@@ -140,7 +140,7 @@ static void keep_messages(const Life &life, const StoredDevice &device) {
     keep("frame", seed.name, device::build_frame(id, text));
     keep("content", seed.name, std::to_string(id) + content + (image.empty() ? "" : '\0' + image));
     keep("token_reader", seed.name, "tsmid\n" + text);
-    keep("json", seed.name, content + '\0' + "edits");
+    keep("json", seed.name, content);
     keep("jwe", seed.name, tsm::jwe_encrypt(device.tee_key(), content).dump());
   }
   const Json gcm = tsm::jwe_encrypt(device.tee_key(), R"({"a":[1,true,"text"]})",
