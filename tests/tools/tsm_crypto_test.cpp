@@ -35,9 +35,6 @@ TEST(Jwe, EveryDamagedMemberIsNoticed) {
 
 TEST(RsaKey, OnlyACompleteEncodingIsAKey) {
   const Bytes encoded = key_of(kTee).encoded();
-  ASSERT_EQ(encoded.size(), 267u);
-  EXPECT_EQ(encoded.substr(0, 4), Bytes("\0\1\0\0", 4));
-  EXPECT_EQ(encoded.substr(260), Bytes("\3\0\0\0\1\0\1", 7));
   EXPECT_EQ(RsaKey::from_encoded(encoded)->encoded(), encoded);
   for (size_t len = 0; len < encoded.size(); ++len) {
     EXPECT_FALSE(RsaKey::from_encoded(Bytes(encoded.data(), len))) << len;
