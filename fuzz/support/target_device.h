@@ -41,8 +41,7 @@ class TargetDevice {
   void store(const Objects &objects);
 
   /// Gives an open device the objects and the instance back that it began with, if any have
-  /// changed. The agent must be able to start with what is stored then, and after a request that
-  /// passed the new instance must know the same security domains.
+  /// changed. The agent must be able to start with what is stored then.
   void restore();
 
   device::Device &door() { return door_; }
@@ -61,7 +60,6 @@ class TargetDevice {
   std::string first_state_;
   uint64_t writes_ = 0;
   std::optional<tsm::RsaKey> tee_key_;
-  bool passed_ = false;  // the latest message, as its response says
   std::unique_ptr<device::Session> session_;
 };
 
