@@ -17,11 +17,7 @@ std::string stored(const std::string &payload) {
   return word(static_cast<uint32_t>(payload.size())) + payload;
 }
 
-HostDevice::HostDevice() {
-  tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
-}
-
-HostDevice::HostDevice(const std::string &state_directory) : Device(state_directory) {
+FindsImages::FindsImages() {
   tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
 }
 
