@@ -17,6 +17,10 @@ std::string stored(const std::string &payload) {
   return word(static_cast<uint32_t>(payload.size())) + payload;
 }
 
+std::string box_record(uint16_t type, const std::string &value) {
+  return tools::little_endian(type, 2) + tools::little_endian(value.size(), 2) + value;
+}
+
 FindsImages::FindsImages() {
   tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
 }

@@ -19,6 +19,9 @@ extern const TEE_UUID kCorvelUuid;
 /// A raw data stream: the payload behind its length.
 std::string stored(const std::string &payload);
 
+/// A record of the boxes that keys are kept in.
+std::string box_record(uint16_t type, const std::string &value);
+
 /// The TA images are those of this build.
 struct FindsImages {
   FindsImages();
