@@ -83,7 +83,7 @@ TEST_F(Attack, TheSecondSignatureIsForThisTransactionDeviceTaAndTsm) {
 }
 
 TEST_F(Attack, EveryContentThatDoesNotOpenLooksTheSame) {
-  const auto with_key = [&](const std::string &wrapped) -> Json {
+  const auto with_key = [](const std::string &wrapped) -> Json {
     return {{"recipients", {{{"encrypted_key", tools::base64url_encode(wrapped)}}}}};
   };
   const auto wrap = [&](size_t len) {

@@ -20,25 +20,21 @@ struct Step {
   tsm::RequestOptions options;
 };
 
+const std::string kTa = taid("pay");
+
+tsm::RequestOptions bring_ta(const char *version, const std::string &image) {
+  return {.spid = "bank", .sdname = "wallet", .taid = kTa, .ta_version = version, .image = image};
+}
+
 const Step kSteps[] = {
     {MessageId::kGetDeviceState, {}},
     {MessageId::kCreateSd, {.spid = "bank", .sdname = "wallet", .spcert = "certificate"}},
-    {MessageId::kInstallTa,
-     {.spid = "bank",
-      .sdname = "wallet",
-      .taid = taid("pay"),
-      .ta_version = "1.0",
-      .image = make_image(64)}},
-    {MessageId::kUpdateTa,
-     {.spid = "bank",
-      .sdname = "wallet",
-      .taid = taid("pay"),
-      .ta_version = "1.1",
-      .image = make_image(64, 2)}},
-    {MessageId::kGetTaInfo, {.spid = "bank", .taid = taid("pay")}},
+    {MessageId::kInstallTa, bring_ta("1.0", make_image(64))},
+    {MessageId::kUpdateTa, bring_ta("1.1", make_image(64, 2))},
+    {MessageId::kGetTaInfo, {.spid = "bank", .taid = kTa}},
     {MessageId::kUpdateSd,
      {.spid = "bank", .sdname = "wallet", .spcert = "new certificate", .renew_aik = true}},
-    {MessageId::kDeleteTa, {.sdname = "wallet", .taid = taid("pay")}},
+    {MessageId::kDeleteTa, {.sdname = "wallet", .taid = kTa}},
     {MessageId::kDeleteSd, {.sdname = "wallet", .deleteta = "true"}},
 };
 
@@ -80,11 +76,10 @@ void write_examples(const std::string &folder) {
     const std::string dsi = scene.dsi_text;
     const Outcome outcome = scene.send(step.id, request);
     ASSERT_TRUE(outcome.response);
-    Json example = {{"request", Json::parse(request)},
-                    {"response", Json::parse(outcome.reply.response)},
-                    {"device_state_before", dsi},
-                    {"objects_before", before}};
-    write_json(file_of(folder, step.id), example);
+    write_json(file_of(folder, step.id), {{"request", Json::parse(request)},
+                                          {"response", Json::parse(outcome.reply.response)},
+                                          {"device_state_before", dsi},
+                                          {"objects_before", before}});
   }
 }
 

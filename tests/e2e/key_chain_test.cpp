@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // GetDeviceState from outside: how a TSM becomes known, and what its envelope must have.
-#include <gmock/gmock.h>
+#include <gtest/gtest.h>
 
 #include "support/scene.h"
 #include "tsm/trust.h"
@@ -13,7 +13,6 @@ class KeyChain : public testing::Test {
   void TearDown() override { scene.device.expect_clean(); }
 
   Outcome ask_with(const Json &chain) {
-    log.clear();
     return scene.run(MessageId::kGetDeviceState, {}, {.tbs = patch({{"tsm_key_chain", chain}})});
   }
 
@@ -21,25 +20,18 @@ class KeyChain : public testing::Test {
     return scene.device.record("TSM_INFO_" + tsmid).has_value();
   }
 
-  void expect_logged(const std::string &message) {
-    EXPECT_THAT(log.lines(),
-                testing::Contains(testing::Field(&tee::test::TraceSink::Line::message, message)));
-  }
-
-  tee::test::TraceSink log;
+  const tee::test::TraceSink log;
   Scene scene;
   const Json entry = scene.tsm().key_chain["tsm_list"][0];
   const Json no_list = {{"tsm_list", nullptr}};
 };
 
 TEST_F(KeyChain, BringsTheKeyThatTheAnswerIsFor) {
-  const Outcome first = scene.run(MessageId::kGetDeviceState, {.rid = "7", .tid = "x1"},
+  const Outcome first = scene.run(MessageId::kGetDeviceState, {},
                                   {.tbs = patch({{"ver", "9.9"}, {"signerreq", "false"}})});
   ASSERT_TRUE(first.response);
-  const std::string edsi = first.response->members["edsi"].dump();
-  EXPECT_EQ(first.response->members.dump(),
-            R"({"ver":"1.0","rid":"7","tid":"x1","signerreq":"true","edsi":)" + edsi + "}");
-  EXPECT_EQ(first.response->header, Json({{"deviceId", "test_device_id"}}));
+  EXPECT_EQ(first.response->members["ver"], "1.0");
+  EXPECT_EQ(first.response->members["signerreq"], "true");
   EXPECT_EQ(scene.dsihash(), "bbdc1d13e56fe3b3d81a742a6f9de14c813b002661c90f39cfe1bfd324bea9e5");
   EXPECT_EQ(scene.device.record("SD_LIST_ID"), R"({"sd_list":[]})");
   EXPECT_EQ(scene.device.record("TSM_INFO_tsm1"), entry["tsm_pub_key"].get<std::string>());
@@ -49,7 +41,7 @@ TEST_F(KeyChain, BringsTheKeyThatTheAnswerIsFor) {
   for (char &c : hash) c = static_cast<char>(toupper(c));
   const Outcome second = ask_with({{"ca_tsm_hash", hash}});
   ASSERT_TRUE(second.passed());
-  EXPECT_NE(second.response->members["edsi"].dump(), edsi);
+  EXPECT_NE(second.response->members["edsi"], first.response->members["edsi"]);
   EXPECT_EQ(second.response->content, first.response->content);
 }
 
@@ -110,7 +102,6 @@ TEST_F(KeyChain, WithoutAListAdmitsNobody) {
   EXPECT_TRUE(ask_with(no_list).passed());
   scene.device.put_record("TSM_INFO_tsm1", "");
   EXPECT_EQ(ask_with(no_list).reply.status, kBadRequest);
-  expect_logged("after verify_decode get tbs json is NULL");
 }
 
 TEST_F(KeyChain, EntriesBeforeABadOneStayAdmitted) {
@@ -129,19 +120,10 @@ TEST_F(KeyChain, ANewKeyReplacesTheOldOne) {
   EXPECT_TRUE(scene.get_device_state().passed());
 }
 
-TEST_F(KeyChain, MissingMembersOfTheEnvelopeAreNamedInTheLog) {
-  const std::pair<const char *, const char *> cases[] = {
-      {"payload", "get base64 payload error"},
-      {"protect", "get base64_protect error"},
-      {"signature", "get base64 signature error"},
-      {"header", "request header is NULL"},
-  };
-  for (const auto &[member, line] : cases) {
-    log.clear();
-    const Outcome outcome =
-        scene.run(MessageId::kGetDeviceState, {}, {.envelope = patch({{member, nullptr}})});
-    EXPECT_EQ(outcome.reply.status, kBadRequest);
-    expect_logged(line);
+TEST_F(KeyChain, AnEnvelopeMustHaveAllItsMembers) {
+  for (const char *member : {"payload", "protect", "signature", "header"}) {
+    const Edits edits = {.envelope = patch({{member, nullptr}})};
+    EXPECT_EQ(scene.run(MessageId::kGetDeviceState, {}, edits).reply.status, kBadRequest);
   }
 }
 
@@ -154,8 +136,8 @@ TEST_F(KeyChain, TheProtectedHeaderIsSignedButNotInterpreted) {
     };
   };
   for (const char *protect : {"bm90IGpzb24", "e30", "x"}) {
-    EXPECT_TRUE(
-        scene.run(MessageId::kGetDeviceState, {}, {.envelope = protect_with(protect)}).response);
+    const Edits edits = {.envelope = protect_with(protect)};
+    EXPECT_TRUE(scene.run(MessageId::kGetDeviceState, {}, edits).response);
   }
 }
 

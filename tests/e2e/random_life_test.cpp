@@ -105,9 +105,7 @@ class RandomLife : public testing::Test {
   }
 
   void create_sd() {
-    const std::string sd = any("sd", 9);
-    const std::string sp = any("sp", 3);
-    const std::string cert = any("cert ", 1000);
+    const std::string sd = any("sd", 9), sp = any("sp", 3), cert = any("cert ", 1000);
     if (!send(MessageId::kCreateSd, {.spid = sp, .sdname = sd, .spcert = cert}).passed()) return;
     EXPECT_FALSE(model.sds.contains(sd));
     model.sds[sd] = {sp, scene.tsm().tsmid, {}};

@@ -13,10 +13,6 @@ std::string nested(int levels) {
          std::string(static_cast<size_t>(levels), ']');
 }
 
-std::string box_record(uint16_t type, const std::string &value) {
-  return tools::little_endian(type, 2) + tools::little_endian(value.size(), 2) + value;
-}
-
 // Objects that fit any record: raw data streams.
 std::map<std::string, std::string> any_record() {
   std::map<std::string, std::string> data = {
@@ -27,24 +23,21 @@ std::map<std::string, std::string> any_record() {
       {"OpenString", stored("{\"name\":\"")},
       {"AnArray", stored("[]")},
       {"AnObject", stored("{}")},
-      {"AString", stored("\"name\"")},
       {"TwentyLevels", stored(nested(20))},
       {"TwentyOneLevels", stored(nested(21))},
       {"LengthBeyondTheObject", word(1000) + "{}"},
       {"LargestLength", word(0xFFFFFFFF) + "{}"},
-      {"AlmostLargestLength", word(0xFFFFFFFE) + "{}"},
       {"HalfTheHeap", word(0x100000) + "{}"},
       {"BinaryCount", stored(word(0xFFFFFFFF))},
   };
   Json list = Json::array();
   for (int i = 0; i < 3000; ++i) list.push_back(std::to_string(i));
   data["HugeList"] = stored(Json({{"sd_list", list}, {"talist", list}}).dump());
-  for (const char *value :
-       {"null", "true", "7", "\"text\"", "[]", "{}", "[null]", "[[]]", "[{}]"}) {
+  const char *const members[] = {"sd_list", "name", "spid", "tsmid", "talist",
+                                 "spcert",  "aik",  "sdid", "taid",  "ta_version"};
+  for (const char *value : {"null", "7", "\"text\"", "[]", "{}", "[null]", "[[]]", "[{}]"}) {
     Json record;
-    for (const char *name : {"sd_list", "name", "spid", "tsmid", "talist", "spcert", "aik", "sdid",
-                             "taid", "ta_version"})
-      record[name] = Json::parse(value);
+    for (const char *name : members) record[name] = Json::parse(value);
     data[std::string("AllMembers ") + value] = stored(record.dump());
   }
   return data;

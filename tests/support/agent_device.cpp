@@ -17,11 +17,11 @@ std::string stored(const std::string &payload) {
   return word(static_cast<uint32_t>(payload.size())) + payload;
 }
 
-HostDevice::HostDevice() {
-  tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
+std::string box_record(uint16_t type, const std::string &value) {
+  return tools::little_endian(type, 2) + tools::little_endian(value.size(), 2) + value;
 }
 
-HostDevice::HostDevice(const std::string &state_directory) : Device(state_directory) {
+FindsImages::FindsImages() {
   tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
 }
 

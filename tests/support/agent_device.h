@@ -19,10 +19,12 @@ extern const TEE_UUID kCorvelUuid;
 /// A raw data stream: the payload behind its length.
 std::string stored(const std::string &payload);
 
-/// Finds the TA images of this build.
-struct HostDevice : tee::test::Device {
-  HostDevice();
-  explicit HostDevice(const std::string &state_directory);
+/// A record of the boxes that keys are kept in.
+std::string box_record(uint16_t type, const std::string &value);
+
+/// The TA images are those of this build.
+struct FindsImages {
+  FindsImages();
 };
 
 /// What a device keeps: the objects of the agent and of the key service.
@@ -31,13 +33,13 @@ struct Snapshot {
   std::map<std::string, std::string> key_service;
 };
 
-class AgentDevice : private HostDevice, public ClientDevice {
+class AgentDevice : FindsImages, tee::test::Device, public ClientDevice {
  public:
   AgentDevice() : ClientDevice(name()) {}
   explicit AgentDevice(const Snapshot &snapshot);
   /// With its objects on disk.
   explicit AgentDevice(const std::string &state_directory)
-      : HostDevice(state_directory), ClientDevice(name()) {}
+      : Device(state_directory), ClientDevice(name()) {}
 
   tee::test::Device &host() { return *this; }
 
@@ -45,8 +47,8 @@ class AgentDevice : private HostDevice, public ClientDevice {
   std::optional<std::string> record(const std::string &id) const;
   void put_record(const std::string &id, const std::string &payload);
   void remove_record(const std::string &id);
-  std::map<std::string, std::string> objects() const { return HostDevice::objects(kAgentUuid); }
-  Snapshot snapshot() const { return {objects(), HostDevice::objects(kCorvelUuid)}; }
+  std::map<std::string, std::string> objects() const { return Device::objects(kAgentUuid); }
+  Snapshot snapshot() const { return {objects(), Device::objects(kCorvelUuid)}; }
 
   tee_heap_stats stats();
 

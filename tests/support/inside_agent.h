@@ -7,7 +7,6 @@
 #include <tee_test.h>
 
 #include <string>
-#include <vector>
 
 #include "common/encoding.h"
 #include "ownership.h"
@@ -29,10 +28,6 @@ class InsideAgent : public testing::Test {
   tee::test::TraceSink log;
 };
 
-inline std::string hex(const std::string &digits) {
-  return tools::hex_decode(digits).value();
-}
-
 inline const uint8_t *u8(const std::string &bytes) {
   return reinterpret_cast<const uint8_t *>(bytes.data());
 }
@@ -43,31 +38,6 @@ inline uint32_t len_of(const std::string &bytes) {
 
 inline std::string str(const secret_bytes &bytes) {
   return {reinterpret_cast<const char *>(bytes.data), bytes.len};
-}
-
-/// "function: message" of every line.
-inline std::vector<std::string> lines_of(const tee::test::TraceSink &log) {
-  std::vector<std::string> lines;
-  for (const auto &line : log.lines()) lines.push_back(line.function + ": " + line.message);
-  return lines;
-}
-
-/// Runs `work` with its n-th allocation failing, for every n, until none fails. It must pass then
-/// and not before, and never leave a block behind.
-template <class Work>
-void fail_each_allocation(Work work) {
-  bool fired = true;
-  for (unsigned n = 1; fired; ++n) {
-    SCOPED_TRACE(n);
-    const tee::test::TraceSink log;
-    tee::test::Device device;
-    const tee::test::InsideTa inside(device);
-    device.fail({}, tee::test::Fault::kAllocation, n);
-    const bool passed = work();
-    fired = device.fault_report().fired;
-    EXPECT_EQ(passed, !fired);
-    EXPECT_EQ(inside.stats().live_blocks, 0u);
-  }
 }
 
 }  // namespace otrp_test

@@ -21,9 +21,8 @@ std::string environment(const char *name, const std::string &otherwise) {
 
 const tsm::RsaKey &key_named(const std::string &name) {
   static std::map<std::string, tsm::RsaKey> keys;
-  const auto found = keys.find(name);
-  if (found != keys.end()) return found->second;
-  return keys.emplace(name, tsm::RsaKey::generate()).first->second;
+  if (!keys.contains(name)) keys.emplace(name, tsm::RsaKey::generate());
+  return keys.at(name);
 }
 
 const tsm::RsaKey &dev_ca() {
@@ -34,9 +33,8 @@ const tsm::RsaKey &dev_ca() {
 
 const tsm::Identity &tsm_named(const std::string &tsmid) {
   static std::map<std::string, tsm::Identity> identities;
-  const auto found = identities.find(tsmid);
-  if (found != identities.end()) return found->second;
-  return identities.emplace(tsmid, tsm::make_identity(tsmid, dev_ca())).first->second;
+  if (!identities.contains(tsmid)) identities.emplace(tsmid, tsm::make_identity(tsmid, dev_ca()));
+  return identities.at(tsmid);
 }
 
 uint32_t Outcome::code() const {
@@ -63,28 +61,21 @@ std::string taid(const std::string &name) {
 }
 
 RequestOptions usual(MessageId id) {
+  using enum MessageId;
   static const std::string image = make_image(100);
-  const std::string ta1 = taid("ta1");
-  switch (id) {
-    case MessageId::kGetDeviceState:
-      return {};
-    case MessageId::kCreateSd:
-      return {.spid = "sp3", .sdname = "sd4", .spcert = "certificate"};
-    case MessageId::kUpdateSd:
-      return {.spid = "sp1", .sdname = "sd2", .spcert = "renewed", .renew_aik = true};
-    case MessageId::kDeleteSd:
-      return {.sdname = "sd1", .deleteta = "true"};
-    case MessageId::kInstallTa:
-      return {
-          .spid = "sp1", .sdname = "sd2", .taid = taid("ta3"), .ta_version = "1", .image = image};
-    case MessageId::kUpdateTa:
-      return {.spid = "sp1", .sdname = "sd1", .taid = ta1, .ta_version = "2", .image = image};
-    case MessageId::kDeleteTa:
-      return {.sdname = "sd1", .taid = ta1};
-    case MessageId::kGetTaInfo:
-      return {.spid = "sp1", .taid = ta1};
-  }
-  throw std::logic_error("no such message");
+  static const std::string ta1 = taid("ta1");
+  static const std::map<MessageId, RequestOptions> all = {
+      {kGetDeviceState, {}},
+      {kInstallTa,
+       {.spid = "sp1", .sdname = "sd2", .taid = taid("ta3"), .ta_version = "1", .image = image}},
+      {kUpdateTa, {.spid = "sp1", .sdname = "sd1", .taid = ta1, .ta_version = "2", .image = image}},
+      {kDeleteTa, {.sdname = "sd1", .taid = ta1}},
+      {kCreateSd, {.spid = "sp3", .sdname = "sd4", .spcert = "certificate"}},
+      {kUpdateSd, {.spid = "sp1", .sdname = "sd2", .spcert = "renewed", .renew_aik = true}},
+      {kDeleteSd, {.sdname = "sd1", .deleteta = "true"}},
+      {kGetTaInfo, {.spid = "sp1", .taid = ta1}},
+  };
+  return all.at(id);
 }
 
 static tsm::DeviceInfo info_of(device::Device &door) {

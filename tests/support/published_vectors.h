@@ -4,22 +4,6 @@
 #ifndef PUBLISHED_VECTORS_H
 #define PUBLISHED_VECTORS_H
 
-/// RFC 7518, appendix B.1: A128CBC-HS256.
-namespace rfc7518_b1 {
-constexpr char kCek[] = "000102030405060708090a0b0c0d0e0f101112131415161718191a1b1c1d1e1f";
-constexpr char kIv[] = "1af38c2dc2b96ffdd86694092341bc04";
-constexpr char kPlaintext[] =
-    "A cipher system must not be required to be secret, and it must be able to fall into the hand"
-    "s of the enemy without inconvenience";
-constexpr char kAad[] = "The second principle of Auguste Kerckhoffs";
-constexpr char kCiphertext[] =
-    "c80edfa32ddf39d5ef00c0b468834279a2e46a1b8049f792f76bfe54b903a9c9a94ac9b47ad2655c5f10f9aef714"
-    "27e2fc6f9b3f399a221489f16362c703233609d45ac69864e3321cf82935ac4096c86e133314c54019e8ca7980df"
-    "a4b9cf1b384c486f3a54c51078158ee5d79de59fbd34d848b3d69550a67646344427ade54b8851ffb598f7f80074"
-    "b9473c82e2db";
-constexpr char kTag[] = "652c3fa36b0a7c5b3219fab3a30bc1c4";
-}  // namespace rfc7518_b1
-
 /// RFC 7515, appendix A.2: RS256. The exponent is 65537.
 namespace rfc7515_a2 {
 constexpr char kModulus[] =
