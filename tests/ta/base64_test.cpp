@@ -37,7 +37,24 @@ std::string from_slice(const std::string &text) {
   return str(bytes);
 }
 
-// The TSM's own encoding answers RFC 4648.
+// RFC 4648, section 10
+TEST_F(Base64, KnownAnswers) {
+  const std::pair<std::string, std::string> cases[] = {
+      {"", ""},
+      {"f", "Zg=="},
+      {"fo", "Zm8="},
+      {"foo", "Zm9v"},
+      {"foob", "Zm9vYg=="},
+      {"fooba", "Zm9vYmE="},
+      {"foobar", "Zm9vYmFy"},
+  };
+  for (const auto &[data, text] : cases) {
+    EXPECT_EQ(encode(base64EncodeAddEndZero, data), text);
+    EXPECT_EQ(encode(base64urlEncodeAddEndZero, data), text.substr(0, text.find('=')));
+    EXPECT_EQ(decode(base64DecodeStringRemoveEndZero, text), data);
+  }
+}
+
 TEST_F(Base64, AgreesWithTheTsmOnRandomBytesOfEveryLength) {
   std::mt19937 random(1);
   for (size_t len = 0; len < 200; ++len) {
