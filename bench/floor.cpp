@@ -2,9 +2,12 @@
 #include "floor.h"
 
 #include <openssl/core_names.h>
+#include <openssl/crypto.h>
 #include <openssl/evp.h>
 #include <openssl/rsa.h>
 
+#include <cstdlib>
+#include <cstring>
 #include <list>
 #include <memory>
 #include <stdexcept>
@@ -117,12 +120,17 @@ Work decrypt_blocks(size_t len) {
   };
 }
 
-Work tokenize(std::string text) {
-  return [text = std::move(text), tokens = std::vector<jsmntok_t>(kNumTokens)]() mutable {
-    jsmn_parser parser;
-    jsmn_init(&parser);
-    require(jsmn_parse(&parser, text.data(), text.size(), tokens.data(), kNumTokens));
+// A zero-filled block of the heap whose content ends in the output buffer and is wiped.
+Work move(size_t len) {
+  return [=] {
+    const std::unique_ptr<void, decltype(&std::free)> block(std::calloc(1, len), std::free);
+    std::memcpy(scratch().out.data(), block.get(), len);
+    OPENSSL_cleanse(block.get(), len);
   };
+}
+
+Work wipe_output(size_t len) {
+  return [=] { OPENSSL_cleanse(scratch().out.data(), len); };
 }
 
 Work in_order(std::vector<Work> works) {
@@ -254,6 +262,7 @@ struct Floor {
 
   void add(Work work) { works.push_back(std::move(work)); }
   void add_reading(const std::string &text);
+  void add_payload(const std::string &text);
   void add_envelope_check(const Json &envelope);
   void add_key_chain(const Json &chain);
   void add_opening(const Json &jwe);
@@ -263,7 +272,14 @@ struct Floor {
 };
 
 void Floor::add_reading(const std::string &text) {
-  if (depth == Depth::kWithRules) add(tokenize(text));
+  if (depth == Depth::kWithRules) add(reading_of(text));
+}
+
+void Floor::add_payload(const std::string &text) {
+  if (depth == Depth::kCryptography) return;
+  for (Work &work : std::vector{move(text.size()), reading_of(text), wipe_output(text.size())}) {
+    add(std::move(work));
+  }
 }
 
 void Floor::add_envelope_check(const Json &envelope) {
@@ -296,6 +312,7 @@ void Floor::add_image(const Json &encrypted_ta, const char *image_name) {
   add(rsa_decrypt(Form::kWithPrimes, keys));
   add(depth == Depth::kWithRules ? decrypt_blocks(len) : aes(len, false));
   add(digest(len));
+  if (depth == Depth::kWithRules) add(move(len));
 }
 
 void Floor::add_sealing(const Json &jwe) {
@@ -327,6 +344,14 @@ Json payload_of(const Json &envelope) {
 
 }  // namespace
 
+Work reading_of(std::string text) {
+  return [text = std::move(text), tokens = std::vector<jsmntok_t>(kNumTokens)]() mutable {
+    jsmn_parser parser;
+    jsmn_init(&parser);
+    require(jsmn_parse(&parser, text.data(), text.size(), tokens.data(), kNumTokens));
+  };
+}
+
 Work verification_of(size_t payload_len, Keys keys) {
   return in_order({decode(payload_len), decode(kRsaLen * 4 / 3),
                    digest(kProtectLen + 1 + payload_len), rsa_verify(keys)});
@@ -349,7 +374,7 @@ Work work_of(const MessageCase &message, const std::string &request, const std::
 
   const Json envelope = tsm::parse_json(request).value().front();
   floor.add_envelope_check(envelope);
-  floor.add_reading(payload_text(envelope));
+  floor.add_payload(payload_text(envelope));
   const Json tbs = payload_of(envelope).front();
   if (tbs.contains("tsm_key_chain")) floor.add_key_chain(tbs.at("tsm_key_chain"));
   if (tbs.contains("dsihash")) {

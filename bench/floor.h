@@ -24,14 +24,17 @@ enum class Keys {
 
 enum class Depth {
   kCryptography,  // and nothing else, all keys and contexts prepared
-  kWithRules,     // as the agent has to do it: with new keys, an image block by block, and each
-                  // text tokenized once
+  kWithRules,     // as the agent has to do it: with new keys, an image block by block, each text
+                  // tokenized once, and payload and image moved through the heap
 };
 
 /// The work of an exchange that took place: of its request, its response, and the state document
 /// whose hash the request has.
 Work work_of(const MessageCase &message, const std::string &request, const std::string &response,
              size_t dsi_len, Depth depth);
+
+/// One pass of the tokenizer.
+Work reading_of(std::string text);
 
 /// Verifying and signing an envelope whose payload has so many characters in base64url.
 Work verification_of(size_t payload_len, Keys keys);
