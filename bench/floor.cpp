@@ -277,9 +277,9 @@ void Floor::add_reading(const std::string &text) {
 
 void Floor::add_payload(const std::string &text) {
   if (depth == Depth::kCryptography) return;
-  for (Work &work : std::vector{move(text.size()), reading_of(text), wipe_output(text.size())}) {
-    add(std::move(work));
-  }
+  add(move(text.size()));
+  add(reading_of(text));
+  add(wipe_output(text.size()));
 }
 
 void Floor::add_envelope_check(const Json &envelope) {

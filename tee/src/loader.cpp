@@ -38,7 +38,7 @@ fs::path own_path() {
 }
 
 // Beside the program and beside this library. Neither moves while the process runs; to ask the
-// system each time would take a quarter of the time that loading takes.
+// system each time would take a fifth of the time that loading takes.
 std::vector<fs::path> installed_folders() {
   std::vector<fs::path> folders;
   std::error_code error;

@@ -113,7 +113,7 @@ SharedKey import_rsa_key(const Attributes &attributes) {
   }
   params.push_back(OSSL_PARAM_construct_end());
 
-  // Importing leaves nothing in a context, and making one takes as long as importing a public key.
+  // Importing leaves nothing in a context, and making one takes half as long as importing.
   static thread_local const KeyContext context = rsa_context();
   const bool pair = attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT);
   EVP_PKEY *key = nullptr;

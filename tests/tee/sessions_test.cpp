@@ -28,6 +28,11 @@ TEST(Loading, AMissingOrWrongImageIsNamed) {
   set_ta_directory("");
 }
 
+TEE_Result open_ta(const TEEC_UUID &uuid, TEE_TASessionHandle *session) {
+  const TEE_UUID ta = inner(uuid);
+  return TEE_OpenTASession(&ta, TEE_TIMEOUT_INFINITE, 0, nullptr, session, nullptr);
+}
+
 class Sessions : public testing::Test {
  protected:
   Sessions() {
@@ -57,12 +62,10 @@ TEST_F(Sessions, AFailingEntryPointLeavesNoInstance) {
 // The address sanitizer also sees that nothing leaks.
 TEST_F(Sessions, WhatATrustedApplicationLeavesOpenEndsWithIt) {
   script<0>.invoke = [](uint32_t, TEE_Param *) {
-    const TEE_UUID b = inner(kTaB);
     TEE_TASessionHandle session;
     TEE_ObjectHandle object;
     EXPECT_NE(TEE_Malloc(100, TEE_MALLOC_FILL_ZERO), nullptr);
-    EXPECT_EQ(TEE_OpenTASession(&b, TEE_TIMEOUT_INFINITE, 0, nullptr, &session, nullptr),
-              TEE_SUCCESS);
+    EXPECT_EQ(open_ta(kTaB, &session), TEE_SUCCESS);
     return create_object("left", "data", TEE_DATA_FLAG_ACCESS_WRITE, &object);
   };
   ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
@@ -119,12 +122,11 @@ TEST_F(Sessions, TheCalleeKnowsItsCallerAndSeesItsMemory) {
     return static_cast<char *>(params[0].memref.buffer)[0] == 'A' ? TEE_ERROR_SHORT_BUFFER : 0;
   };
   script<0>.invoke = [](uint32_t, TEE_Param *) {
-    const TEE_UUID b = inner(kTaB);
     TEE_TASessionHandle session;
     uint32_t origin = 0;
     char bytes[] = "AA";
     TEE_Param params[4] = {{.memref = {bytes, 2}}};
-    TEE_OpenTASession(&b, TEE_TIMEOUT_INFINITE, 0, nullptr, &session, nullptr);
+    EXPECT_EQ(open_ta(kTaB, &session), TEE_SUCCESS);
     EXPECT_EQ(TEE_InvokeTACommand(session, TEE_TIMEOUT_INFINITE, 5, TEE_PARAM_TYPE_MEMREF_INOUT,
                                   params, &origin),
               TEE_ERROR_SHORT_BUFFER);
@@ -135,6 +137,24 @@ TEST_F(Sessions, TheCalleeKnowsItsCallerAndSeesItsMemory) {
   };
   ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
   EXPECT_EQ(client.invoke(0), TEEC_SUCCESS);
+}
+
+// They would wait for each other.
+TEST_F(Sessions, CyclesAreRefused) {
+  std::vector<TEE_Result> back;
+  TEE_TASessionHandle session;
+  const auto back_to_a = [&](uint32_t, TEE_Param *) {
+    back.push_back(open_ta(kTaA, &session));
+    return TEE_SUCCESS;
+  };
+  script<0>.create = [&] { return open_ta(kTaB, &session); };
+  script<0>.invoke = script<1>.invoke = back_to_a;
+  script<1>.open = [&] { return back_to_a(0, nullptr); };
+  Client of_b(device.name());
+  ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);  // B opens A while A is created
+  ASSERT_EQ(of_b.open(kTaB), TEEC_SUCCESS);    // B opens A, which has a session with B
+  EXPECT_EQ(client.invoke(0), TEEC_SUCCESS);   // A opens A
+  EXPECT_EQ(back, std::vector<TEE_Result>(3, TEE_ERROR_BUSY));
 }
 
 // ---- Parameters
