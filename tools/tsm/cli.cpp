@@ -3,8 +3,9 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <functional>
 #include <string>
+#include <variant>
+#include <vector>
 
 #include "common/error_line.h"
 #include "tsm/commands.h"
@@ -133,7 +134,90 @@ void add_message_options(CLI::App *command, const MessageHelp &help, Arguments *
       ->check(validator(check_plain));
 }
 
-using RunFunction = int (*)(const Arguments &);
+/// A positional word, which is required, or an option, whose name begins with a hyphen.
+struct Parameter {
+  const char *names;
+  std::variant<std::string Arguments::*, std::vector<std::string> Arguments::*, bool Arguments::*>
+      value;
+  const char *help;
+  bool is_required = false;
+};
+
+struct Command {
+  const char *name;
+  int (*run)(const Arguments &);  // NULL where one of `commands` has to follow
+  const char *help;
+  std::vector<Parameter> parameters;
+  const char *example;
+  std::span<const Command> commands = {};
+  const char *message_example = nullptr;  // what its messages' examples begin with, if it has any
+};
+
+const Parameter kDevice = {"--device", &Arguments::device_file,
+                           "Device file: what `otrp-device info` prints"};
+const Parameter kOneDevice = {kDevice.names, kDevice.value, kDevice.help, true};
+const Parameter kDsi = {"--dsi", &Arguments::dsi_file,
+                        "Device state document (default: the one kept in the home)"};
+const Parameter kDsiOut = {"--dsi-out", &Arguments::dsi_out_file,
+                           "Write the device state document here"};
+const Parameter kJson = {"--json", &Arguments::json, "Print JSON"};
+
+const Command kImageCommands[] = {
+    {"pack",
+     run_image_pack,
+     "Put a TA image header before any file",
+     {{"FILE", &Arguments::input_file, "The file to wrap"},
+      {"-o,--output", &Arguments::output_file, "The image", true}},
+     "image pack app.ta -o app.img"},
+    {"show",
+     run_image_show,
+     "Show the header of a TA image",
+     {{"IMAGE", &Arguments::input_file, "The image"}, kJson},
+     "image show app.img"},
+};
+
+const Command kCommands[] = {
+    {"init",
+     run_init,
+     "Make this TSM: its key, admitted by the CA-TSM",
+     {{"--tsmid", &Arguments::tsmid, "This TSM's ID (default: a random one)"},
+      {"--ca", &Arguments::ca_file,
+       "PEM file of the CA-TSM's private key (default: the development key)"}},
+     "init --tsmid tsm1"},
+    {"request",
+     run_request,
+     "Write a signed request",
+     {kOneDevice, kDsi, {"-o,--output", &Arguments::output_file, "Where to write it (default: -)"}},
+     "request get-device-state --device device.json > request.json",
+     {},
+     "request --device device.json "},
+    {"response",
+     run_response,
+     "Verify, decrypt and show a response, and keep the device state",
+     {{"RESPONSE", &Arguments::response_file, "The device's response"},
+      kOneDevice,
+      kDsi,
+      kDsiOut,
+      kJson},
+     "response response.json --device device.json --dsi-out dsi.json"},
+    {"image", nullptr, "Pack and show TA images", {}, "image show app.img", kImageCommands},
+    {"manage",
+     run_manage,
+     "Request, send and read the response, with a device on this machine",
+     {{"--state", &Arguments::state_dir, "The device's state directory", true},
+      kDsiOut,
+      {"--image-out", &Arguments::image_out_file,
+       "Write the TA image that the device hands back here"},
+      kJson},
+     "manage --state ./device get-device-state",
+     {},
+     "manage --state ./device "},
+    {"show",
+     run_show,
+     "Show the last known state of devices as a tree",
+     {kDevice, {"--dsi", &Arguments::dsi_file, "Show this device state document"}, kJson},
+     "show --device device.json"},
+};
 
 CLI::App *add_command(CLI::App *parent, const std::string &name, const std::string &description,
                       const std::string &example) {
@@ -143,11 +227,26 @@ CLI::App *add_command(CLI::App *parent, const std::string &name, const std::stri
   return command;
 }
 
+CLI::Option *add_value(CLI::App *app, const char *names, bool &value) {
+  return app->add_flag(names, value);
+}
+template <class Value>
+CLI::Option *add_value(CLI::App *app, const char *names, Value &value) {
+  return app->add_option(names, value);
+}
+
+void add_parameter(CLI::App *app, const Parameter &parameter, Arguments *arguments) {
+  const auto add = [&](auto value) { return add_value(app, parameter.names, arguments->*value); };
+  CLI::Option *option = std::visit(add, parameter.value);
+  option->description(parameter.help);
+  option->required(parameter.is_required || *parameter.names != '-');
+}
+
 void add_messages(CLI::App *parent, const std::string &example_start, Arguments *arguments) {
   parent->require_subcommand(1);
   for (const MessageHelp &help : kMessageHelps) {
     const std::string name(message_of(help.id).command);
-    std::string example = example_start + " " + name;
+    std::string example = example_start + name;
     if (*help.example != '\0') example += " " + std::string(help.example);
     CLI::App *message = add_command(parent, name, help.description, example);
     add_message_options(message, help, arguments);
@@ -155,83 +254,17 @@ void add_messages(CLI::App *parent, const std::string &example_start, Arguments 
   }
 }
 
-void add_device_option(CLI::App *command, Arguments *arguments) {
-  command->add_option("--device", arguments->device_file,
-                      "Device file: what `otrp-device info` prints");
-}
-
-void add_dsi_option(CLI::App *command, Arguments *arguments) {
-  command->add_option("--dsi", arguments->dsi_file,
-                      "Device state document (default: the one kept in the home)");
-}
-
-void add_json_flag(CLI::App *command, Arguments *arguments) {
-  command->add_flag("--json", arguments->json, "Print JSON");
-}
-
-void add_commands(CLI::App *app, Arguments *arguments, RunFunction *run) {
-  const auto runs = [run](CLI::App *command, RunFunction function) {
-    command->final_callback([run, function] { *run = function; });
-  };
-
-  CLI::App *init = add_command(app, "init", "Make this TSM: its key, admitted by the CA-TSM",
-                               "init --tsmid tsm1");
-  init->add_option("--tsmid", arguments->tsmid, "This TSM's ID (default: a random one)");
-  init->add_option("--ca", arguments->ca_file,
-                   "PEM file of the CA-TSM's private key (default: the development key)");
-  runs(init, run_init);
-
-  CLI::App *request = add_command(app, "request", "Write a signed request",
-                                  "request get-device-state --device device.json > request.json");
-  add_device_option(request, arguments);
-  request->get_option("--device")->required();
-  add_dsi_option(request, arguments);
-  request->add_option("-o,--output", arguments->output_file, "Where to write it (default: -)");
-  add_messages(request, "request --device device.json", arguments);
-  runs(request, run_request);
-
-  CLI::App *response =
-      add_command(app, "response", "Verify, decrypt and show a response, and keep the device state",
-                  "response response.json --device device.json --dsi-out dsi.json");
-  response->add_option("RESPONSE", arguments->response_file, "The device's response")->required();
-  add_device_option(response, arguments);
-  response->get_option("--device")->required();
-  add_dsi_option(response, arguments);
-  response->add_option("--dsi-out", arguments->dsi_out_file,
-                       "Write the device state document here");
-  add_json_flag(response, arguments);
-  runs(response, run_response);
-
-  CLI::App *image = add_command(app, "image", "Pack and show TA images", "image show app.img");
-  image->require_subcommand(1);
-  CLI::App *pack = add_command(image, "pack", "Put a TA image header before any file",
-                               "image pack app.ta -o app.img");
-  pack->add_option("FILE", arguments->input_file, "The file to wrap")->required();
-  pack->add_option("-o,--output", arguments->output_file, "The image")->required();
-  runs(pack, run_image_pack);
-  CLI::App *show_image =
-      add_command(image, "show", "Show the header of a TA image", "image show app.img");
-  show_image->add_option("IMAGE", arguments->input_file, "The image")->required();
-  add_json_flag(show_image, arguments);
-  runs(show_image, run_image_show);
-
-  CLI::App *manage = add_command(
-      app, "manage", "Request, send and read the response, with a device on this machine",
-      "manage --state ./device get-device-state");
-  manage->add_option("--state", arguments->state_dir, "The device's state directory")->required();
-  manage->add_option("--dsi-out", arguments->dsi_out_file, "Write the device state document here");
-  manage->add_option("--image-out", arguments->image_out_file,
-                     "Write the TA image that the device hands back here");
-  add_json_flag(manage, arguments);
-  add_messages(manage, "manage --state ./device", arguments);
-  runs(manage, run_manage);
-
-  CLI::App *show = add_command(app, "show", "Show the last known state of devices as a tree",
-                               "show --device device.json");
-  add_device_option(show, arguments);
-  show->add_option("--dsi", arguments->dsi_file, "Show this device state document");
-  add_json_flag(show, arguments);
-  runs(show, run_show);
+/// `chosen` becomes the command that the command line names.
+void add_commands(CLI::App *app, std::span<const Command> commands, Arguments *arguments,
+                  const Command **chosen) {
+  app->require_subcommand(1);
+  for (const Command &row : commands) {
+    CLI::App *command = add_command(app, row.name, row.help, row.example);
+    for (const Parameter &parameter : row.parameters) add_parameter(command, parameter, arguments);
+    if (row.message_example != nullptr) add_messages(command, row.message_example, arguments);
+    if (!row.commands.empty()) add_commands(command, row.commands, arguments, chosen);
+    if (row.run != nullptr) command->final_callback([chosen, &row] { *chosen = &row; });
+  }
 }
 
 /// The commands that the deepest command on the line can be followed by.
@@ -254,7 +287,6 @@ std::string explain(const CLI::ParseError &error, const CLI::App &app) {
 int parse_and_run(std::span<char *> words) {
   CLI::App app("A Trusted Service Manager: makes requests for OTrP devices, reads their responses.",
                kProgram);
-  app.require_subcommand(1);
   app.footer(
       "Example: otrp-tsm init && otrp-tsm manage --state ./device get-device-state\n\n"
       "Exit codes: 0 done, 1 the device refused, 2 wrong input, 3 a response that does not "
@@ -262,15 +294,15 @@ int parse_and_run(std::span<char *> words) {
   Arguments arguments;
   app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
   app.add_option("--home", arguments.home, "This TSM's home directory")->capture_default_str();
-  RunFunction run = nullptr;
-  add_commands(&app, &arguments, &run);
+  const Command *chosen = nullptr;
+  add_commands(&app, kCommands, &arguments, &chosen);
   try {
     app.parse(static_cast<int>(words.size()), words.data());
   } catch (const CLI::ParseError &error) {
     if (error.get_exit_code() == 0) return app.exit(error);  // help or version
     throw tools::UsageError(explain(error, app));
   }
-  return run(arguments);
+  return chosen->run(arguments);
 }
 
 }  // namespace
