@@ -13,6 +13,7 @@ install(TARGETS otrp-device otrp-tsm RUNTIME)
 install(TARGETS tee EXPORT otrp-tee LIBRARY)
 install(TARGETS otrp_agent_image corvel_image LIBRARY DESTINATION ${otrp_ta_dir})
 install(FILES tee/include/tee_client_api.h tee/include/tee_inspect.h
+  ${CMAKE_BINARY_DIR}/include/otrp.h
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/otrp)
 install(FILES keys/dev-ca-tsm.pem DESTINATION ${otrp_data_dir})
 

@@ -6,6 +6,7 @@
 #include <limits>
 #include <nlohmann/json.hpp>
 
+#include "common/agent_codes.h"
 #include "common/encoding.h"
 #include "common/error_line.h"
 #include "common/result_names.h"
@@ -15,21 +16,24 @@
 namespace device {
 namespace {
 
-constexpr uint32_t kMessageCommand = 0;
-constexpr uint32_t kQueryCommand = 1;
-constexpr uint32_t kDeviceIdCommand = 2;
 constexpr uint32_t kPublicIdentityCommand = 0x100;  // of the key service
 
 constexpr size_t kWordLen = 4;
-constexpr uint32_t kImageDidNotFit = 0xDEAD1002;  // as a status beside a response
+constexpr uint32_t kImageDidNotFit = OTRP_NO_MEMORY;  // as a status beside a response
 
 constexpr uint32_t kQueryCapacity = 256;  // answers are texts of about 50 characters
 constexpr uint32_t kDeviceIdCapacity = 256;
 constexpr size_t kPublicKeyCapacity = 1024;
 
 constexpr Message kMessages[] = {
-    {"get-device-state", 1}, {"install-ta", 2}, {"update-ta", 3}, {"delete-ta", 4},
-    {"create-sd", 5},        {"update-sd", 6},  {"delete-sd", 7}, {"get-ta-info", 8},
+    {"get-device-state", OTRP_GET_DEVICE_STATE},
+    {"install-ta", OTRP_INSTALL_TA},
+    {"update-ta", OTRP_UPDATE_TA},
+    {"delete-ta", OTRP_DELETE_TA},
+    {"create-sd", OTRP_CREATE_SD},
+    {"update-sd", OTRP_UPDATE_SD},
+    {"delete-sd", OTRP_DELETE_SD},
+    {"get-ta-info", OTRP_GET_TA_INFO},
 };
 
 const char *origin_text(Origin origin) {
@@ -50,10 +54,9 @@ const char *origin_text(Origin origin) {
   return "result of unknown origin";
 }
 
-std::string code_text(TEEC_Result code, const tools::ResultName *result) {
-  char number[sizeof("0x00000000")];
-  snprintf(number, sizeof(number), "0x%08x", code);
-  return result == nullptr ? number : std::string(number) + " (" + result->name + ")";
+std::string named_code(TEEC_Result code, const tools::ResultName *result) {
+  const std::string number = tools::code_text(code);
+  return result == nullptr ? number : number + " (" + result->name + ")";
 }
 
 /// The TEE knows more of its own failures than their codes; codes of others have hints.
@@ -61,14 +64,14 @@ std::string explanation(const tools::ResultName *result, Origin origin) {
   const bool is_of_tee =
       origin == Origin::kClientApi || origin == Origin::kCommunication || origin == Origin::kTee;
   const std::string reason = is_of_tee && inspection() ? inspection()->last_error() : "";
-  return reason.empty() && result != nullptr ? result->hint : reason;
+  return reason.empty() && result != nullptr ? tools::advice(*result) : reason;
 }
 
 std::string error_text(std::string_view action, TEEC_Result code, Origin origin,
                        std::string_view detail) {
   const tools::ResultName *result = tools::find_result(code);
   const std::string why = detail.empty() ? explanation(result, origin) : std::string(detail);
-  return std::string(action) + ": " + code_text(code, result) + ", " + origin_text(origin) +
+  return std::string(action) + ": " + named_code(code, result) + ", " + origin_text(origin) +
          (why.empty() ? "" : ": ") + why;
 }
 
@@ -133,7 +136,7 @@ std::string written(const Buffer &buffer, size_t size) {
 
 }  // namespace
 
-const TEEC_UUID kAgentUuid = DEVICE_AGENT_UUID;
+const TEEC_UUID kAgentUuid = OTRP_AGENT_UUID;
 const TEEC_UUID kKeyServiceUuid = DEVICE_KEY_SERVICE_UUID;
 
 Error::Error(std::string_view action, TEEC_Result code, Origin origin, std::string_view detail)
@@ -260,7 +263,7 @@ Answer parse_answer(std::string_view buffer, size_t size) {
 }
 
 Answer send(Session &agent, const Message &message, std::string_view request, uint32_t capacity) {
-  const Reply reply = agent.invoke({.command_id = kMessageCommand,
+  const Reply reply = agent.invoke({.command_id = OTRP_COMMAND_MESSAGE,
                                     .input = Buffer(build_frame(message.id, request)),
                                     .capacity = capacity});
   if (reply.result != TEEC_SUCCESS) throw Error(message.name, reply.result, reply.origin);
@@ -278,7 +281,7 @@ void require_success(const Message &message, const Answer &answer) {
 }
 
 QueryAnswer query(Session &agent, std::string_view taid) {
-  const Reply reply = agent.invoke({.command_id = kQueryCommand,
+  const Reply reply = agent.invoke({.command_id = OTRP_COMMAND_STATUS_QUERY,
                                     .input = Buffer(build_query(taid)),
                                     .capacity = kQueryCapacity});
   // A failure's answer, where there is one, repeats the result as its status word.
@@ -290,8 +293,8 @@ QueryAnswer query(Session &agent, std::string_view taid) {
 }
 
 std::string device_id(Session &agent) {
-  const Reply reply =
-      agent.invoke({.command_id = kDeviceIdCommand, .input = {}, .capacity = kDeviceIdCapacity});
+  const Reply reply = agent.invoke(
+      {.command_id = OTRP_COMMAND_DEVICE_ID, .input = {}, .capacity = kDeviceIdCapacity});
   if (reply.result != TEEC_SUCCESS) throw Error("device-id", reply.result, reply.origin);
   return written(reply.output, reply.size);
 }

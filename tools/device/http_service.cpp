@@ -6,6 +6,7 @@
 #include <limits>
 #include <nlohmann/json.hpp>
 
+#include "common/agent_codes.h"
 #include "common/error_line.h"
 #include "common/result_names.h"
 #include "device/info_json.h"
@@ -22,24 +23,24 @@ struct StatusOfCode {
 
 constexpr int kUnexpected = 500;  // of every other code
 constexpr StatusOfCode kStatuses[] = {
-    {0xDEAD0006, 400},  // OTRP_BAD_REQUEST
-    {0xDEAD1004, 400},  // OTRP_MISSING
+    {OTRP_BAD_REQUEST, 400},
+    {OTRP_MISSING, 400},
     {TEEC_ERROR_BAD_PARAMETERS, 400},
     {TEEC_ERROR_BAD_FORMAT, 400},
-    {0xDEAD0010, 403},  // OTRP_CA_CHECK_FAILED
+    {OTRP_CA_CHECK_FAILED, 403},
     {TEEC_ERROR_ACCESS_DENIED, 403},
-    {0xDEAD000A, 404},  // OTRP_NOT_FOUND
-    {0xDEAD1005, 404},  // OTRP_SP_NOT_FOUND
+    {OTRP_NOT_FOUND, 404},
+    {OTRP_SP_NOT_FOUND, 404},
     {TEEC_ERROR_ITEM_NOT_FOUND, 404},
-    {0xDEAD0001, 409},  // OTRP_DSI_MISMATCH
-    {0xDEAD0002, 409},  // OTRP_SD_EXISTS
-    {0xDEAD0004, 409},  // OTRP_SD_MISMATCH
-    {0xDEAD0008, 409},  // OTRP_TA_EXISTS
-    {0xDEAD0007, 422},  // OTRP_TA_DECRYPT_FAILED
-    {0xDEAD1002, 422},  // OTRP_NO_MEMORY: also a value that cannot be decoded
+    {OTRP_DSI_MISMATCH, 409},
+    {OTRP_SD_EXISTS, 409},
+    {OTRP_SD_MISMATCH, 409},
+    {OTRP_TA_EXISTS, 409},
+    {OTRP_TA_DECRYPT_FAILED, 422},
+    {OTRP_NO_MEMORY, 422},  // also a value that cannot be decoded
     {TEEC_ERROR_BUSY, 503},
     {TEEC_ERROR_OUT_OF_MEMORY, 507},
-    {0xFFFF3041, 507},  // TEE_ERROR_STORAGE_NO_SPACE
+    {tools::kStorageNoSpace, 507},
 };
 
 int status_of(uint32_t code) {
