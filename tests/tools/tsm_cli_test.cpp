@@ -116,6 +116,7 @@ TEST_F(TsmProgram, WrongInputGetsOneLineAndLeavesNoFile) {
       "request delete-sd --sd sd --delete-ta maybe" + device,
       "response missing.json --device device.json",
       "image show ca.pem",
+      "explain 0xdead0003",
       "image pack missing -o made.json",
       "--home nowhere request get-device-state" + device,
       "--home new init --tsmid 'a b' --ca ca.pem",

@@ -63,7 +63,8 @@ constexpr ResultName kResults[] = {
     {NAMED(OTRP_SP_NOT_FOUND), "the device has no record of this service provider",
      "create a security domain for it"},
     {NAMED(OTRP_VALUE_MISSING),
-     "a text that is to be recorded is missing: \"tsmid\", or \"spcert\" of a new service provider",
+     "a text that is to be recorded is missing or no string: \"tsmid\", or \"spcert\" of a new "
+     "service provider",
      "add it; send GetDeviceState, since the state may have changed"},
     {0xF0100001, "TEE_ERROR_CORRUPT_OBJECT", "the device's storage is damaged",
      "restore the device's storage"},

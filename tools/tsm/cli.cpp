@@ -9,6 +9,7 @@
 
 #include "common/error_line.h"
 #include "tsm/commands.h"
+#include "tsm/explain.h"
 #include "tsm/response.h"
 
 namespace tsm {
@@ -217,6 +218,13 @@ const Command kCommands[] = {
      "Show the last known state of devices as a tree",
      {kDevice, {"--dsi", &Arguments::dsi_file, "Show this device state document"}, kJson},
      "show --device device.json"},
+    {"explain",
+     run_explain,
+     "Say what result codes mean, and what to do next",
+     {{"CODE", &Arguments::codes,
+       "0xdead0001, 3735879681, OTRP_DSI_MISMATCH, dsi_mismatch; or all"},
+      kJson},
+     "explain 0xdead0001"},
 };
 
 CLI::App *add_command(CLI::App *parent, const std::string &name, const std::string &description,

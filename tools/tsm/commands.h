@@ -5,6 +5,7 @@
 #define TSM_COMMANDS_H
 
 #include <string>
+#include <vector>
 
 #include "tsm/messages.h"
 #include "tsm/request.h"
@@ -28,6 +29,7 @@ struct Arguments {
   std::string image_out_file;
   std::string spcert;  // a file, or the certificate itself
   std::string state_dir;
+  std::vector<std::string> codes;  // to explain
   bool json = false;
   MessageId message = MessageId::kGetDeviceState;
   RequestOptions request;
