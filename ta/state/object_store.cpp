@@ -13,6 +13,12 @@ namespace {
 constexpr uint32_t kLengthLen = 4;
 }
 
+// A platform that finds an object corrupt has closed its handle by itself.
+static TEE_Result checked(stored_object *object, TEE_Result result) {
+  if (result == TEE_ERROR_CORRUPT_OBJECT) (void)object->release();
+  return result;
+}
+
 static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id_len,
                                  bool overwrite, stored_object *object) {
   TEE_Result result = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
@@ -29,44 +35,32 @@ static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id
   return TEE_SUCCESS;
 }
 
-// The length prefix of an object that exists; false when there is none to read.
-static bool read_prefix(const char *id, uint32_t id_len, uint8_t *prefix) {
-  stored_object object;
-  const TEE_Result opened =
-      TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
-                               TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_SHARE_READ, out(object));
-  if (opened != TEE_SUCCESS) return false;
-  tee_length count = 0;
-  return TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count) == TEE_SUCCESS &&
-         count == kLengthLen;
-}
-
-static void put_prefix_back(const char *id, uint32_t id_len, const uint8_t *prefix) {
-  stored_object object;
-  const TEE_Result opened = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
-                                                     TEE_DATA_FLAG_ACCESS_WRITE, out(object));
-  if (opened == TEE_SUCCESS) (void)TEE_WriteObjectData(object.get(), prefix, kLengthLen);
+// The data stream of a record: length and payload.
+static TEE_Result join_stream(const char *caller, const void *data, uint32_t len,
+                              secret_bytes *stream) {
+  if (len <= UINT32_MAX - kLengthLen) stream->data = allocate_bytes(kLengthLen + len);
+  CHECK_AS(caller, stream->data != nullptr, TEE_ERROR_OUT_OF_MEMORY,
+           "No memory for buffer (size %u)", len);
+  stream->len = kLengthLen + len;
+  put_u32(stream->data, len);
+  if (len != 0) memcpy(stream->data + kLengthLen, data, len);
+  return TEE_SUCCESS;
 }
 
 TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const char *id,
                                           uint32_t id_len, bool overwrite) {
   CHECK(id_len <= TEE_OBJECT_ID_MAX_LEN, TEE_ERROR_BAD_PARAMETERS, "pobj_id length too large\n");
 
-  uint8_t old_prefix[kLengthLen];
-  const bool has_old = read_prefix(id, id_len, old_prefix);
+  // Before the object is touched: for want of memory nothing is created.
+  secret_bytes stream;
+  TRY(join_stream(__func__, data, len, &stream));
   stored_object object;
   TRY(open_or_create(__func__, id, id_len, overwrite, &object));
-  uint8_t prefix[kLengthLen];
-  put_u32(prefix, len);
-  TRY_LOG(TEE_WriteObjectData(object.get(), prefix, kLengthLen), "Failed to write data size: 0x%x");
-  const TEE_Result written = TEE_WriteObjectData(object.get(), data, len);
-  if (written == TEE_SUCCESS) return TEE_SUCCESS;
-
-  // The new length before the old payload would cut a record short, and with it the device off.
-  trace_error(__func__, __LINE__, "Failed to write data: 0x%x", written);
-  object.reset();
-  if (has_old) put_prefix_back(id, id_len, old_prefix);
-  return written;
+  // Many platforms make each write durable by itself. A new length before an old payload, left by
+  // a power cut between two writes, would be a record that no start gets past.
+  TRY_LOG(checked(&object, TEE_WriteObjectData(object.get(), stream.data, stream.len)),
+          "Failed to write data: 0x%x");
+  return TEE_SUCCESS;
 }
 
 TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_t id_len,
@@ -88,7 +82,7 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
 
   uint8_t prefix[kLengthLen];
   tee_length count = 0;
-  TRY_LOG(TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count),
+  TRY_LOG(checked(&object, TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count)),
           "Failed to read data size, error code 0x%x\n");
   if (count < kLengthLen) {
     *len = static_cast<uint32_t>(count);
@@ -101,7 +95,7 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
   CHECK(buffer.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",
         stored_len);
   buffer.len = stored_len;
-  TRY_LOG(TEE_ReadObjectData(object.get(), buffer.data, stored_len, &count),
+  TRY_LOG(checked(&object, TEE_ReadObjectData(object.get(), buffer.data, stored_len, &count)),
           "Failed to read data, error code 0x%x\n");
   *data = buffer.release();
   *len = static_cast<uint32_t>(count);

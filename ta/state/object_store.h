@@ -16,9 +16,11 @@
 
 #include "state/json.h"
 
-/// Creates the object or writes it over. `overwrite` is the flag of that name in the creation
-/// call; an existing object is opened and written over either way. When its payload cannot be
-/// written, its old length is put back, so that it still gives its old payload.
+/// Creates the object or writes it over, length and payload in one write: the platform leaves the
+/// old record or the new one, whatever happens meanwhile. A creation that gets no further leaves an
+/// empty object, which readers take for none. `overwrite` is the flag of that name in the creation
+/// call; an existing object is opened and written over either way.
+/// TEE_ERROR_OUT_OF_MEMORY, with nothing changed, when the payload cannot be copied.
 [[nodiscard]] TEE_Result save_data_to_persistent_object(const void *data, uint32_t len,
                                                         const char *id, uint32_t id_len,
                                                         bool overwrite);
