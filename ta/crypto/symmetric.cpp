@@ -38,6 +38,9 @@ static TEE_Result start_gcm(const char *caller, uint32_t mode, const uint8_t *ke
                             const uint8_t *iv, uint32_t iv_len, const uint8_t *aad,
                             uint32_t aad_len, operation *aes) {
   TRY(start_aes(caller, TEE_ALG_AES_GCM, mode, key, key_len, aes));
+  // The sender chose the nonce; TEE_AEInit panics on an empty one.
+  CHECK_AS(caller, iv_len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
+           TEE_ERROR_NOT_SUPPORTED);
   TRY_LOG_AS(caller, TEE_AEInit(aes->get(), iv, iv_len, kGcmTagLen * 8, 0, 0),
              "aes TEE_AEInit error 0x%x\n");
   TEE_AEUpdateAAD(aes->get(), aad, aad_len);
@@ -252,22 +255,35 @@ TEE_Result remove_pkcs_pading_length(const uint8_t *data, uint32_t len, uint32_t
 
 // ---- HMAC-SHA256
 
+// Platforms take HMAC-SHA256 keys of 192 to 1024 bits.
+static constexpr uint32_t kMinHmacKeyLen = 24;
+
+// A shorter key is filled up with zeros, which HMAC itself would do (RFC 2104, 2).
+static TEE_Result populate_hmac_key(TEE_ObjectHandle object, const uint8_t *key, uint32_t key_len) {
+  uint8_t filled[kMinHmacKeyLen] = {};
+  const bool is_short = key_len < kMinHmacKeyLen;
+  if (is_short && key_len != 0) memcpy(filled, key, key_len);
+  TEE_Attribute secret;
+  TEE_InitRefAttribute(&secret, TEE_ATTR_SECRET_VALUE, is_short ? filled : key,
+                       is_short ? kMinHmacKeyLen : key_len);
+  const TEE_Result result = TEE_PopulateTransientObject(object, &secret, 1);
+  wipe(filled, sizeof filled);
+  return result;
+}
+
 // `mac` holds kHmacSha256Len bytes. `final_text` is what the caller says of a failed last step.
 static TEE_Result hmac_sha256(const char *caller, const char *final_text, const uint8_t *data,
                               uint32_t data_len, const uint8_t *key, uint32_t key_len, uint8_t *mac,
                               uint32_t *mac_len) {
+  const uint32_t bits = 8 * (key_len < kMinHmacKeyLen ? kMinHmacKeyLen : key_len);
   key_object key_holder;
-  TRY_LOG_AS(caller,
-             TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, key_len * 8, out(key_holder)),
+  TRY_LOG_AS(caller, TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, bits, out(key_holder)),
              "Failed in TEE_AllocateTransientObject 0x%x\n");
-  TEE_Attribute secret;
-  TEE_InitRefAttribute(&secret, TEE_ATTR_SECRET_VALUE, key, key_len);
-  TRY_LOG_AS(caller, TEE_PopulateTransientObject(key_holder.get(), &secret, 1),
+  TRY_LOG_AS(caller, populate_hmac_key(key_holder.get(), key, key_len),
              "Failed in TEE_PopulateTransientObject 0x%x\n");
 
   operation hmac;
-  TRY_LOG_AS(caller,
-             TEE_AllocateOperation(out(hmac), TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, key_len * 8),
+  TRY_LOG_AS(caller, TEE_AllocateOperation(out(hmac), TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, bits),
              "Failed in TEE_AllocateOperation 0x%x\n");
   TRY_LOG_AS(caller, TEE_SetOperationKey(hmac.get(), key_holder.get()),
              "Failed in TEE_SetOperationKey 0x%x\n");

@@ -56,5 +56,26 @@ TEST_F(Symmetric, LengthsThatASenderGetsWrongAreRefusedAndTheBufferFreed) {
   }
 }
 
+TEST_F(Symmetric, ShortHmacKeysGiveThePublishedMacs) {
+  const struct {
+    std::string key;
+    std::string text;
+    std::string tag;
+  } cases[] = {
+      // RFC 4231, test cases 1 and 2
+      {std::string(20, '\x0b'), "Hi There",
+       "\xb0\x34\x4c\x61\xd8\xdb\x38\x53\x5c\xa8\xaf\xce\xaf\x0b\xf1\x2b"},
+      {"Jefe", "what do ya want for nothing?",
+       "\x5b\xdc\xc1\x46\xbf\x60\x75\x4e\x6a\x04\x24\x26\x08\x95\x75\xc7"},
+  };
+  for (const auto &c : cases) {
+    secret_bytes mac;
+    ASSERT_EQ(Compute_HmacSha256(u8(c.text), len_of(c.text), u8(c.key), len_of(c.key), &mac.data,
+                                 &mac.len),
+              TEE_SUCCESS);
+    EXPECT_EQ(str(mac), c.tag);
+  }
+}
+
 }  // namespace
 }  // namespace otrp_test
