@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// Requests that a handler refuses: the code in "reason", which members the answer has, and what is
-// stored afterwards.
+// Requests that a handler refuses: the code in "reason", which members the answer has, what the log
+// says (log_lines.txt), and what is stored afterwards.
 #include <gtest/gtest.h>
 
+#include "support/log_rows.h"
 #include "support/scene.h"
 
 namespace otrp_test {
@@ -65,6 +66,7 @@ const RefusalCase kRefusals[] = {
     {"CreateNoCertForANewSp", kCreate, kContent, {{"spcert", nullptr}}, kSetterFailed, kWithIds},
 
     {"UpdateSdStaleHash", kUpdate, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithoutIds},
+    {"UpdateSdNoRid", kUpdate, kTbs, {{"rid", nullptr}}, kBadRequest, kWithoutIds},
     {"UpdateSdContentIsText", kUpdate, kTbs, {{"content", "text"}}, kNoMemory, kWithoutIds},
     {"UpdateSdGarbledContent", kUpdate, kTbs, kGarbledContent, kBadRequest, kWithoutIds},
     {"UpdateSdContentIsAnArray", kUpdate, kContent, kNoObject, kNoMemory, kWithoutIds},
@@ -83,8 +85,10 @@ const RefusalCase kRefusals[] = {
     {"DeleteSdNoFlag", kDelete, kContent, {{"deleteta", nullptr}}, kBadRequest, kWithIds},
 
     {"InstallStaleHash", kInstall, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithIds},
+    {"InstallNoRid", kInstall, kTbs, {{"rid", nullptr}}, kBadRequest, kWithoutIds},
     {"InstallNoImage", kInstall, kTbs, {{"encrypted_ta", nullptr}}, kNoMemory, kWithIds},
     {"InstallContentIsText", kInstall, kTbs, {{"content", "text"}}, kNoMemory, kWithIds},
+    {"InstallContentIsAnArray", kInstall, kContent, kNoObject, kNoMemory, kWithIds},
     {"InstallGarbledContent", kInstall, kTbs, kGarbledContent, kBadRequest, kWithIds},
     {"InstallOtherTransaction", kInstall, kTbs, {{"tid", "another"}}, kCaCheckFailed, kWithIds},
     {"InstallKeyNotBase64", kInstall, kTbs, image_with("key", "!"), kNotDecrypted, kWithIds},
@@ -102,12 +106,16 @@ const RefusalCase kRefusals[] = {
     {"InstallTaidTooLong", kInstall, kTbs, {}, kBadParameters, kWithIds, kTooLong},
 
     {"UpdateTaStaleHash", kUpdateTa, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithoutIds},
+    {"UpdateTaNoRid", kUpdateTa, kTbs, {{"rid", nullptr}}, kBadRequest, kWithoutIds},
+    {"UpdateTaContentIsText", kUpdateTa, kTbs, {{"content", "text"}}, kNoMemory, kWithoutIds},
+    {"UpdateTaContentIsAnArray", kUpdateTa, kContent, kNoObject, kNoMemory, kWithoutIds},
     {"UpdateTaNoImage", kUpdateTa, kTbs, {{"encrypted_ta", nullptr}}, kNoMemory, kWithoutIds},
     {"UpdateTaBadSignature2", kUpdateTa, kEnvelope, kBadSignature2, kCaCheckFailed, kWithoutIds},
     {"UpdateTaNotListed", kUpdateTa, kTbs, {}, kNotFound, kWithIds, taid("ta9")},
 
     {"DeleteTaStaleHash", kDeleteTa, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithoutIds},
     {"DeleteTaGarbledContent", kDeleteTa, kTbs, kGarbledContent, kBadRequest, kWithoutIds},
+    {"DeleteTaContentIsAnArray", kDeleteTa, kContent, kNoObject, kMissing, kWithoutIds},
     {"DeleteTaOtherTsm", kDeleteTa, kContent, {{"tsmid", "tsm2"}}, kMismatch, kWithoutIds},
     {"DeleteTaUnknownSd", kDeleteTa, kContent, {{"sdname", "sd9"}}, kNotFound, kWithoutIds},
     {"DeleteTaNoTaid", kDeleteTa, kContent, {{"taid", nullptr}}, kMissing, kWithoutIds},
@@ -120,7 +128,8 @@ class Refusals : public testing::Test {
   void SetUp() override { scene.furnish(); }
   void TearDown() override { scene.device.expect_clean(); }
 
-  const tee::test::TraceSink log;
+  tee::test::TraceSink log;
+  const LogRows log_rows = read_log_rows();
   Scene scene;
 };
 
@@ -148,7 +157,9 @@ TEST_F(Refusals, SayWhyAndChangeNothing) {
     if (!c.taid.empty()) options.taid = c.taid;
     Edits edits;
     if (!c.patch.is_null()) edits.*c.part = patch(c.patch);
+    log.clear();
     expect_refusal(c, device.run(c.id, options, edits));
+    EXPECT_EQ(said(log), row_of(log_rows, c.name));
     EXPECT_EQ(device.device.objects(), snapshot.agent);
     device.device.expect_clean();
     ASSERT_TRUE(device.get_device_state().passed());
