@@ -4,6 +4,7 @@
 #include "crypto/base64.h"
 #include "crypto/rsa.h"
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "record_names.h"
 #include "state/object_store.h"

@@ -5,9 +5,9 @@
 #define AIK_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "crypto/tlv_box.h"
+#include "platform.h"
 
 /// A box, not serialized yet, with a new 2048-bit key pair.
 [[nodiscard]] TEE_Result generate_aik(tlv_box **box);

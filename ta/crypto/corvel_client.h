@@ -8,7 +8,8 @@
 #define CORVEL_CLIENT_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
+
+#include "platform.h"
 
 [[nodiscard]] TEE_Result open_corvel_session(TEE_TASessionHandle *session);
 

@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/rsa.h"
 
-#include <string.h>
-
 #include "crypto/symmetric.h"
 #include "failure.h"
 #include "little_endian.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
 
@@ -201,16 +200,16 @@ TEE_Result parse_key_tlv_box_to_encoded_pubkey(const tlv_box *box, uint8_t **enc
 
 // ---- Operations
 
-static TEE_Result start_rsa(TEE_ObjectHandle key, uint32_t bits, uint32_t algorithm, uint32_t mode,
-                            operation *rsa) {
+static TEE_Result start_rsa(TEE_ObjectHandle key, uint32_t bits, uint32_t algorithm,
+                            TEE_OperationMode mode, operation *rsa) {
   TRY(TEE_AllocateOperation(out(*rsa), algorithm, mode, bits));
   return TEE_SetOperationKey(rsa->get(), key);
 }
 
 // TEE_AsymmetricEncrypt and TEE_AsymmetricDecrypt have the same form.
-static TEE_Result rsaes(TEE_ObjectHandle key, uint32_t mode, decltype(&TEE_AsymmetricEncrypt) run,
-                        const uint8_t *input, uint32_t input_len, uint8_t **output,
-                        uint32_t *output_len) {
+static TEE_Result rsaes(TEE_ObjectHandle key, TEE_OperationMode mode,
+                        decltype(&TEE_AsymmetricEncrypt) run, const uint8_t *input,
+                        uint32_t input_len, uint8_t **output, uint32_t *output_len) {
   *output = nullptr;
   *output_len = 0;
   uint32_t bits = 0;
@@ -241,7 +240,7 @@ TEE_Result rsa_decrypt(TEE_ObjectHandle key, const uint8_t *input, uint32_t inpu
 }
 
 // The digest of the parts, in a buffer as large as the key, and an operation that has the key.
-static TEE_Result start_rsassa(TEE_ObjectHandle key, uint32_t mode, const data_part *parts,
+static TEE_Result start_rsassa(TEE_ObjectHandle key, TEE_OperationMode mode, const data_part *parts,
                                uint32_t num_parts, tee_ptr<uint8_t> *digest, uint32_t *digest_len,
                                operation *rsa) {
   uint32_t bits = 0;

@@ -16,10 +16,10 @@
 #define RSA_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "crypto/tlv_box.h"
 #include "data_part.h"
+#include "platform.h"
 
 enum rsa_record : uint16_t {
   kRsaKeySize = 0x10,

@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "crypto/symmetric.h"
 
-#include <string.h>
-
 #include "crypto/constant_time.h"
 #include "failure.h"
 #include "ownership.h"
@@ -21,7 +19,7 @@ TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len) {
 }
 
 // The operation keeps a copy of the key, so the key object need not outlive this stage.
-static TEE_Result start_aes(const char *caller, uint32_t algorithm, uint32_t mode,
+static TEE_Result start_aes(const char *caller, uint32_t algorithm, TEE_OperationMode mode,
                             const uint8_t *key, uint32_t key_len, operation *aes) {
   TRY_LOG_AS(caller, TEE_AllocateOperation(out(*aes), algorithm, mode, key_len * 8),
              "TEE_AllocateOperation fail for aes 0x%x\n");
@@ -34,9 +32,9 @@ static TEE_Result start_aes(const char *caller, uint32_t algorithm, uint32_t mod
 
 // ---- AES-GCM
 
-static TEE_Result start_gcm(const char *caller, uint32_t mode, const uint8_t *key, uint32_t key_len,
-                            const uint8_t *iv, uint32_t iv_len, const uint8_t *aad,
-                            uint32_t aad_len, operation *aes) {
+static TEE_Result start_gcm(const char *caller, TEE_OperationMode mode, const uint8_t *key,
+                            uint32_t key_len, const uint8_t *iv, uint32_t iv_len,
+                            const uint8_t *aad, uint32_t aad_len, operation *aes) {
   TRY(start_aes(caller, TEE_ALG_AES_GCM, mode, key, key_len, aes));
   // The sender chose the nonce; TEE_AEInit panics on an empty one.
   CHECK_AS(caller, iv_len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
@@ -120,8 +118,8 @@ TEE_Result aes_gcm_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
 
 // ---- AES-CBC
 
-static TEE_Result start_cbc(const char *caller, uint32_t mode, const uint8_t *key, uint32_t key_len,
-                            const uint8_t *iv, uint32_t iv_len, operation *aes) {
+static TEE_Result start_cbc(const char *caller, TEE_OperationMode mode, const uint8_t *key,
+                            uint32_t key_len, const uint8_t *iv, uint32_t iv_len, operation *aes) {
   TRY(start_aes(caller, TEE_ALG_AES_CBC_NOPAD, mode, key, key_len, aes));
   // The sender chose the IV; TEE_CipherInit panics on a length that is not a block's.
   CHECK_AS(caller, iv_len == kAesBlockLen, TEE_ERROR_BAD_PARAMETERS, "aes update error 0x%x\n",

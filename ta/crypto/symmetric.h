@@ -9,9 +9,9 @@
 #define SYMMETRIC_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "data_part.h"
+#include "platform.h"
 
 constexpr uint32_t kAesBlockLen = 16;
 constexpr uint32_t kGcmTagLen = 16;

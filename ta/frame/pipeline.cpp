@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "frame/pipeline.h"
 
-#include <string.h>
-
 #include "cursor.h"
 #include "failure.h"
 #include "frame/message_table.h"
 #include "message.h"
+#include "otrp_result.h"
 #include "ownership.h"
+#include "platform.h"
 
 namespace {
 

@@ -11,8 +11,8 @@
 #define PIPELINE_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
+#include "platform.h"
 #include "state/token_reader.h"
 
 /// Handles one request. `*out_len` is the capacity of `out` and then what was written; with a TA

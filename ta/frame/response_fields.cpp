@@ -2,6 +2,7 @@
 #include "frame/response_fields.h"
 
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "security/jwe.h"
 #include "security/tsm_trust.h"

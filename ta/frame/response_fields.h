@@ -3,8 +3,7 @@
 #ifndef RESPONSE_FIELDS_H
 #define RESPONSE_FIELDS_H
 
-#include <tee_internal_api.h>
-
+#include "platform.h"
 #include "state/json.h"
 
 struct jsmn_object;

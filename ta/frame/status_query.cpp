@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "frame/status_query.h"
 
-#include <string.h>
-
 #include "cursor.h"
 #include "failure.h"
 #include "ownership.h"
+#include "platform.h"
 #include "state/json.h"
 #include "state/object_store.h"
 

@@ -7,7 +7,8 @@
 #define STATUS_QUERY_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
+
+#include "platform.h"
 
 /// The longest answer with its header: what an output buffer must hold.
 constexpr uint32_t kStatusAnswerLen = 57;

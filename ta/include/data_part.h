@@ -4,7 +4,8 @@
 #define DATA_PART_H
 
 #include <stdint.h>
-#include <string.h>
+
+#include "platform.h"
 
 /// A byte string that stays its owner's.
 struct data_part {

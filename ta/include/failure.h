@@ -3,9 +3,7 @@
 #ifndef FAILURE_H
 #define FAILURE_H
 
-#include <tee_trace.h>
-
-#include "otrp_result.h"
+#include "platform.h"
 
 /// Logs a line of level TEE_TRACE_ERROR.
 #define trace_error(function, line, ...) tee_trace(function, line, TEE_TRACE_ERROR, __VA_ARGS__)

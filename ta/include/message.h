@@ -4,7 +4,8 @@
 #define MESSAGE_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
+
+#include "platform.h"
 
 struct jsmn_object;
 

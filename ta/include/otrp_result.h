@@ -10,26 +10,39 @@
 #ifndef OTRP_RESULT_H
 #define OTRP_RESULT_H
 
-#include <tee_internal_api.h>
+#include "platform.h"
 
 /// Codes of the agent's own. Clients see them as results of an invocation, as status words of
 /// answers, and as "error_code" in responses.
-enum : TEE_Result {
-  OTRP_DSI_MISMATCH = 0xDEAD0001,        // stale DSI hash; foreign TSM; device ID rejected
-  OTRP_SD_EXISTS = 0xDEAD0002,           // CreateSD: the SD name is taken
-  OTRP_SD_MISMATCH = 0xDEAD0004,         // UpdateSD: name, SP or TSM differs from the SD record
-  OTRP_BAD_REQUEST = 0xDEAD0006,         // malformed, unknown, unverifiable or undecryptable
-  OTRP_TA_DECRYPT_FAILED = 0xDEAD0007,   // TA image cannot be decrypted
-  OTRP_TA_EXISTS = 0xDEAD0008,           // TA is in the SD, or registered, already
-  OTRP_NOT_FOUND = 0xDEAD000A,           // no SD or TA record; TA not registered
-  OTRP_DSI_HASH_FAILED = 0xDEAD000C,     // DSI hash cannot be computed
-  OTRP_RESPONSE_FAILED = 0xDEAD000E,     // response not encrypted or signed; SD list or record bad
-  OTRP_CA_CHECK_FAILED = 0xDEAD0010,     // the CA-TSM key does not vouch for it
-  OTRP_TA_INFO_INCOMPLETE = 0xDEAD1001,  // a TA record lacks a member
-  OTRP_NO_MEMORY = 0xDEAD1002,  // no memory, or a value that cannot be built, decoded or parsed
-  OTRP_SD_LIST_BROKEN = 0xDEAD1003,  // the stored SD list is not what it should be
-  OTRP_MISSING = 0xDEAD1004,         // an argument or member is missing; no such entry in the DSI
-  OTRP_SP_NOT_FOUND = 0xDEAD1005,    // no record of the SP
-};
+/// Stale DSI hash; foreign TSM; device ID rejected.
+constexpr TEE_Result OTRP_DSI_MISMATCH = 0xDEAD0001;
+/// CreateSD: the SD name is taken.
+constexpr TEE_Result OTRP_SD_EXISTS = 0xDEAD0002;
+/// UpdateSD: name, SP or TSM differs from the SD record.
+constexpr TEE_Result OTRP_SD_MISMATCH = 0xDEAD0004;
+/// Malformed, unknown, unverifiable or undecryptable.
+constexpr TEE_Result OTRP_BAD_REQUEST = 0xDEAD0006;
+/// TA image cannot be decrypted.
+constexpr TEE_Result OTRP_TA_DECRYPT_FAILED = 0xDEAD0007;
+/// TA is in the SD, or registered, already.
+constexpr TEE_Result OTRP_TA_EXISTS = 0xDEAD0008;
+/// No SD or TA record; TA not registered.
+constexpr TEE_Result OTRP_NOT_FOUND = 0xDEAD000A;
+/// DSI hash cannot be computed.
+constexpr TEE_Result OTRP_DSI_HASH_FAILED = 0xDEAD000C;
+/// Response not encrypted or signed; SD list or record bad.
+constexpr TEE_Result OTRP_RESPONSE_FAILED = 0xDEAD000E;
+/// The CA-TSM key does not vouch for it.
+constexpr TEE_Result OTRP_CA_CHECK_FAILED = 0xDEAD0010;
+/// A TA record lacks a member.
+constexpr TEE_Result OTRP_TA_INFO_INCOMPLETE = 0xDEAD1001;
+/// No memory, or a value that cannot be built, decoded or parsed.
+constexpr TEE_Result OTRP_NO_MEMORY = 0xDEAD1002;
+/// The stored SD list is not what it should be.
+constexpr TEE_Result OTRP_SD_LIST_BROKEN = 0xDEAD1003;
+/// An argument or member is missing; no such entry in the DSI.
+constexpr TEE_Result OTRP_MISSING = 0xDEAD1004;
+/// No record of the SP.
+constexpr TEE_Result OTRP_SP_NOT_FOUND = 0xDEAD1005;
 
 #endif

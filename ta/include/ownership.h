@@ -3,12 +3,7 @@
 #ifndef OWNERSHIP_H
 #define OWNERSHIP_H
 
-#include <stdint.h>
-#include <string.h>
-#include <tee_internal_api.h>
-
-#include <memory>
-#include <type_traits>
+#include "platform.h"
 
 /// Overwrites memory in a way that the compiler may not drop.
 inline void wipe(void *bytes, uint32_t len) {
@@ -21,19 +16,40 @@ inline uint8_t *allocate_bytes(uint32_t len) {
   return static_cast<uint8_t *>(TEE_Malloc(len, TEE_MALLOC_FILL_ZERO));
 }
 
-/// A deleter that calls a function.
-template <auto Free>
-struct freed_by {
-  /// Frees what an owner holds, which is never NULL.
-  template <class T>
-  void operator()(T *p) const {
-    Free(p);
-  }
-};
-
-/// Owns a handle or pointer that `Free` gives back.
+/// Owns the handle or pointer that it was made with, and gives it back with `Free`. Move-only.
 template <class Handle, auto Free>
-using owned = std::unique_ptr<std::remove_pointer_t<Handle>, freed_by<Free>>;
+class owned {
+ public:
+  owned() = default;
+  explicit owned(Handle handle) : handle_(handle) {}
+  owned(owned &&other) : handle_(other.release()) {}
+  owned &operator=(owned &&other) {
+    reset(other.release());
+    return *this;
+  }
+  ~owned() { reset(); }
+
+  Handle get() const { return handle_; }
+  Handle operator->() const { return handle_; }
+  explicit operator bool() const { return handle_ != nullptr; }
+
+  /// Frees what is held and holds `handle`.
+  void reset(Handle handle = nullptr) {
+    const Handle old = handle_;
+    handle_ = handle;
+    if (old != nullptr) Free(old);
+  }
+
+  /// Hands over what is held: it is the caller's to free.
+  [[nodiscard]] Handle release() {
+    const Handle handle = handle_;
+    handle_ = nullptr;
+    return handle;
+  }
+
+ private:
+  Handle handle_ = nullptr;
+};
 
 /// A buffer or text from TEE_Malloc.
 template <class T>
@@ -80,27 +96,34 @@ struct secret_bytes {
 
 /// A transient object, usually a key.
 using key_object = owned<TEE_ObjectHandle, TEE_FreeTransientObject>;
-/// A persistent object. Closing it makes durable what was written.
+/// A persistent object.
 using stored_object = owned<TEE_ObjectHandle, TEE_CloseObject>;
+/// Passes on the result of a call on `object`: a platform that finds it corrupt has closed its
+/// handle by itself, and takes a second close for a fault of the caller.
+inline TEE_Result let_go_if_corrupt(stored_object *object, TEE_Result result) {
+  if (result == TEE_ERROR_CORRUPT_OBJECT) (void)object->release();
+  return result;
+}
+
 /// A cryptographic operation.
 using operation = owned<TEE_OperationHandle, TEE_FreeOperation>;
 
 /// Lets a plain out-parameter fill an owner: f(out(owner)). The owner has it, and its old content
 /// is freed, only when the whole expression is done: whoever reads the owner needs a new statement.
-template <class T, class Deleter>
+template <class Handle, auto Free>
 class out {
  public:
   /// For one call that fills `owner`, which must live longer.
-  explicit out(std::unique_ptr<T, Deleter> &owner) : owner_(owner) {}
+  explicit out(owned<Handle, Free> &owner) : owner_(owner) {}
   ~out() { owner_.reset(handle_); }
   out(const out &) = delete;
   out &operator=(const out &) = delete;
   /// What the call writes to; NULL until then.
-  operator T **() { return &handle_; }
+  operator Handle *() { return &handle_; }
 
  private:
-  std::unique_ptr<T, Deleter> &owner_;
-  T *handle_ = nullptr;
+  owned<Handle, Free> &owner_;
+  Handle handle_ = nullptr;
 };
 
 #endif

@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // CreateSD: a security domain for a service provider, and an AIK for one that has none yet.
-#include <string.h>
 
 #include "crypto/aik.h"
 #include "failure.h"
 #include "operations/exchange.h"
 #include "operations/new_aik.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/dsi.h"
 #include "state/object_store.h"

@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // DeleteSD: removes a security domain, on request with its TAs, and its SP with the last one.
-#include <string.h>
 
 #include "failure.h"
 #include "operations/delete_ta.h"
 #include "operations/exchange.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/dsi.h"
 #include "state/object_store.h"

@@ -2,12 +2,12 @@
 // DeleteTA: takes a TA out of its security domain.
 #include "operations/delete_ta.h"
 
-#include <string.h>
-
 #include "failure.h"
 #include "operations/exchange.h"
 #include "operations/operations.h"
 #include "operations/refresh_sd.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "state/dsi.h"
 #include "state/object_store.h"
 #include "state/records.h"

@@ -3,8 +3,7 @@
 #ifndef DELETE_TA_H
 #define DELETE_TA_H
 
-#include <tee_internal_api.h>
-
+#include "platform.h"
 #include "state/json.h"
 
 /// Checks that TSM `tsmid` manages the SD of this record. OTRP_RESPONSE_FAILED when the record

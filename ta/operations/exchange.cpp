@@ -4,6 +4,7 @@
 #include "crypto/corvel_client.h"
 #include "failure.h"
 #include "frame/response_fields.h"
+#include "otrp_result.h"
 #include "security/jwe.h"
 #include "state/dsi.h"
 

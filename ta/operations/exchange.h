@@ -10,9 +10,8 @@
 #ifndef EXCHANGE_H
 #define EXCHANGE_H
 
-#include <tee_internal_api.h>
-
 #include "ownership.h"
+#include "platform.h"
 #include "state/json.h"
 #include "state/token_reader.h"
 

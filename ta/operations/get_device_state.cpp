@@ -4,6 +4,7 @@
 #include "frame/response_fields.h"
 #include "operations/exchange.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
 #include "security/jwe.h"
 #include "security/tsm_trust.h"
 #include "state/dsi.h"

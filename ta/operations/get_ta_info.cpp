@@ -5,6 +5,7 @@
 #include "failure.h"
 #include "operations/exchange.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
 #include "security/jws.h"
 #include "state/object_store.h"
 

@@ -2,8 +2,6 @@
 // InstallTA: decrypts a TA image, records the TA in a security domain and hands the image over.
 #include "operations/install_ta.h"
 
-#include <string.h>
-
 #include "crypto/aik.h"
 #include "crypto/base64.h"
 #include "crypto/rsa.h"
@@ -11,6 +9,8 @@
 #include "failure.h"
 #include "operations/operations.h"
 #include "operations/refresh_sd.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "record_names.h"
 #include "security/tsm_trust.h"
 #include "state/object_store.h"

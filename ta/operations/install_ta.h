@@ -4,11 +4,11 @@
 #define INSTALL_TA_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "message.h"
 #include "operations/exchange.h"
 #include "ownership.h"
+#include "platform.h"
 #include "state/ta_register.h"
 
 /// Decrypts the TA image of "encrypted_ta": {"key", "iv", FIELD}, with the AIK of SP `spid`.

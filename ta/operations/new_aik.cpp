@@ -5,6 +5,7 @@
 #include "crypto/base64.h"
 #include "crypto/rsa.h"
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "state/dsi.h"
 

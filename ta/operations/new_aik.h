@@ -5,9 +5,9 @@
 #define NEW_AIK_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "crypto/tlv_box.h"
+#include "platform.h"
 #include "state/json.h"
 
 /// The encoded public key of a key box, in a new buffer.

@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // UpdateSD: renews the AIK and the certificate of the SP that owns a security domain.
-#include <string.h>
 
 #include "failure.h"
 #include "operations/exchange.h"
 #include "operations/new_aik.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "state/dsi.h"
 #include "state/object_store.h"
 #include "state/records.h"

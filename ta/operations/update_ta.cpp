@@ -3,6 +3,7 @@
 #include "failure.h"
 #include "operations/install_ta.h"
 #include "operations/operations.h"
+#include "otrp_result.h"
 #include "security/tsm_trust.h"
 #include "state/object_store.h"
 #include "state/records.h"

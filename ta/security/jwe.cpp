@@ -1,13 +1,12 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "security/jwe.h"
 
-#include <string.h>
-
 #include "crypto/base64.h"
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
 #include "failure.h"
 #include "ownership.h"
+#include "platform.h"
 
 namespace {
 

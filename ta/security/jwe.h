@@ -11,8 +11,8 @@
 #define JWE_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
+#include "platform.h"
 #include "state/json.h"
 
 #define JWE_HEADER_A128CBC_HS256 "{\"alg\":\"dir\",\"enc\":\"A128CBC-HS256\"}"

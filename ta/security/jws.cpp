@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "security/jws.h"
 
-#include <string.h>
 #include <ta_config.h>
 
 #include "crypto/base64.h"
@@ -9,6 +8,7 @@
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
 #include "security/tsm_trust.h"

@@ -14,10 +14,10 @@
 #define JWS_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "message.h"
 #include "ownership.h"
+#include "platform.h"
 #include "state/json.h"
 #include "state/token_reader.h"
 

@@ -2,7 +2,6 @@
 #include "security/tsm_trust.h"
 
 #include <ca_tsm_key.h>
-#include <string.h>
 
 #include "crypto/base64.h"
 #include "crypto/constant_time.h"
@@ -11,7 +10,9 @@
 #include "crypto/symmetric.h"
 #include "cursor.h"
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/object_store.h"
 #include "state/token_reader.h"

@@ -17,8 +17,8 @@
 #define TSM_TRUST_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
+#include "platform.h"
 #include "state/json.h"
 
 struct jsmn_object;

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/dsi.h"
 
-#include <string.h>
 #include <ta_config.h>
 
 #include "crypto/aik.h"
@@ -9,6 +8,8 @@
 #include "crypto/constant_time.h"
 #include "crypto/symmetric.h"
 #include "failure.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/object_store.h"
 #include "state/records.h"
@@ -96,7 +97,7 @@ TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out) {
 static bool serialize(const JSON_Value *value, json_text *text) {
   if (value == nullptr) return true;
   text->reset(json_serialize_to_string(value));
-  return *text != nullptr;
+  return text->get() != nullptr;
 }
 
 static void replace_text(json_text *text, char **old) {

@@ -14,9 +14,9 @@
 #define DSI_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
 #include "ownership.h"
+#include "platform.h"
 #include "state/json.h"
 
 struct dsi_json_str_t {

@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // Edits of the DSI's entries.
-#include <string.h>
 
 #include "failure.h"
+#include "otrp_result.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/dsi.h"
 #include "state/object_store.h"

@@ -55,9 +55,8 @@ static bool measure(const char *at, const char *end, json_extent *extent) {
         if (at == nullptr) return false;
         break;
       case '[':
-        ++extent->num_arrays;
-        [[fallthrough]];
       case '{':
+        if (at[-1] == '[') ++extent->num_arrays;
         ++depth;
         at = skip_space(at);
         if (*at == ']' || *at == '}') break;

@@ -1,22 +1,15 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/object_store.h"
 
-#include <string.h>
-
 #include "failure.h"
 #include "little_endian.h"
+#include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
 #include "record_names.h"
 
 namespace {
 constexpr uint32_t kLengthLen = 4;
-}
-
-// A platform that finds an object corrupt has closed its handle by itself.
-static TEE_Result checked(stored_object *object, TEE_Result result) {
-  if (result == TEE_ERROR_CORRUPT_OBJECT) (void)object->release();
-  return result;
 }
 
 static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id_len,
@@ -58,7 +51,7 @@ TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const 
   TRY(open_or_create(__func__, id, id_len, overwrite, &object));
   // Many platforms make each write durable by itself. A new length before an old payload, left by
   // a power cut between two writes, would be a record that no start gets past.
-  TRY_LOG(checked(&object, TEE_WriteObjectData(object.get(), stream.data, stream.len)),
+  TRY_LOG(let_go_if_corrupt(&object, TEE_WriteObjectData(object.get(), stream.data, stream.len)),
           "Failed to write data: 0x%x");
   return TEE_SUCCESS;
 }
@@ -82,7 +75,7 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
 
   uint8_t prefix[kLengthLen];
   tee_length count = 0;
-  TRY_LOG(checked(&object, TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count)),
+  TRY_LOG(let_go_if_corrupt(&object, TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count)),
           "Failed to read data size, error code 0x%x\n");
   if (count < kLengthLen) {
     *len = static_cast<uint32_t>(count);
@@ -95,8 +88,9 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
   CHECK(buffer.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",
         stored_len);
   buffer.len = stored_len;
-  TRY_LOG(checked(&object, TEE_ReadObjectData(object.get(), buffer.data, stored_len, &count)),
-          "Failed to read data, error code 0x%x\n");
+  TRY_LOG(
+      let_go_if_corrupt(&object, TEE_ReadObjectData(object.get(), buffer.data, stored_len, &count)),
+      "Failed to read data, error code 0x%x\n");
   *data = buffer.release();
   *len = static_cast<uint32_t>(count);
   return TEE_SUCCESS;

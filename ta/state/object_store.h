@@ -12,8 +12,8 @@
 #define OBJECT_STORE_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
+#include "platform.h"
 #include "state/json.h"
 
 /// Creates the object or writes it over, length and payload in one write: the platform leaves the

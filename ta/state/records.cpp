@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/records.h"
 
-#include <string.h>
-
 #include "failure.h"
+#include "otrp_result.h"
 #include "ownership.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/object_store.h"
 

@@ -12,8 +12,8 @@
 #define RECORDS_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
 
+#include "platform.h"
 #include "state/json.h"
 
 /// False for a text that is no UTF-8, which no record takes, or that has control characters which

@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/ta_register.h"
 
-#include <string.h>
-
 #include "failure.h"
 #include "little_endian.h"
+#include "otrp_result.h"
 #include "ownership.h"
+#include "platform.h"
 #include "record_names.h"
 #include "state/object_store.h"
 

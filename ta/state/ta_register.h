@@ -10,7 +10,8 @@
 #define TA_REGISTER_H
 
 #include <stdint.h>
-#include <tee_internal_api.h>
+
+#include "platform.h"
 
 /// A TA image starts with a header of at least this many bytes. It holds the length of the image
 /// digest (16 bits, little-endian) at offset 16 and the digest at offset 20.

@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/token_reader.h"
 
-#include <limits.h>
-
 #define JSMN_STATIC
 #include <jsmn.h>
 
 #include "failure.h"
+#include "platform.h"
 
 // The tokenizer's record under a name that the header can declare.
 struct jsmn_token : jsmntok_t {};
@@ -39,7 +38,7 @@ char *jsmn_string_dup(const char *data, uint32_t len) {
 // The number of tokens, or an error of the tokenizer. Without an array it only counts. Positions
 // are ints: it has no room for a longer text.
 static int tokenize(const jsmn_string &text, jsmn_token *tokens, int num_tokens) {
-  if (text.len > INT_MAX) return JSMN_ERROR_NOMEM;
+  if (text.len > INT32_MAX) return JSMN_ERROR_NOMEM;
   jsmn_parser parser;
   jsmn_init(&parser);
   return jsmn_parse(&parser, text.data, text.data != nullptr ? text.len : 0, tokens,
@@ -48,7 +47,7 @@ static int tokenize(const jsmn_string &text, jsmn_token *tokens, int num_tokens)
 
 static tee_ptr<jsmn_token> allocate_tokens(int num_tokens) {
   const uint64_t len = static_cast<uint64_t>(num_tokens) * sizeof(jsmn_token);
-  if (len > UINT32_MAX) return nullptr;
+  if (len > UINT32_MAX) return {};
   return tee_ptr<jsmn_token>(
       reinterpret_cast<jsmn_token *>(allocate_bytes(static_cast<uint32_t>(len))));
 }

@@ -58,7 +58,7 @@ TEST_F(TlvBox, ParsesWholeRecordsOnly) {
       {"LongestLength", {1, 0, 0xFF, 0xFF, 9}, false},
       {"TypeRepeats", {1, 0, 0, 0, 1, 0, 1, 0, 9}, false},
   };
-  for (const auto &c : cases) EXPECT_EQ(parse(c.bytes) != nullptr, c.good) << c.name;
+  for (const auto &c : cases) EXPECT_EQ(parse(c.bytes).get() != nullptr, c.good) << c.name;
   EXPECT_EQ(tlv_box_parse(nullptr, 4), nullptr);
 }
 

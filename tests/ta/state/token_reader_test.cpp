@@ -62,7 +62,7 @@ TEST_F(TokenReader, RefusesWhatIsNoObject) {
   const std::string cases[] = {
       "",           std::string("\0{}", 3),        R"({"a":"\x"})", R"({"a)", R"({"a":1)",
       R"({"a":1])", std::string("{\"a\":1\0}", 8), R"(x {"a":1})",  "[{}]"};
-  for (const std::string &text : cases) EXPECT_EQ(over(text), nullptr) << text;
+  for (const std::string &text : cases) EXPECT_EQ(over(text).get(), nullptr) << text;
 }
 
 TEST_F(TokenReader, InnerObjectsAreObjects) {
