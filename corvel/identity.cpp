@@ -1,8 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "identity.h"
 
-#include <string.h>
-#include <tee_trace.h>
+#include "failure.h"
 
 static constexpr char kObjectId[] = {'I', 'D', 'E', 'N', 'T', 'I', 'T', 'Y'};
 
@@ -23,23 +22,6 @@ static const key_record kKeyRecords[] = {
 static constexpr uint32_t kNumKeyRecords = sizeof(kKeyRecords) / sizeof(kKeyRecords[0]);
 static constexpr uint32_t kMaxIdentityLen =
     kDeviceIdLen + kNumKeyRecords * (kRecordHeaderLen + kKeySize / 8);
-
-static void wipe(void *bytes, uint32_t len) {
-  memset(bytes, 0, len);
-  __asm__ __volatile__("" : : "r"(bytes) : "memory");  // or the compiler would drop it
-}
-
-secret_buffer::~secret_buffer() {
-  if (data_ == nullptr) return;
-  wipe(data_, len_);
-  TEE_Free(data_);
-}
-
-bool secret_buffer::allocate(uint32_t len) {
-  data_ = static_cast<uint8_t *>(TEE_Malloc(len, TEE_MALLOC_FILL_ZERO));
-  len_ = len;
-  return data_ != nullptr;
-}
 
 static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
   static const char kDigits[] = "0123456789abcdef";
@@ -62,117 +44,94 @@ static TEE_Result write_key_box(TEE_ObjectHandle key, uint8_t *box, uint32_t *bo
   *box_len = 0;
   for (const key_record &record : kKeyRecords) {
     uint8_t *header = box + *box_len;
-    TEE_LengthType len = kKeySize / 8;
-    const TEE_Result result =
-        TEE_GetObjectBufferAttribute(key, record.attribute, header + kRecordHeaderLen, &len);
-    if (result != TEE_SUCCESS) return result;
-    header[0] = static_cast<uint8_t>(record.type & 0xFF);
-    header[1] = static_cast<uint8_t>(record.type >> 8);
-    header[2] = static_cast<uint8_t>(len & 0xFF);
-    header[3] = static_cast<uint8_t>(len >> 8);
+    tee_length len = kKeySize / 8;
+    TRY(TEE_GetObjectBufferAttribute(key, record.attribute, header + kRecordHeaderLen, &len));
+    put_u16(header, record.type);
+    put_u16(header + 2, static_cast<uint32_t>(len));
     *box_len += kRecordHeaderLen + static_cast<uint32_t>(len);
   }
   return TEE_SUCCESS;
 }
 
 static TEE_Result generate_key_box(uint8_t *box, uint32_t *box_len) {
-  TEE_ObjectHandle key = TEE_HANDLE_NULL;
-  TEE_Result result = TEE_AllocateTransientObject(TEE_TYPE_RSA_KEYPAIR, kKeySize, &key);
-  if (result != TEE_SUCCESS) return result;
-  result = TEE_GenerateKey(key, kKeySize, nullptr, 0);
-  if (result == TEE_SUCCESS) result = write_key_box(key, box, box_len);
-  TEE_FreeTransientObject(key);
-  return result;
+  key_object key;
+  TRY(TEE_AllocateTransientObject(TEE_TYPE_RSA_KEYPAIR, kKeySize, out(key)));
+  TRY(TEE_GenerateKey(key.get(), kKeySize, nullptr, 0));
+  return write_key_box(key.get(), box, box_len);
 }
 
 static TEE_Result make_identity() {
-  secret_buffer draft;
-  if (!draft.allocate(kMaxIdentityLen)) return TEE_ERROR_OUT_OF_MEMORY;
-  write_device_id(draft.data());
+  secret_bytes draft;
+  draft.data = allocate_bytes(kMaxIdentityLen);
+  if (draft.data == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
+  draft.len = kMaxIdentityLen;
+  write_device_id(draft.data);
   uint32_t box_len = 0;
-  TEE_Result result = generate_key_box(draft.data() + kDeviceIdLen, &box_len);
-  if (result != TEE_SUCCESS) return result;
+  TRY(generate_key_box(draft.data + kDeviceIdLen, &box_len));
 
-  TEE_ObjectHandle object = TEE_HANDLE_NULL;
-  result = TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, kObjectId, sizeof(kObjectId),
-                                      TEE_DATA_FLAG_ACCESS_WRITE, TEE_HANDLE_NULL, draft.data(),
-                                      kDeviceIdLen + box_len, &object);
-  if (result != TEE_SUCCESS) return result;
-  TEE_CloseObject(object);
-  return TEE_SUCCESS;
+  stored_object object;
+  return TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, kObjectId, sizeof kObjectId,
+                                    TEE_DATA_FLAG_ACCESS_WRITE, TEE_HANDLE_NULL, draft.data,
+                                    kDeviceIdLen + box_len, out(object));
 }
 
 // ---- Reading
 
-static bool take(byte_view *from, uint32_t len, byte_view *taken) {
-  if (len == 0 || len > from->len) return false;
-  *taken = {from->data, len};
-  from->data += len;
-  from->len -= len;
-  return true;
+static bool take_record(reader *in, uint16_t type, reader *value) {
+  uint16_t found = 0;
+  uint16_t len = 0;
+  if (!take_u16(in, &found) || found != type || !take_u16(in, &len)) return false;
+  value->left = len;
+  return take(in, len, &value->at);
 }
 
-static bool take_record(byte_view *from, uint16_t type, byte_view *value) {
-  byte_view header;
-  if (!take(from, kRecordHeaderLen, &header)) return false;
-  const auto found_type = static_cast<uint16_t>(header.data[0] | header.data[1] << 8);
-  const auto len = static_cast<uint32_t>(header.data[2] | header.data[3] << 8);
-  return found_type == type && take(from, len, value);
-}
-
-static bool parse_identity(byte_view left, identity *device) {
-  byte_view private_exponent;
-  if (!take(&left, kDeviceIdLen, &device->device_id)) return false;
-  device->key_box = left;
-  return take_record(&left, kKeyRecords[0].type, &device->modulus) &&
-         take_record(&left, kKeyRecords[1].type, &device->public_exponent) &&
-         take_record(&left, kKeyRecords[2].type, &private_exponent) && left.len == 0;
+static bool parse_identity(reader in, identity *device) {
+  reader private_exponent = {};
+  device->device_id.left = kDeviceIdLen;
+  if (!take(&in, kDeviceIdLen, &device->device_id.at)) return false;
+  device->key_box = in;
+  return take_record(&in, kKeyRecords[0].type, &device->modulus) &&
+         take_record(&in, kKeyRecords[1].type, &device->public_exponent) &&
+         take_record(&in, kKeyRecords[2].type, &private_exponent) && in.left == 0;
 }
 
 static TEE_Result read_identity(identity *device) {
-  TEE_ObjectHandle object = TEE_HANDLE_NULL;
-  TEE_Result result = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, kObjectId, sizeof(kObjectId),
-                                               TEE_DATA_FLAG_ACCESS_READ, &object);
-  if (result != TEE_SUCCESS) return result;
-
+  stored_object object;
+  TRY(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, kObjectId, sizeof kObjectId,
+                               TEE_DATA_FLAG_ACCESS_READ, out(object)));
   // One byte more, so that an object that is too long does not pass for a shorter one.
-  TEE_LengthType len = 0;
-  result = device->stored.allocate(kMaxIdentityLen + 1)
-               ? TEE_ReadObjectData(object, device->stored.data(), kMaxIdentityLen + 1, &len)
-               : TEE_ERROR_OUT_OF_MEMORY;
-  TEE_CloseObject(object);
-  if (result != TEE_SUCCESS) return result;
-  const byte_view found = {device->stored.data(), static_cast<uint32_t>(len)};
-  return parse_identity(found, device) ? TEE_SUCCESS : TEE_ERROR_CORRUPT_OBJECT;
+  secret_bytes &stored = device->stored;
+  stored.data = allocate_bytes(kMaxIdentityLen + 1);
+  if (stored.data == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
+  stored.len = kMaxIdentityLen + 1;
+  tee_length len = 0;
+  TRY(let_go_if_corrupt(&object, TEE_ReadObjectData(object.get(), stored.data, stored.len, &len)));
+  const bool is_whole = parse_identity({stored.data, static_cast<uint32_t>(len)}, device);
+  return is_whole ? TEE_SUCCESS : TEE_ERROR_CORRUPT_OBJECT;
 }
 
 // A new identity is read back like an old one: what is given out is what storage holds.
-TEE_Result get_identity(identity *device) {
-  TEE_Result result = read_identity(device);
-  if (result == TEE_ERROR_ITEM_NOT_FOUND) {
-    result = make_identity();
-    if (result == TEE_SUCCESS) result = read_identity(device);
-  }
-  if (result != TEE_SUCCESS) {
-    tee_trace(__func__, __LINE__, TEE_TRACE_ERROR, "no identity, 0x%x", result);
-  }
-  return result;
+static TEE_Result read_or_make_identity(identity *device) {
+  const TEE_Result result = read_identity(device);
+  if (result != TEE_ERROR_ITEM_NOT_FOUND) return result;
+  TRY(make_identity());
+  return read_identity(device);
 }
 
-TEE_Result get_endorsement_id(const identity &device, byte_view label,
+TEE_Result get_identity(identity *device) {
+  TRY_LOG(read_or_make_identity(device), "no identity, 0x%x");
+  return TEE_SUCCESS;
+}
+
+TEE_Result get_endorsement_id(const identity &device, const reader &label,
                               char id[kEndorsementIdLen + 1]) {
-  TEE_OperationHandle sha256 = TEE_HANDLE_NULL;
-  TEE_Result result = TEE_AllocateOperation(&sha256, TEE_ALG_SHA256, TEE_MODE_DIGEST, 0);
-  if (result != TEE_SUCCESS) return result;
-
+  operation sha256;
+  TRY(TEE_AllocateOperation(out(sha256), TEE_ALG_SHA256, TEE_MODE_DIGEST, 0));
   uint8_t digest[kDigestLen];
-  TEE_LengthType digest_len = sizeof(digest);
-  TEE_DigestUpdate(sha256, device.device_id.data, device.device_id.len);
-  result = TEE_DigestDoFinal(sha256, label.data, label.len, digest, &digest_len);
-  TEE_FreeOperation(sha256);
-  if (result != TEE_SUCCESS) return result;
-
-  write_hex(digest, sizeof(digest), id);
+  tee_length digest_len = sizeof digest;
+  TEE_DigestUpdate(sha256.get(), device.device_id.at, device.device_id.left);
+  TRY(TEE_DigestDoFinal(sha256.get(), label.at, label.left, digest, &digest_len));
+  write_hex(digest, sizeof digest, id);
   id[kEndorsementIdLen] = '\0';
   return TEE_SUCCESS;
 }

@@ -7,39 +7,19 @@
 #ifndef IDENTITY_H
 #define IDENTITY_H
 
-#include <tee_internal_api.h>
+#include "cursor.h"
+#include "ownership.h"
 
 constexpr uint32_t kDeviceIdLen = 32;
 constexpr uint32_t kEndorsementIdLen = 64;
 
-/// Bytes from TEE_Malloc that nobody may find in freed memory.
-class secret_buffer {
- public:
-  secret_buffer() = default;
-  ~secret_buffer();
-  secret_buffer(const secret_buffer &) = delete;
-  secret_buffer &operator=(const secret_buffer &) = delete;
-
-  [[nodiscard]] bool allocate(uint32_t len);  // once
-  uint8_t *data() { return data_; }
-
- private:
-  uint8_t *data_ = nullptr;
-  uint32_t len_ = 0;
-};
-
-struct byte_view {
-  const uint8_t *data;
-  uint32_t len;
-};
-
-/// The views look into `stored`.
+/// The readers look into `stored`.
 struct identity {
-  secret_buffer stored;
-  byte_view device_id;
-  byte_view key_box;
-  byte_view modulus;
-  byte_view public_exponent;
+  secret_bytes stored;
+  reader device_id;
+  reader key_box;
+  reader modulus;
+  reader public_exponent;
 };
 
 /// Reads the identity into the fresh `*device`; makes and stores it first if there is none.
@@ -50,7 +30,7 @@ struct identity {
 
 /// An ID for the key that `label` names: the SHA-256 digest of device ID and label in
 /// hexadecimal digits, with a final NUL.
-[[nodiscard]] TEE_Result get_endorsement_id(const identity &device, byte_view label,
+[[nodiscard]] TEE_Result get_endorsement_id(const identity &device, const reader &label,
                                             char id[kEndorsementIdLen + 1]);
 
 #endif
