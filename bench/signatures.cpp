@@ -126,7 +126,7 @@ void verify(const Stage &stage) {
 void sign(const Stage &stage) {
   const json_text text(construct_json_signature("DeleteTAResponse", stage.message.payload.c_str(),
                                                 JWS_HEADER_RS256, nullptr, stage.key.get()));
-  require(text != nullptr, "the agent did not sign a message");
+  require(bool(text), "the agent did not sign a message");
 }
 
 /// A library with its form of the key.

@@ -65,10 +65,10 @@ static void check_rewriting(const JSON_Value *value, const std::string &text) {
   const json_ptr again = parsed(text);
   if (again) require_same(again.get(), text);
   const json_ptr spread = parsed(take_text(json_serialize_to_string_pretty(value)));
-  require((spread != nullptr) == (again != nullptr), "white space makes no difference");
+  require(bool(spread) == bool(again), "white space makes no difference");
   if (spread) require_same(spread.get(), text);
   // The TSM reads strict JSON only; the writer writes that unless there were other bytes.
-  require(!tsm::parse_json(text) || (again != nullptr) == can_be_read_back(text),
+  require(!tsm::parse_json(text) || bool(again) == can_be_read_back(text),
           "a written document is read");
 }
 

@@ -46,13 +46,13 @@ void check(std::string_view input) {
   const auto opened = open_as_tsm(text.get());
   if (jwe && opened && agrees_on_scheme(tsm::parse_json(text.get()).value())) {
     const json_ptr same(json_parse_string(ExactText(*opened).get()));
-    require((value != nullptr) == (same != nullptr), "the agent opens what the TSM opens");
+    require(bool(value) == bool(same), "the agent opens what the TSM opens");
     if (value) require(serialized(value.get()) == serialized(same.get()), "to the same text");
   }
   if (!value) return;
   for (const char *header : {JWE_HEADER_A128CBC_HS256, JWE_HEADER_A128GCM}) {
     const json_ptr sealed(encrypt_json(key.get(), value.get(), header));
-    require(sealed != nullptr, "a value is encrypted");
+    require(bool(sealed), "a value is encrypted");
     require(open_as_tsm(serialized(sealed.get())) == serialized(value.get()),
             "the TSM opens what the agent encrypts");
   }

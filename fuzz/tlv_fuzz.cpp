@@ -58,7 +58,7 @@ void check(std::string_view input) {
   const device::Buffer exact(input);
   const auto records = read_records(input);
   const box_ptr box(tlv_box_parse(u8(exact.bytes()), static_cast<uint32_t>(input.size())));
-  require((box != nullptr) == records.has_value(), "whole records make a box");
+  require(bool(box) == records.has_value(), "whole records make a box");
   if (!records) return;
   for (const Record &record : *records) require_record(box.get(), record);
   require_rebuilt(*records, input);

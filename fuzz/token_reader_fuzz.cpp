@@ -14,7 +14,7 @@ using tsm::Json;
 static std::optional<std::string_view> look_up(const jsmn_object *object, const char *key,
                                                std::string_view text) {
   const slice_ptr slice(jsmn_object_get_string(object, key));
-  require(slice != nullptr, "there is memory for a slice");
+  require(bool(slice), "there is memory for a slice");
   if (slice->data == nullptr) return std::nullopt;
   require(slice->data >= text.data() && slice->len <= text.size() &&
               slice->data - text.data() + slice->len <= static_cast<ptrdiff_t>(text.size()),

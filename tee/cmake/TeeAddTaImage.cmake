@@ -1,11 +1,12 @@
 # SPDX-License-Identifier: BSD-2-Clause
 # Part of the host TEE's kit for trusted applications.
 
-# Flags of code that runs inside a TEE: no runtime library behind it, nor its headers.
+# Flags of code that runs inside a TEE: no runtime library behind it, nor its headers. What the
+# compiler knows of memcpy and the like it may go on using.
 add_library(tee_ta_flags INTERFACE)
 target_compile_options(tee_ta_flags INTERFACE
   -fvisibility=hidden
-  -ffreestanding
+  -ffreestanding -fbuiltin
   $<$<COMPILE_LANGUAGE:CXX>:-nostdinc++ -fno-exceptions -fno-rtti -fno-threadsafe-statics>)
 
 # tee_uuid_initializer(UUID VARIABLE): "c7acaae4-686e-..." as a TEE_UUID initializer.
