@@ -7,7 +7,7 @@
 
 #include "common/files.h"
 #include "device/device_client.h"
-#include "device/http_server.h"
+#include "device/envelope.h"
 #include "device/info_json.h"
 #include "device/inspect.h"
 #include "device/object_id.h"
@@ -63,15 +63,26 @@ struct OpenAgent {
   StatsAtEnd stats;
 };
 
-const Message &message_of(const Arguments &arguments) {
-  const Message *message = find_message(arguments.message);
-  if (message != nullptr) return *message;
-  std::string names;
-  for (const Message &known : messages()) names += std::string(" ") + known.name;
-  throw tools::UsageError("unknown message \"" + arguments.message + "\": expected one of" + names);
-}
+/// What the words of the command line mean: the message is named only where there are two.
+struct Sent {
+  const Message *message;  // NULL: the request says it
+  std::string request_file;
+};
 
-constexpr uint32_t kMaxServedLen = 1u << 30;  // what a request and its answer can have at once
+Sent sent_by(const Arguments &arguments) {
+  const Message *message = find_message(arguments.message);
+  if (arguments.request_file.empty()) {
+    if (message != nullptr) {
+      throw tools::UsageError("no REQUEST: expected a file, or -, after " + arguments.message);
+    }
+    return {nullptr, arguments.message};
+  }
+  if (message == nullptr) {
+    throw tools::UsageError("unknown message \"" + arguments.message + "\": expected one of " +
+                            tools::message_commands());
+  }
+  return {message, arguments.request_file};
+}
 
 uint32_t capacity_of(const Arguments &arguments) {
   if (arguments.capacity.empty()) return kDefaultCapacity;
@@ -96,9 +107,10 @@ void print_info(const Arguments &arguments) {
 }
 
 void send_request(const Arguments &arguments) {
-  const Message &message = message_of(arguments);
+  const Sent sent = sent_by(arguments);
   const uint32_t capacity = capacity_of(arguments);
-  const std::string request = tools::read_file(arguments.request_file);
+  const std::string request = tools::read_file(sent.request_file);
+  const Message &message = message_in(request, sent.message);
 
   OpenAgent agent(arguments);
   const Answer answer = send(agent.session, message, request, capacity);
@@ -168,10 +180,7 @@ void obey_session(const Arguments &arguments) {
 }
 
 void serve(const Arguments &arguments) {
-  const Endpoint endpoint = parse_endpoint(arguments.endpoint);
-  const uint32_t max_body_len = parse_number("--max-body", arguments.max_body, kMaxServedLen);
-  Device device(arguments.state_directory);
-  run_http_server(device, endpoint, max_body_len);
+  serve_device(arguments.state_directory, arguments);
 }
 
 }  // namespace device

@@ -6,12 +6,14 @@
 
 #include <string>
 
+#include "device/serve.h"
+
 namespace device {
 
 constexpr const char *kProgram = "otrp-device";
 
 /// What the command line says, as it stands there.
-struct Arguments {
+struct Arguments : ServeArguments {
   std::string state_directory;
   bool stats = false;
   std::string message;
@@ -26,8 +28,6 @@ struct Arguments {
   std::string input_file;
   std::string output_file;
   std::string types;
-  std::string endpoint = "127.0.0.1:8080";
-  std::string max_body = "8388608";
 };
 
 void print_info(const Arguments &arguments);

@@ -25,17 +25,6 @@ constexpr uint32_t kQueryCapacity = 256;  // answers are texts of about 50 chara
 constexpr uint32_t kDeviceIdCapacity = 256;
 constexpr size_t kPublicKeyCapacity = 1024;
 
-constexpr Message kMessages[] = {
-    {"get-device-state", OTRP_GET_DEVICE_STATE},
-    {"install-ta", OTRP_INSTALL_TA},
-    {"update-ta", OTRP_UPDATE_TA},
-    {"delete-ta", OTRP_DELETE_TA},
-    {"create-sd", OTRP_CREATE_SD},
-    {"update-sd", OTRP_UPDATE_SD},
-    {"delete-sd", OTRP_DELETE_SD},
-    {"get-ta-info", OTRP_GET_TA_INFO},
-};
-
 const char *origin_text(Origin origin) {
   switch (origin) {
     case Origin::kClientApi:
@@ -210,22 +199,14 @@ Info read_info(Device &device) {
           written(key, operation.params[1].tmpref.size)};
 }
 
-std::span<const Message> messages() {
-  return kMessages;
-}
-
-const Message *find_message(std::string_view name) {
-  const auto found = std::ranges::find(kMessages, name, &Message::name);
-  return found == std::end(kMessages) ? nullptr : found;
-}
-
 std::string build_frame(uint32_t message_id, std::string_view request) {
   std::string frame =
       word(0) + block(DEVICE_CLIENT_NAME) + block(DEVICE_CLIENT_VERSION) + word(message_id);
   if (request.size() > std::numeric_limits<uint32_t>::max() - frame.size() - kWordLen) {
     throw tools::UsageError("the request is too long: expected less than 4 GiB");
   }
-  return frame + block(request);
+  frame.reserve(frame.size() + kWordLen + request.size());
+  return frame.append(word(request.size())).append(request);
 }
 
 std::string build_query(std::string_view taid) {
@@ -263,10 +244,11 @@ Answer parse_answer(std::string_view buffer, size_t size) {
 }
 
 Answer send(Session &agent, const Message &message, std::string_view request, uint32_t capacity) {
-  const Reply reply = agent.invoke({.command_id = OTRP_COMMAND_MESSAGE,
-                                    .input = Buffer(build_frame(message.id, request)),
-                                    .capacity = capacity});
-  if (reply.result != TEEC_SUCCESS) throw Error(message.name, reply.result, reply.origin);
+  const Reply reply =
+      agent.invoke({.command_id = OTRP_COMMAND_MESSAGE,
+                    .input = Buffer(build_frame(static_cast<uint32_t>(message.id), request)),
+                    .capacity = capacity});
+  if (reply.result != TEEC_SUCCESS) throw Error(message.command, reply.result, reply.origin);
   return parse_answer(reply.output.bytes(), reply.size);
 }
 
@@ -277,7 +259,7 @@ void require_success(const Message &message, const Answer &answer) {
                                  : "the device did what was asked, but the TA image did not fit: "
                                    "the answer takes a capacity of " +
                                        std::to_string(answer.needed_capacity) + " bytes";
-  throw Error(message.name, answer.status, Origin::kStatusWord, detail);
+  throw Error(message.command, answer.status, Origin::kStatusWord, detail);
 }
 
 QueryAnswer query(Session &agent, std::string_view taid) {

@@ -18,10 +18,11 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
-#include <span>
 #include <stdexcept>
 #include <string>
 #include <string_view>
+
+#include "common/messages.h"
 
 namespace device {
 
@@ -130,12 +131,10 @@ struct Info {
 };
 Info read_info(Device &device);
 
-struct Message {
-  const char *name;
-  uint32_t id;
-};
-std::span<const Message> messages();
-const Message *find_message(std::string_view name);  // NULL when there is none
+using tools::Message;
+inline const Message *find_message(std::string_view command) {
+  return tools::find_message_by_command(command);  // NULL when there is none
+}
 
 /// Throws tools::UsageError when the frame would be longer than 32 bits can say.
 std::string build_frame(uint32_t message_id, std::string_view request);

@@ -1,61 +1,60 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// A device that answers over HTTP, without the HTTP: what each request gets, as status, content
-/// and headers.
+/// The device end of OTrP over HTTP, for TSMs that bring their own transport.
+///
+///     POST /otrp             the signed response to the request; its outer member says which it is
+///     POST /otrp/MESSAGE     the same, for this message alone
+///     GET /images/NUMBER     the TA image that a response came with (header OTrP-TA-Image)
+///     GET /info              device ID and TEE public key
+///     GET /query/TAID        whether a TA is recorded
+///     GET /healthz           whether the device can be used
 ///
 /// A message that the device answers with a signed response is a success, whatever the response
-/// says. Any other outcome has a JSON body: "message", and where the device gave a code, "code"
-/// and "name".
+/// says; the header OTrP-Status tells. Any other outcome has a JSON body: "message", and where the
+/// device gave a code, "code" and "name".
 #ifndef DEVICE_HTTP_SERVICE_H
 #define DEVICE_HTTP_SERVICE_H
 
 #include <deque>
-#include <mutex>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
 
 #include "device/device_client.h"
+#include "device/state_watch.h"
+#include "http/router.h"
 
 namespace device {
 
-constexpr std::string_view kOtrpType = "application/otrp+json";  // of requests and responses
-
-struct HttpAnswer {
-  int status = 200;
-  std::string type = "application/json";
-  std::string body = {};
-  std::string image_path = {};  // where the TA image of a response is found; empty without one
-};
-
-/// The answer when HTTP itself is the matter, or a body that says more than its status.
-HttpAnswer http_failure(int status, std::string_view message);
-
-/// Any thread may call; the device serves one request at a time. Between requests the session with
-/// the agent stays open, so that a TSM finds the device state as its last response described it.
+/// For one worker: the device serves one request at a time. Between requests the session with the
+/// agent stays open, so that a TSM finds the device state as its last response described it.
 class HttpService {
  public:
-  explicit HttpService(Device &device) : device_(device) {}
+  HttpService(Device &device, const std::string &state_directory);
 
-  HttpAnswer info();
-  HttpAnswer query(const std::string &taid);
-  HttpAnswer message(const std::string &name, const std::string &request);
-
-  /// The TA image number `number`; only the latest few are kept.
-  HttpAnswer image(std::string_view number);
+  http::Handler &handler() { return router_; }
 
  private:
   struct KeptImage {
     std::string number;
-    std::string bytes;
+    std::shared_ptr<const std::string> bytes;
   };
 
+  void add_routes();
   template <class Answering>
-  HttpAnswer exclusively(Answering &&answering);
+  http::Answer use_device(Answering &&answering);
+  http::Answer info();
+  http::Answer query(const std::string &taid);
+  http::Answer message(const Message *expected, std::string_view request);
+  http::Answer signed_response(Answer answer);
+  http::Answer image(std::string_view number) const;
+  http::Answer health() const;
   Session &agent();
   std::string keep_image(std::string bytes);  // its path
 
   Device &device_;
-  std::mutex lock_;  // of all below
+  StateWatch state_;
+  http::Router router_;
   std::optional<Session> agent_;
   std::deque<KeptImage> images_;
   uint64_t num_images_ = 0;

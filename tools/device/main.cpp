@@ -16,12 +16,14 @@ namespace {
 using device::Arguments;
 using device::kProgram;
 
-/// A positional word, which is required, or an option, whose name begins with a hyphen.
+/// A positional word, which is required unless it stands in brackets, or an option, whose name
+/// begins with a hyphen.
 struct Parameter {
   const char *name;
   const char *type;
   std::string Arguments::*value;
   std::string help;
+  std::vector<std::string> Arguments::*values = nullptr;  // instead, of an option given repeatedly
 };
 
 struct Command {
@@ -32,14 +34,6 @@ struct Command {
   std::string notes;
   std::string example;  // what follows the state directory
 };
-
-std::string message_names() {
-  std::string names;
-  for (const device::Message &message : device::messages()) {
-    names += (names.empty() ? "" : ", ") + std::string(message.name);
-  }
-  return names;
-}
 
 const Parameter kCapacity = {"--capacity", "BYTES", &Arguments::capacity,
                              "Size of the output buffer (default: 4 MiB; 0: no buffer)"};
@@ -55,15 +49,16 @@ const Command kCommands[] = {
     {"send",
      device::send_request,
      "Send a signed request and print the response",
-     {{"MESSAGE", "", &Arguments::message, "One of: " + message_names()},
-      {"REQUEST", "", &Arguments::request_file, "File with the request"},
+     {{"MESSAGE", "", &Arguments::message,
+       "May be left out: the request names it. One of: " + tools::message_commands()},
+      {"[REQUEST]", "", &Arguments::request_file, "File with the request"},
       {"-o", "FILE", &Arguments::response_file, "File for the response"},
       {"--image-out", "FILE", &Arguments::image_file, "File for the TA image in the answer"},
       kCapacity},
      "The response may say \"fail\": that is for the TSM to read, and a success here. When only "
      "the\n"
      "TA image does not fit, the device has done what was asked, and the response is printed.\n",
-     "send install-ta request.json -o response.json --image-out ta.bin"},
+     "send request.json -o response.json --image-out ta.bin"},
     {"query",
      device::query_ta,
      "Ask whether a TA is recorded on the device",
@@ -97,13 +92,36 @@ const Command kCommands[] = {
     {"serve",
      device::serve,
      "Answer over HTTP, until SIGTERM or SIGINT",
-     {{"--listen", "ADDRESS:PORT", &Arguments::endpoint,
+     {{"--listen", "ADDRESS:PORT", &Arguments::listen,
        "Where to listen (default: 127.0.0.1:8080; port 0: any that is free)"},
+      {"--allow-host", "NAME", nullptr,
+       "Serve requests to this host, too; repeatable (always: localhost and the address itself)",
+       &Arguments::allowed_hosts},
+      {"--tls-cert", "PEM", &Arguments::tls_cert, "Serve https, with this certificate and chain"},
+      {"--tls-key", "PEM", &Arguments::tls_key, "Key of the certificate"},
       {"--max-body", "BYTES", &Arguments::max_body,
-       "Longest request that is read (default: 8 MiB)"}},
+       "Longest request that is read (default: 8 MiB)"},
+      {"--max-unfinished", "BYTES", &Arguments::max_unfinished,
+       "Longest that requests not yet answered are together (default: 16 MiB)"},
+      {"--max-header", "BYTES", &Arguments::max_header,
+       "Longest head of a request (default: 16 KiB)"},
+      {"--max-headers", "COUNT", &Arguments::max_headers, "Most headers (default: 100)"},
+      {"--max-connections", "COUNT", &Arguments::max_connections,
+       "Most connections; a newer one takes the place of a slow one (default: 1000)"},
+      {"--max-per-address", "COUNT", &Arguments::max_per_address,
+       "Most connections from one address (default: 250)"},
+      {"--request-time", "SECONDS", &Arguments::request_time,
+       "Longest that sending a request may take (default: 30)"},
+      {"--answer-time", "SECONDS", &Arguments::answer_time,
+       "Longest that taking an answer may take (default: 30)"},
+      {"--idle-time", "SECONDS", &Arguments::idle_time,
+       "How long a connection is kept for the next request (default: 60)"},
+      {"--log", "FORMAT", &Arguments::log, "text or json: a line for each exchange"}},
      "Prints its URL when it listens. A request of type application/otrp+json gets the signed\n"
-     "response; where there is a TA image, the header OTrP-TA-Image names its path:\n"
-     "  POST /otrp/MESSAGE    GET /images/NUMBER    GET /info    GET /query/TAID\n"
+     "response, and in the header OTrP-Status what it says; where there is a TA image, the header\n"
+     "OTrP-TA-Image names its path:\n"
+     "  POST /otrp    POST /otrp/MESSAGE    GET /images/NUMBER\n"
+     "  GET /info     GET /query/TAID       GET /healthz\n"
      "Whoever reaches the address can use the device.\n",
      "serve --listen 127.0.0.1:8080"},
 };
@@ -135,10 +153,15 @@ std::string footer(const std::string &notes, const std::string &example) {
 }
 
 void add_parameter(CLI::App *command, const Parameter &parameter, Arguments &arguments) {
-  CLI::Option *option =
-      command->add_option(parameter.name, arguments.*parameter.value, parameter.help);
+  std::string name = parameter.name;
+  const bool may_be_left_out = name.starts_with('[');
+  if (may_be_left_out) name = name.substr(1, name.size() - 2);
+  CLI::Option *option = parameter.values == nullptr
+                            ? command->add_option(name, arguments.*parameter.value, parameter.help)
+                            : command->add_option(name, arguments.*parameter.values, parameter.help)
+                                  ->allow_extra_args(false);
   option->type_name(parameter.type);
-  if (*parameter.name != '-') option->required();
+  if (!may_be_left_out && !name.starts_with('-')) option->required();
 }
 
 /// `chosen` becomes the command that the command line names.

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
-#include "tsm/messages.h"
+#include "common/messages.h"
 
 #include <algorithm>
 
-namespace tsm {
+namespace tools {
 namespace {
 
 constexpr Message kMessages[] = {
@@ -36,6 +36,14 @@ std::span<const Message> messages() {
   return kMessages;
 }
 
+std::string message_commands() {
+  std::string names;
+  for (const Message &message : kMessages) {
+    names += (names.empty() ? "" : ", ") + std::string(message.command);
+  }
+  return names;
+}
+
 const Message &message_of(MessageId id) {
   return kMessages[static_cast<uint32_t>(id) - static_cast<uint32_t>(MessageId::kGetDeviceState)];
 }
@@ -44,8 +52,12 @@ const Message *find_message_by_command(std::string_view command) {
   return find(&Message::command, command);
 }
 
+const Message *find_message_by_request(std::string_view request) {
+  return find(&Message::request, request);
+}
+
 const Message *find_message_by_response(std::string_view response) {
   return find(&Message::response, response);
 }
 
-}  // namespace tsm
+}  // namespace tools
