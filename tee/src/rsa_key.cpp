@@ -12,6 +12,7 @@
 #include <mutex>
 
 #include "instance.h"
+#include "rsa_completion.h"
 
 namespace tee {
 
@@ -80,24 +81,8 @@ bool is_plausible(const Attributes &attributes) {
   return p == attributes.end() || is_product(n, p->second, attributes.at(TEE_ATTR_RSA_PRIME2));
 }
 
-}  // namespace
-
-void cleanse(Attributes &attributes) {
-  for (auto &[id, value] : attributes) OPENSSL_cleanse(value.data(), value.size());
-}
-
-uint32_t num_bits(const std::vector<uint8_t> &number) {
-  const auto first = std::find_if(number.begin(), number.end(), [](uint8_t b) { return b != 0; });
-  if (first == number.end()) return 0;
-  const auto rest = static_cast<uint32_t>(number.end() - first - 1);
-  return 8 * rest + static_cast<uint32_t>(std::bit_width(*first));
-}
-
-SharedKey import_rsa_key(const Attributes &attributes) {
+SharedKey make_key(const Attributes &attributes) {
   static_assert(std::endian::native == std::endian::little);
-  const QuietErrors quiet;
-  if (!is_plausible(attributes)) return nullptr;
-
   // OpenSSL takes numbers in the byte order of the machine.
   size_t total = 0;
   for (const auto &[id, value] : attributes) total += value.size();
@@ -123,6 +108,39 @@ SharedKey import_rsa_key(const Attributes &attributes) {
                         params.data()) == 1;
   OPENSSL_cleanse(numbers.data(), numbers.size());
   return made ? share(key) : nullptr;
+}
+
+}  // namespace
+
+void cleanse(Attributes &attributes) {
+  for (auto &[id, value] : attributes) OPENSSL_cleanse(value.data(), value.size());
+}
+
+std::vector<uint8_t> value_of(const BIGNUM &number) {
+  std::vector<uint8_t> value(static_cast<size_t>(BN_num_bytes(&number)));
+  BN_bn2bin(&number, value.data());
+  return value;
+}
+
+uint32_t num_bits(const std::vector<uint8_t> &number) {
+  const auto first = std::find_if(number.begin(), number.end(), [](uint8_t b) { return b != 0; });
+  if (first == number.end()) return 0;
+  const auto rest = static_cast<uint32_t>(number.end() - first - 1);
+  return 8 * rest + static_cast<uint32_t>(std::bit_width(*first));
+}
+
+SharedKey import_rsa_key(const Attributes &attributes) {
+  const QuietErrors quiet;
+  if (!is_plausible(attributes)) return nullptr;
+  if (!attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT) ||
+      attributes.contains(TEE_ATTR_RSA_PRIME1)) {
+    return make_key(attributes);
+  }
+  Attributes completed = attributes;
+  completed.merge(crt_part_of(attributes));
+  SharedKey key = make_key(completed);
+  cleanse(completed);
+  return key;
 }
 
 namespace {
@@ -187,10 +205,7 @@ Attributes export_rsa_key(const EVP_PKEY &key) {
     if (EVP_PKEY_get_bn_param(&key, known.param, &value) != 1) {
       panic("OpenSSL", "a generated key lacks a component");
     }
-    const Number number(value);
-    std::vector<uint8_t> bytes(static_cast<size_t>(BN_num_bytes(value)));
-    BN_bn2bin(value, bytes.data());
-    attributes.emplace(known.id, std::move(bytes));
+    attributes.emplace(known.id, value_of(*Number(value)));
   }
   return attributes;
 }

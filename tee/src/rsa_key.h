@@ -21,11 +21,15 @@ using Attributes = std::map<uint32_t, std::vector<uint8_t>>;
 /// Overwrites the values.
 void cleanse(Attributes &attributes);
 
+/// A number as the value of an attribute.
+std::vector<uint8_t> value_of(const BIGNUM &number);
+
 /// Bits of an unsigned big-endian number, leading zeros left out.
 uint32_t num_bits(const std::vector<uint8_t> &number);
 
 /// The key that the attributes describe: modulus and public exponent, a private exponent, and
-/// five CRT components or none. NULL when it cannot be an RSA key, as far as cheap checks tell.
+/// five CRT components or none. A pair without them works with those that can be found. NULL when
+/// it cannot be an RSA key, as far as cheap checks tell.
 SharedKey import_rsa_key(const Attributes &attributes);
 
 /// A new key pair; an empty exponent stands for 65537. NULL when OpenSSL refuses.

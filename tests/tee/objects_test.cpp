@@ -49,6 +49,8 @@ TEST_F(Objects, MisusePanics) {
   twice.push_back(twice.front());
   uint32_t len = 0;
 
+  EXPECT_EQ(TEE_GetObjectBufferAttribute(pair.get(), TEE_ATTR_RSA_PRIME1, nullptr, &len),
+            TEE_ERROR_ITEM_NOT_FOUND);
   EXPECT_DEATH(TEE_FreeTransientObject(stale), "not an open object");
   EXPECT_DEATH(populate(pair.get(), rfc7515_private()), "initialized already");
   EXPECT_DEATH(populate(aes.get(), {{TEE_ATTR_SECRET_VALUE, Bytes(32)}}), "too big");

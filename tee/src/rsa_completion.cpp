@@ -1,0 +1,143 @@
+// SPDX-License-Identifier: BSD-2-Clause
+#include "rsa_completion.h"
+
+#include <tee_internal_api.h>
+
+#include <new>
+#include <optional>
+
+#include "evp.h"
+
+namespace tee {
+
+namespace {
+
+// How many times as large as λ(n) φ(n) may be. A try takes a thousandth of a private operation.
+constexpr int kMaxFactor = 256;
+
+// Of what is computed here nothing fails but for want of memory.
+void require(int done) {
+  if (done != 1) throw std::bad_alloc();
+}
+
+/// Numbers that live as long as it does, and are overwritten then.
+class Scratch {
+ public:
+  Scratch() : context_(BN_CTX_secure_new()) {
+    require(context_ != nullptr);
+    BN_CTX_start(context_.get());
+  }
+  ~Scratch() { BN_CTX_end(context_.get()); }
+  Scratch(const Scratch &) = delete;
+  Scratch &operator=(const Scratch &) = delete;
+
+  BIGNUM *number() {
+    BIGNUM *number = BN_CTX_get(context_.get());
+    require(number != nullptr);
+    return number;
+  }
+  BIGNUM *number(const std::vector<uint8_t> &value) {
+    BIGNUM *number = BN_bin2bn(value.data(), static_cast<int>(value.size()), this->number());
+    require(number != nullptr);
+    return number;
+  }
+  BN_CTX *context() { return context_.get(); }
+
+ private:
+  std::unique_ptr<BN_CTX, FreedBy<BN_CTX_free>> context_;
+};
+
+/// The larger one first.
+struct Primes {
+  BIGNUM *p;
+  BIGNUM *q;
+};
+
+// By Newton's method. The first guess is right in its first bit, and each step doubles the bits
+// that are right; of a number that is no square the last may be wrong.
+BIGNUM *root_of(const BIGNUM *square, Scratch &scratch) {
+  BIGNUM *root = scratch.number(), *other = scratch.number();
+  require(BN_set_bit(root, (BN_num_bits(square) + 1) / 2));
+  for (int right = 1; right <= BN_num_bits(square); right *= 2) {
+    require(BN_div(other, nullptr, square, root, scratch.context()));
+    require(BN_add(root, root, other));
+    require(BN_rshift1(root, root));
+  }
+  return root;
+}
+
+// φ(n) is n − (p + q) + 1, and the square of p − q is that of p + q less 4n.
+std::optional<Primes> split(const BIGNUM *n, const BIGNUM *phi, Scratch &scratch) {
+  BIGNUM *sum = scratch.number(), *square = scratch.number(), *product = scratch.number();
+  require(BN_sub(sum, n, phi));
+  require(BN_add_word(sum, 1));
+  require(BN_sqr(square, sum, scratch.context()));
+  require(BN_lshift(product, n, 2));
+  require(BN_sub(square, square, product));
+  if (BN_is_negative(square) || BN_is_zero(square)) return {};
+
+  const Primes primes = {scratch.number(), scratch.number()};
+  const BIGNUM *difference = root_of(square, scratch);
+  require(BN_add(primes.p, sum, difference));
+  require(BN_rshift1(primes.p, primes.p));
+  require(BN_sub(primes.q, sum, primes.p));
+  require(BN_mul(product, primes.p, primes.q, scratch.context()));
+  if (BN_cmp(product, n) != 0) return {};
+  return primes;
+}
+
+// e·d − 1 is a multiple of λ(n), so a small multiple of it is one of φ(n): k times as much. φ(n) is
+// so little less than n that k is what n goes into it, rounded up.
+std::optional<Primes> find_primes(const BIGNUM *n, const BIGNUM *e, const BIGNUM *d,
+                                  Scratch &scratch) {
+  BIGNUM *step = scratch.number(), *multiple = scratch.number();
+  BIGNUM *k = scratch.number(), *phi = scratch.number(), *rest = scratch.number();
+  require(BN_mul(step, e, d, scratch.context()));
+  require(BN_sub_word(step, 1));
+  for (int factor = 1; factor <= kMaxFactor; ++factor) {
+    require(BN_add(multiple, multiple, step));
+    require(BN_div(k, rest, multiple, n, scratch.context()));
+    if (!BN_is_zero(rest)) require(BN_add_word(k, 1));
+    require(BN_div(phi, rest, multiple, k, scratch.context()));
+    if (!BN_is_zero(rest)) continue;
+    if (const auto primes = split(n, phi, scratch)) return primes;
+  }
+  return {};
+}
+
+BIGNUM *exponent_for(const BIGNUM *prime, const BIGNUM *d, Scratch &scratch) {
+  BIGNUM *order = scratch.number(), *exponent = scratch.number();
+  require(BN_copy(order, prime) != nullptr);
+  require(BN_sub_word(order, 1));
+  require(BN_mod(exponent, d, order, scratch.context()));
+  return exponent;
+}
+
+}  // namespace
+
+Attributes crt_part_of(const Attributes &key) {
+  Scratch scratch;
+  const BIGNUM *n = scratch.number(key.at(TEE_ATTR_RSA_MODULUS));
+  const BIGNUM *e = scratch.number(key.at(TEE_ATTR_RSA_PUBLIC_EXPONENT));
+  const BIGNUM *d = scratch.number(key.at(TEE_ATTR_RSA_PRIVATE_EXPONENT));
+  const auto primes = find_primes(n, e, d, scratch);
+  if (!primes) return {};
+
+  // The flag chooses an inversion whose steps do not tell the numbers.
+  BN_set_flags(primes->p, BN_FLG_CONSTTIME);
+  const BIGNUM *coefficient =
+      BN_mod_inverse(scratch.number(), primes->q, primes->p, scratch.context());
+  const BIGNUM *exponent1 = exponent_for(primes->p, d, scratch);
+  const BIGNUM *exponent2 = exponent_for(primes->q, d, scratch);
+  if (coefficient == nullptr || BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
+
+  Attributes part;
+  part.emplace(TEE_ATTR_RSA_PRIME1, value_of(*primes->p));
+  part.emplace(TEE_ATTR_RSA_PRIME2, value_of(*primes->q));
+  part.emplace(TEE_ATTR_RSA_EXPONENT1, value_of(*exponent1));
+  part.emplace(TEE_ATTR_RSA_EXPONENT2, value_of(*exponent2));
+  part.emplace(TEE_ATTR_RSA_COEFFICIENT, value_of(*coefficient));
+  return part;
+}
+
+}  // namespace tee
