@@ -60,6 +60,18 @@ void write_json(const std::string &file, const Json &json) {
   tools::write_file(file, json.dump(2) + "\n");
 }
 
+/// The TEE key of the key service's record: the device ID, then {type, length, value} three times.
+Json tee_key_of(const std::string &identity) {
+  Json key = {{"kty", "RSA"}};
+  size_t at = 32;
+  for (const char *name : {"n", "e", "d"}) {
+    const size_t len = word_at(identity, at) >> 16;
+    key[name] = tools::base64url_encode(identity.substr(at + 4, len));
+    at += 4 + len;
+  }
+  return key;
+}
+
 void write_examples(const std::string &folder) {
   std::filesystem::create_directories(folder);
   Scene scene;
@@ -69,6 +81,7 @@ void write_examples(const std::string &folder) {
               {"tsm_key", tsm.key.private_pem()},
               {"device_id", scene.info.device_id},
               {"tee_public_key", tools::base64url_encode(scene.info.tee_key.encoded())},
+              {"tee_key", tee_key_of(scene.device.snapshot().key_service.at("IDENTITY"))},
               {"key_service", as_json(scene.device.snapshot().key_service)}});
   for (const Step &step : kSteps) {
     const Json before = as_json(scene.device.objects());

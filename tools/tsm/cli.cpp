@@ -10,6 +10,7 @@
 #include "common/error_line.h"
 #include "tsm/commands.h"
 #include "tsm/explain.h"
+#include "tsm/inspect.h"
 #include "tsm/response.h"
 
 namespace tsm {
@@ -218,6 +219,16 @@ const Command kCommands[] = {
      "Show the last known state of devices as a tree",
      {kDevice, {"--dsi", &Arguments::dsi_file, "Show this device state document"}, kJson},
      "show --device device.json"},
+    {"inspect",
+     run_inspect,
+     "Say what messages are, check by check, with the keys there are",
+     {{"FILE", &Arguments::input_files, "A message, a frame, or an exchange of docs/examples"},
+      {"--key", &Arguments::key_files,
+       "PEM file of a key; tsm=, ca=, tee= or aik= before it says whose"},
+      kDevice,
+      {"--dsi", &Arguments::dsi_file, "Device state document that requests were made for"},
+      kJson},
+     "inspect request.json --device device.json"},
     {"explain",
      run_explain,
      "Say what result codes mean, and what to do next",

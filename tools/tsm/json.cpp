@@ -121,6 +121,19 @@ std::optional<Json> parse_json(std::string_view text) {
   return value;
 }
 
+std::string json_problem(std::string_view text) {
+  const std::optional<std::string> prepared = prepare(text);
+  if (!prepared) return "nested deeper than " + std::to_string(kMaxDepth) + " levels";
+  try {
+    const Json value = Json::parse(*prepared);
+    return "";
+  } catch (const Json::exception &error) {
+    const std::string_view what = error.what();
+    const size_t end_of_number = what.find("] ");
+    return std::string(what.substr(end_of_number == what.npos ? 0 : end_of_number + 2));
+  }
+}
+
 std::string serialize_as_device(const Json &value) {
   std::string text;
   put_value(value, &text);

@@ -19,6 +19,9 @@ using Json = nlohmann::ordered_json;
 /// anything but white space.
 std::optional<Json> parse_json(std::string_view text);
 
+/// Why parse_json() gives nothing for `text`; empty when it gives something.
+std::string json_problem(std::string_view text);
+
 /// The compact text that the device makes of the same document, to the byte: eight characters are
 /// escaped (the slash among them), all others stand as they are; numbers are plain.
 std::string serialize_as_device(const Json &value);
