@@ -66,11 +66,32 @@ static void check_decoders(std::string_view slice, uint32_t len) {
   require(take_bytes(bytes, bytes_len) == decode_plainly(slice, true), "that is read likewise");
 }
 
+// In pieces of `size` characters: what was left over of a piece stands before the next.
+static std::string decode_pieces(std::string_view left, size_t size) {
+  std::string bytes(left.size() + 3, 0);
+  std::string piece;
+  size_t num_bytes = 0;
+  do {
+    piece += left.substr(0, size);
+    left.remove_prefix(std::min(size, left.size()));
+    auto len = static_cast<uint32_t>(piece.size());
+    num_bytes += base64urlDecodePiece(piece.data(), &len, left.empty(),
+                                      reinterpret_cast<uint8_t *>(bytes.data()) + num_bytes);
+    require(len <= 3, "less than a group is left over");
+    piece.resize(len);
+  } while (!left.empty());
+  return bytes.substr(0, num_bytes);
+}
+
 void check(std::string_view input) {
   const Inside inside;
   const device::Buffer exact(input);
   check_encoders(exact.bytes(), static_cast<uint32_t>(input.size()));
   check_decoders(exact.bytes(), static_cast<uint32_t>(input.size()));
+  for (const size_t size : {1, 2, 7, 64}) {
+    require(decode_pieces(exact.bytes(), size) == decode_plainly(exact.bytes(), true),
+            "pieces give what the whole gives");
+  }
 }
 
 }  // namespace fuzz

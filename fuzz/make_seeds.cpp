@@ -3,17 +3,15 @@
 //
 //     fuzz_make_seeds FOLDER        writes FOLDER/device.json and FOLDER/corpus/TARGET/*
 //
-// The messages are signed by keys of that device and its TSM, so all files are made anew together,
-// by the build target fuzz_seeds.
+// The messages are signed by keys of that device and its TSM, so all these files are made anew
+// together, by the build target fuzz_seeds. Inputs of other names stay: they were written by hand.
 #include <filesystem>
 
 #include "common/files.h"
+#include "support/manager.h"
 #include "support/target_device.h"
-#include "tsm/dsi.h"
 #include "tsm/image.h"
 #include "tsm/jwe.h"
-#include "tsm/request.h"
-#include "tsm/response.h"
 
 namespace fuzz {
 
@@ -63,53 +61,23 @@ static const Seed kSeeds[] = {
     {"get-ta-info-unknown", MessageId::kGetTaInfo, {.spid = "bank", .taid = kTicket}},
 };
 
-// A TSM and its device while they talk.
-class Life {
- public:
+// A device after its first steps, and its TSM. A new instance lists the SDs in their stored order.
+struct Life {
   Life() {
-    restart();
-    for (const Seed &step : kFirstSteps) run(step);
-    restart();
-  }
-
-  std::string request(const Seed &seed) const {
-    RequestOptions options = seed.options;
-    options.dsihash = dsi_text_.empty() ? "" : tsm::dsi_hash_of_text(dsi_text_);
-    const Json dsi = tsm::parse_json(dsi_text_).value_or(nullptr);
-    return tsm::make_request(seed.id, options, tsm_, device_, &dsi);
+    require(tsm.get_device_state().passed(), "the agent tells its state");
+    for (const Seed &step : kFirstSteps) {
+      require(tsm.run(step.id, step.options).passed(), "a request of the seeds is carried out");
+    }
+    require(device.restart() && tsm.get_device_state().passed(), "the agent starts again");
   }
 
   StoredDevice stored() const {
-    return {tsm_, dsi_text_, target_.agent_objects(), target_.key_service_objects()};
+    return {tsm.tsm(), tsm.dsi_text, device.agent_objects(), device.key_service_objects()};
   }
 
- private:
-  void run(const Seed &seed) {
-    const std::string frame = device::build_frame(static_cast<uint32_t>(seed.id), request(seed));
-    const device::Reply reply = target_.run(kMessageCommand, frame);
-    const std::string text = device::parse_answer(reply.output.bytes(), reply.size).response;
-    const tsm::Response response = tsm::open_response(text, {device_.tee_key, tsm_.key});
-    require(response.status != "fail", "a request of the seeds is carried out");
-    dsi_text_ = response.dsi_text.value_or(dsi_text_);
-  }
-
-  // A new instance lists the security domains in their stored order.
-  void restart() {
-    target_.close();
-    require(target_.open(), "the agent starts");
-    dsi_text_.clear();
-    run({"", MessageId::kGetDeviceState, {}});
-  }
-
-  tsm::DeviceInfo info() {
-    const device::Info found = device::read_info(target_.door());
-    return {found.device_id, tsm::RsaKey::from_encoded(found.tee_public_key).value()};
-  }
-
-  TargetDevice target_;
-  tsm::Identity tsm_ = admitted(tsm::RsaKey::generate(kKeyBits));
-  tsm::DeviceInfo device_ = info();
-  std::string dsi_text_;
+  TargetDevice device;
+  const tsm::Identity identity = admitted(tsm::RsaKey::generate(kKeyBits));
+  otrp_test::Manager tsm{device, identity};
 };
 
 static std::string g_folder;
@@ -134,7 +102,7 @@ static std::string content_of(const Seed &seed, const StoredDevice &device) {
 static void keep_messages(const Life &life, const StoredDevice &device) {
   for (const Seed &seed : kSeeds) {
     const auto id = static_cast<uint32_t>(seed.id);
-    const std::string text = life.request(seed);
+    const std::string text = life.tsm.request(seed.id, seed.options);
     const std::string content = content_of(seed, device);
     const std::string &image = seed.options.image;
     keep("frame", seed.name, device::build_frame(id, text));
@@ -177,7 +145,6 @@ int main(int argc, char **argv) {
   fuzz::g_folder = argv[1];
   const fuzz::Life life;
   const fuzz::StoredDevice device = life.stored();
-  std::filesystem::remove_all(fuzz::g_folder + "/corpus");
   fuzz::write_stored_device(device, fuzz::g_folder + "/device.json");
   keep_messages(life, device);
   keep_records(device);

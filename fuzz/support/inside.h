@@ -7,8 +7,8 @@
 
 #include <string>
 
-#include "device/device_client.h"
 #include "ownership.h"
+#include "support/exact.h"
 #include "support/require.h"
 
 namespace fuzz {
@@ -39,23 +39,9 @@ class Inside {
   World &world_;
 };
 
-/// A NUL-terminated copy of exact size, so that the sanitizer sees a character too far.
-class ExactText {
- public:
-  explicit ExactText(std::string_view text) : text_(std::string(text) + '\0') {}
-  const char *get() const { return text_.bytes().data(); }
-
- private:
-  device::Buffer text_;
-};
-
-inline const uint8_t *u8(std::string_view bytes) {
-  return reinterpret_cast<const uint8_t *>(bytes.data());
-}
-
-inline std::string_view as_view(const uint8_t *data, size_t size) {
-  return {reinterpret_cast<const char *>(data), size};
-}
+using otrp_test::as_view;
+using otrp_test::ExactText;
+using otrp_test::u8;
 
 /// Takes over a text of the agent.
 inline std::string take_text(char *text) {

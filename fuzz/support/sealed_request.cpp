@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "support/sealed_request.h"
 
-#include "device/device_client.h"
+#include "support/manager.h"
 #include "tsm/dsi.h"
 #include "tsm/jwe.h"
 #include "tsm/trust.h"
@@ -28,7 +28,8 @@ static std::string signature2_over(const Json &ids, std::string_view taid) {
   if (signatures.size() > 1000) signatures.clear();
   std::string &signature = signatures[tid + '\0' + rid + '\0' + std::string(taid)];
   if (signature.empty()) {
-    signature = tsm::signature2(dev_ca(), tid, rid, device.device_id(), taid, device.tsm.tsmid);
+    signature =
+        tsm::signature2(otrp_test::dev_ca(), tid, rid, device.device_id(), taid, device.tsm.tsmid);
   }
   return signature;
 }

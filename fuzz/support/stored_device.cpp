@@ -2,7 +2,7 @@
 #include "support/stored_device.h"
 
 #include "common/files.h"
-#include "tsm/trust.h"
+#include "support/manager.h"
 
 namespace fuzz {
 
@@ -57,15 +57,8 @@ tsm::RsaKey tee_key_of(const Objects &key_service) {
   return tsm::RsaKey::from_numbers(numbers[0], numbers[1], numbers[2]).value();
 }
 
-const tsm::RsaKey &dev_ca() {
-  static const tsm::RsaKey key =
-      tsm::RsaKey::from_pem(tools::read_file(OTRP_DEV_CA_TSM_KEY)).value();
-  return key;
-}
-
 tsm::Identity admitted(const tsm::RsaKey &key) {
-  const Json entry = tsm::tsm_entry(dev_ca(), "tsm1", key.encoded());
-  return {"tsm1", key, tsm::key_chain(tsm::ca_tsm_hash(dev_ca()), {entry}), dev_ca()};
+  return tsm::admit("tsm1", key, otrp_test::dev_ca());
 }
 
 static StoredDevice read_stored_device(const std::string &path) {

@@ -41,9 +41,6 @@ struct StoredDevice {
   tsm::RsaKey tee_key() const { return tee_key_of(key_service); }
 };
 
-/// The development CA.
-const tsm::RsaKey &dev_ca();
-
 /// The TSM "tsm1" with this key, admitted by the development CA.
 tsm::Identity admitted(const tsm::RsaKey &key);
 

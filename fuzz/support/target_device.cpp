@@ -92,37 +92,32 @@ uint32_t capacity_of(std::string_view frame) {
   return word == 0 ? kMaxCapacity : std::min(word, kMaxCapacity);
 }
 
-TargetDevice::TargetDevice() {
-  host_.register_ta({.uuid = kAgent},
-                    {TA_CreateEntryPoint, TA_DestroyEntryPoint, TA_OpenSessionEntryPoint,
-                     TA_CloseSessionEntryPoint, TA_InvokeCommandEntryPoint});
-  host_.register_ta({.uuid = kKeyService},
-                    {corvel_create, corvel_destroy, corvel_open, corvel_close, corvel_invoke});
+TargetDevice::TargetDevice() : ClientDevice(name()) {
+  register_ta({.uuid = kAgent},
+              {TA_CreateEntryPoint, TA_DestroyEntryPoint, TA_OpenSessionEntryPoint,
+               TA_CloseSessionEntryPoint, TA_InvokeCommandEntryPoint});
+  register_ta({.uuid = kKeyService},
+              {corvel_create, corvel_destroy, corvel_open, corvel_close, corvel_invoke});
 }
 
 TargetDevice::TargetDevice(const StoredDevice &stored) : TargetDevice() {
-  for (const auto &[id, data] : stored.key_service) host_.put_object(kKeyService, id, data);
+  for (const auto &[id, data] : stored.key_service) put_object(kKeyService, id, data);
   first_ = stored.agent;
   store(first_);
   require(open(), "the agent starts");
   first_state_ = state();
-  writes_ = host_.durable_writes();
+  writes_ = durable_writes();
 }
 
 bool TargetDevice::open() {
-  try {
-    session_ = std::make_unique<device::Session>(door_, device::kAgentUuid);
-  } catch (const device::Error &) {
-    require_clean_failure();
-    return false;
-  }
-  require_clean();
-  return true;
+  const bool is_open = ClientDevice::open();
+  is_open ? require_clean() : require_clean_failure();
+  return is_open;
 }
 
 void TargetDevice::require_clean() {
   tee_heap_stats now{};
-  require(tee_inspect_stats(door_.context(), &device::kAgentUuid, &now) == TEEC_SUCCESS,
+  require(tee_inspect_stats(door().context(), &device::kAgentUuid, &now) == TEEC_SUCCESS,
           "the instance lives on");
   require(now.live_blocks == kDsiBlocks, "only the state document is left on the heap");
   require(now.open_objects == 0 && now.open_operations == 0 && now.open_sessions == 0,
@@ -131,7 +126,7 @@ void TargetDevice::require_clean() {
 
 // The instance is gone, and its heap with it. So the same is tried again from inside.
 void TargetDevice::require_clean_failure() {
-  const tee::test::InsideTa inside(host_, {.uuid = kAgent});
+  const tee::test::InsideTa inside(*this, {.uuid = kAgent});
   require(init_dsi() == nullptr, "what fails fails again");
   const tee_heap_stats now = inside.stats();
   require(now.live_blocks == 0 && now.open_objects == 0 && now.open_operations == 0,
@@ -139,7 +134,7 @@ void TargetDevice::require_clean_failure() {
 }
 
 device::Reply TargetDevice::run(uint32_t command, std::string_view input, uint32_t capacity) {
-  device::Reply reply = session_->invoke(
+  device::Reply reply = session().invoke(
       {.command_id = command, .input = device::Buffer(input), .capacity = capacity});
   if (command == kMessageCommand) require_message_answer(reply);
   if (command == kQueryCommand) require_query_answer(reply);
@@ -159,26 +154,26 @@ void TargetDevice::require_message_answer(const device::Reply &reply) {
 }
 
 void TargetDevice::store(const Objects &objects) {
-  for (const auto &[id, data] : host_.objects(kAgent)) host_.remove_object(kAgent, id);
-  for (const auto &[id, data] : objects) host_.put_object(kAgent, id, data);
+  for (const auto &[id, data] : agent_objects()) remove_object(kAgent, id);
+  for (const auto &[id, data] : objects) put_object(kAgent, id, data);
 }
 
 void TargetDevice::restore() {
-  if (host_.durable_writes() == writes_ && state() == first_state_) return;
+  if (durable_writes() == writes_ && state() == first_state_) return;
   close();
   require(open(), "the agent starts with what it has stored");
   close();
   store(first_);
   require(open() && state() == first_state_, "the agent starts as it did at first");
-  writes_ = host_.durable_writes();
+  writes_ = durable_writes();
 }
 
 Objects TargetDevice::agent_objects() const {
-  return host_.objects(kAgent);
+  return objects(kAgent);
 }
 
 Objects TargetDevice::key_service_objects() const {
-  return host_.objects(kKeyService);
+  return objects(kKeyService);
 }
 
 }  // namespace fuzz

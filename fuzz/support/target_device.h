@@ -6,10 +6,9 @@
 
 #include <tee_test.h>
 
-#include <memory>
 #include <optional>
 
-#include "device/device_client.h"
+#include "support/client_device.h"
 #include "support/require.h"
 #include "support/stored_device.h"
 
@@ -23,7 +22,7 @@ constexpr uint32_t kQueryCommand = 1;
 constexpr uint32_t kMaxCapacity = 1 << 14;
 uint32_t capacity_of(std::string_view frame);
 
-class TargetDevice {
+class TargetDevice : tee::test::Device, public otrp_test::ClientDevice {
  public:
   /// With the objects of `stored`, or none.
   explicit TargetDevice(const StoredDevice &stored);
@@ -31,7 +30,6 @@ class TargetDevice {
 
   /// False when the instance cannot be created.
   bool open();
-  void close() { session_.reset(); }
 
   /// A command to the open instance. Ends the process unless the answer is well-formed, the rest
   /// of the output buffer untouched, and nothing left on the heap or open but the state document.
@@ -44,7 +42,6 @@ class TargetDevice {
   /// changed. The agent must be able to start with what is stored then.
   void restore();
 
-  device::Device &door() { return door_; }
   Objects agent_objects() const;
   Objects key_service_objects() const;
 
@@ -54,13 +51,10 @@ class TargetDevice {
   void require_message_answer(const device::Reply &reply);
 
   tee::test::TraceSink log_;
-  tee::test::Device host_;
-  device::Device door_{host_.name()};
   Objects first_;
   std::string first_state_;
   uint64_t writes_ = 0;
   std::optional<tsm::RsaKey> tee_key_;
-  std::unique_ptr<device::Session> session_;
 };
 
 }  // namespace fuzz

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // Requests that a handler refuses: the code in "reason", which members the answer has, what the log
-// says (log_lines.txt), and what is stored afterwards.
+// says (log_rows.txt), and what is stored afterwards.
 #include <gtest/gtest.h>
 
 #include "support/log_rows.h"

@@ -6,12 +6,11 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cstdlib>
-#include <filesystem>
 #include <random>
 #include <thread>
 
 #include "support/scene.h"
+#include "support/temporary_folder.h"
 
 namespace otrp_test {
 namespace {
@@ -55,9 +54,8 @@ pid_t in_a_process(Work work) {
 }
 
 TEST(Kill, AtAnyMomentLeavesADeviceThatCanBeManaged) {
-  std::string name = std::filesystem::temp_directory_path() / "kill_test_XXXXXX";
-  ASSERT_NE(mkdtemp(name.data()), nullptr);
-  const std::string directory = name + "/device";
+  const TemporaryFolder folder;
+  const std::string directory = folder.path / "device";
   tsm_named("tsm1");  // made here, so that all processes are the same TSM
   std::mt19937 random(20161);
   for (int i = 0; i < kNumKills && !HasFailure(); ++i) {
@@ -73,7 +71,6 @@ TEST(Kill, AtAnyMomentLeavesADeviceThatCanBeManaged) {
     waitpid(in_a_process([&] { return is_whole(directory); }), &status, 0);
     EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
   }
-  std::filesystem::remove_all(name);
 }
 
 }  // namespace

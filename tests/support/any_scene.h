@@ -6,22 +6,12 @@
 
 #include <gtest/gtest.h>
 
-#include <filesystem>
-
 #include "support/manager.h"
+#include "support/temporary_folder.h"
 
 namespace otrp_test {
 
-struct TemporaryDirectory {
-  TemporaryDirectory() = default;
-  TemporaryDirectory(const TemporaryDirectory &) = delete;
-  TemporaryDirectory &operator=(const TemporaryDirectory &) = delete;
-  ~TemporaryDirectory() { std::filesystem::remove_all(path); }
-
-  const std::string path = testing::TempDir() + "device-" + tsm::random_id();
-};
-
-class AnyDevice : private TemporaryDirectory, public ClientDevice {
+class AnyDevice : private TemporaryFolder, public ClientDevice {
  public:
   AnyDevice() : ClientDevice(environment("OTRP_TEST_CONTEXT", path)) {}
 };

@@ -62,6 +62,8 @@ class ClientDevice {
   explicit ClientDevice(const std::string &context) : door_(context) {}
 
   device::Device &door() { return door_; }
+  /// Of an open device.
+  device::Session &session() { return *session_; }
 
   /// Opens the session if it is closed. False, with the code, when the instance is not created.
   bool open(TEEC_Result *result = nullptr);

@@ -10,6 +10,7 @@
 
 #include "common/encoding.h"
 #include "ownership.h"
+#include "support/exact.h"
 
 namespace otrp_test {
 
@@ -27,14 +28,6 @@ class InsideAgent : public testing::Test {
   tee::test::InsideTa inside{device};
   tee::test::TraceSink log;
 };
-
-inline const uint8_t *u8(const std::string &bytes) {
-  return reinterpret_cast<const uint8_t *>(bytes.data());
-}
-
-inline uint32_t len_of(const std::string &bytes) {
-  return static_cast<uint32_t>(bytes.size());
-}
 
 inline std::string str(const secret_bytes &bytes) {
   return {reinterpret_cast<const char *>(bytes.data), bytes.len};

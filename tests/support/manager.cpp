@@ -85,8 +85,8 @@ static tsm::DeviceInfo info_of(device::Device &door) {
   return {info.device_id, tsm::RsaKey::from_encoded(info.tee_public_key).value()};
 }
 
-Manager::Manager(ClientDevice &device, const std::string &tsmid)
-    : info(info_of(device.door())), device_(device), tsm_(&tsm_named(tsmid)) {
+Manager::Manager(ClientDevice &device, const tsm::Identity &tsm)
+    : info(info_of(device.door())), device_(device), tsm_(&tsm) {
   if (!device.open()) throw std::runtime_error("the agent does not start");
 }
 

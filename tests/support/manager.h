@@ -64,7 +64,10 @@ tsm::RequestOptions usual(MessageId id);
 
 class Manager {
  public:
-  explicit Manager(ClientDevice &device, const std::string &tsmid = "tsm1");
+  explicit Manager(ClientDevice &device, const std::string &tsmid = "tsm1")
+      : Manager(device, tsm_named(tsmid)) {}
+  /// `tsm` must live longer.
+  Manager(ClientDevice &device, const tsm::Identity &tsm);
   /// Of a device in the state that `other` knows of its own.
   Manager(ClientDevice &device, const Manager &other);
 

@@ -25,7 +25,7 @@ class StateDirectory : public testing::Test {
   }
   std::string stored(const std::string &id) const { return Device(state).objects({})[id]; }
 
-  TempFolder folder;
+  TemporaryFolder folder;
   const fs::path state = folder.path / "a" / "b";
   const fs::path database = state / "objects.db";
   const fs::path log = state / "objects.db-wal";

@@ -33,7 +33,7 @@ class Persistent : public testing::TestWithParam<bool> {
   }
   ObjectMap stored() const { return device->objects({}); }
 
-  TempFolder folder;
+  TemporaryFolder folder;
   std::unique_ptr<Device> device;
   std::unique_ptr<InsideTa> ta;
   TEE_ObjectHandle object = TEE_HANDLE_NULL;

@@ -13,7 +13,7 @@ namespace {
 // ---- Sessions of the normal world
 
 TEST(Loading, AMissingOrWrongImageIsNamed) {
-  TempFolder folder;
+  TemporaryFolder folder;
   const std::filesystem::path images =
       std::filesystem::read_symlink("/proc/self/exe").parent_path().parent_path() / "ta";
   std::filesystem::copy(images / OTRP_CORVEL_IMAGE,

@@ -10,10 +10,10 @@
 #include <tee_test.h>
 
 #include <bit>
-#include <cstdlib>
-#include <filesystem>
 #include <functional>
 #include <string>
+
+#include "../support/temporary_folder.h"
 
 constexpr TEEC_UUID kTaA = {1, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xA}};
 constexpr TEEC_UUID kTaB = {2, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xB}};
@@ -21,17 +21,6 @@ constexpr TEEC_UUID kTaB = {2, 0, 0x4000, {0x80, 0, 0, 0, 0, 0, 0, 0xB}};
 inline TEE_UUID inner(const TEEC_UUID &uuid) {
   return std::bit_cast<TEE_UUID>(uuid);
 }
-
-class TempFolder {
- public:
-  TempFolder() {
-    std::string name = testing::TempDir() + "tee-test-XXXXXX";
-    path = ::mkdtemp(name.data());
-  }
-  ~TempFolder() { std::filesystem::remove_all(path); }
-
-  std::filesystem::path path;
-};
 
 /// What the trusted application number N does.
 struct Script {

@@ -7,9 +7,9 @@
 #include <sys/wait.h>
 
 #include <cstdlib>
-#include <filesystem>
 #include <string>
 
+#include "../support/temporary_folder.h"
 #include "common/files.h"
 
 class Program : public testing::Test {
@@ -20,13 +20,9 @@ class Program : public testing::Test {
     std::string err;
   };
 
-  explicit Program(const std::string &program) : program_(program) {
-    std::string name = testing::TempDir() + "program-XXXXXX";
-    directory_ = mkdtemp(name.data());
-  }
-  ~Program() override { std::filesystem::remove_all(directory_); }
+  explicit Program(const std::string &program) : program_(program) {}
 
-  std::string path(const std::string &name) const { return directory_ + "/" + name; }
+  std::string path(const std::string &name) const { return folder_.path / name; }
   std::string read(const std::string &name) const { return tools::read_file(path(name)); }
   void write(const std::string &name, const std::string &bytes) const {
     tools::write_file(path(name), bytes);
@@ -35,15 +31,15 @@ class Program : public testing::Test {
   /// In the test's directory.
   Outcome run(const std::string &arguments, const std::string &input = "") const {
     write("in", input);
-    const std::string command =
-        "cd " + directory_ + " && { " + program_ + " " + arguments + "; } <in >out 2>err";
+    const std::string command = "cd " + folder_.path.string() + " && { " + program_ + " " +
+                                arguments + "; } <in >out 2>err";
     const int status = std::system(command.c_str());
     return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, read("out"), read("err")};
   }
 
  private:
   std::string program_;
-  std::string directory_;
+  TemporaryFolder folder_;
 };
 
 #endif

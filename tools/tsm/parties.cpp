@@ -7,9 +7,12 @@
 namespace tsm {
 
 Identity make_identity(std::string_view tsmid, const RsaKey &ca) {
-  RsaKey key = RsaKey::generate();
+  return admit(tsmid, RsaKey::generate(), ca);
+}
+
+Identity admit(std::string_view tsmid, const RsaKey &key, const RsaKey &ca) {
   Json chain = key_chain(ca_tsm_hash(ca), {tsm_entry(ca, tsmid, key.encoded())});
-  return {std::string(tsmid), std::move(key), std::move(chain), ca};
+  return {std::string(tsmid), key, std::move(chain), ca};
 }
 
 DeviceInfo parse_device_info(std::string_view text) {

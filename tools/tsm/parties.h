@@ -21,6 +21,8 @@ struct Identity {
 
 /// A new TSM key, admitted by `ca`, which must have its private half.
 Identity make_identity(std::string_view tsmid, const RsaKey &ca);
+/// The same of a key that there is.
+Identity admit(std::string_view tsmid, const RsaKey &key, const RsaKey &ca);
 
 struct DeviceInfo {
   std::string device_id;

@@ -14,9 +14,7 @@ namespace {
 class Json : public InsideAgent {};
 
 json_ptr parse(const std::string &text) {
-  // A copy of exact size, so that a character too far is seen.
-  const std::vector<char> exact(text.c_str(), text.c_str() + text.size() + 1);
-  return json_ptr(json_parse_string(exact.data()));
+  return json_ptr(json_parse_string(ExactText(text.c_str()).get()));
 }
 
 std::string compact(const JSON_Value *value) {

@@ -4,7 +4,6 @@
 #include <array>
 #include <climits>
 #include <list>
-#include <vector>
 
 #include "support/inside_agent.h"
 
@@ -15,13 +14,12 @@ class TokenReader : public InsideAgent {
  protected:
   // Over a copy of exact size, so that a character too far is seen.
   token_object_ptr over(const std::string &text) {
-    const auto &exact = texts_.emplace_back(text.begin(), text.end());
-    const jsmn_string slice = {exact.data(), static_cast<uint32_t>(exact.size())};
+    const jsmn_string slice = {texts_.emplace_back(text).bytes().data(), len_of(text)};
     return token_object_ptr(jsmn_init_object(&slice));
   }
 
  private:
-  std::list<std::vector<char>> texts_;
+  std::list<device::Buffer> texts_;
 };
 
 std::string lookup(const jsmn_object *object, const char *key) {
