@@ -19,11 +19,28 @@ install(FILES keys/dev-ca-tsm.pem DESTINATION ${otrp_data_dir})
 
 install(FILES docs/man/otrp-device.1 docs/man/otrp-tsm.1
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
+install(FILES docs/man/otrp-tee.3 DESTINATION ${CMAKE_INSTALL_MANDIR}/man3)
+install(FILES docs/man/otrp.7 DESTINATION ${CMAKE_INSTALL_MANDIR}/man7)
 foreach(program otrp-device otrp-tsm)
   install(FILES tools/completion/otrp.bash
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME ${program})
 endforeach()
-install(FILES LICENSE NOTICE README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(FILES LICENSE NOTICE CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+file(GLOB examples CONFIGURE_DEPENDS docs/examples/*.json docs/examples/*.c)
+install(FILES ${examples} DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples)
+install(PROGRAMS tests/stranger/tsm.py DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples)
+
+# Pages with parts for the source alone, and others, in comments, for what is installed.
+file(MAKE_DIRECTORY ${CMAKE_BINARY_DIR}/installed)
+foreach(page README.md docs/protocol.md)
+  cmake_path(GET page FILENAME name)
+  set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${page})
+  execute_process(
+    COMMAND sed -e "/^<!-- source -->$/,/^<!-- end -->$/d" -e "/^<!-- package$/d" -e "/^-->$/d" ${page}
+    WORKING_DIRECTORY ${PROJECT_SOURCE_DIR}
+    OUTPUT_FILE ${CMAKE_BINARY_DIR}/installed/${name} COMMAND_ERROR_IS_FATAL ANY)
+  install(FILES ${CMAKE_BINARY_DIR}/installed/${name} DESTINATION ${CMAKE_INSTALL_DOCDIR})
+endforeach()
 
 # ---- For clients: find_package(otrp-tee) and pkg-config otrp-tee
 

@@ -79,7 +79,10 @@ void inspect_dsihash(const std::string &hash, const std::vector<StateAtHand> &st
     }
     if (state.was_named) tried += (tried.empty() ? "" : ", ") + state.name;
   }
-  if (tried.empty()) return report->not_checked("dsihash", hash + ": needs the state it is of");
+  if (tried.empty()) {
+    return report->not_checked("dsihash",
+                               hash + ": needs the state it is of (--dsi, or the TSM's --home)");
+  }
   report->failed("dsihash", hash + ": not of " + tried);
 }
 
