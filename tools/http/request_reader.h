@@ -66,9 +66,9 @@ class RequestReader {
   Step refuse(int status, const char *text);
 
   const RequestLimits &limits_;
-  std::string in_;        // fed, and not yet taken
-  size_t num_seen_ = 0;   // bytes of in_ that were searched for the end of the head
-  bool is_first_ = true;  // byte of the request still to come
+  std::string in_;                  // fed, and not yet taken
+  size_t num_seen_ = 0;             // bytes of in_ that were searched for the end of the head
+  bool may_have_line_feed_ = true;  // before the request that comes next
   std::unique_ptr<Parser> parser_;
   Refusal refusal_;
 };
