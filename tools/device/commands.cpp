@@ -89,13 +89,10 @@ uint32_t capacity_of(const Arguments &arguments) {
   return parse_number("--capacity", arguments.capacity);
 }
 
-void write_image(const Arguments &arguments, const Answer &answer) {
-  if (arguments.image_file.empty()) return;
-  if (answer.image) {
-    tools::write_file(arguments.image_file, *answer.image);
-  } else {
-    print_note("the answer holds no TA image, " + arguments.image_file + " is not written");
-  }
+/// Where the TA image goes, if it is wanted.
+std::optional<tools::OutputFile> open_image_file(const Arguments &arguments) {
+  if (arguments.image_file.empty()) return std::nullopt;
+  return tools::OutputFile(arguments.image_file);
 }
 
 }  // namespace
@@ -112,10 +109,17 @@ void send_request(const Arguments &arguments) {
   const std::string request = tools::read_file(sent.request_file);
   const Message &message = message_in(request, sent.message);
 
+  tools::OutputFile response_file(arguments.response_file);
+  std::optional<tools::OutputFile> image_file = open_image_file(arguments);
   OpenAgent agent(arguments);
   const Answer answer = send(agent.session, message, request, capacity);
-  if (!answer.response.empty()) tools::write_file(arguments.response_file, answer.response);
-  write_image(arguments, answer);
+  if (!answer.response.empty()) {
+    tools::keep_or_print(answer.response, [&] { response_file.write(answer.response); });
+  }
+  if (image_file && answer.image) image_file->write(*answer.image);
+  if (image_file && !answer.image) {
+    print_note("the answer holds no TA image, " + arguments.image_file + " is not written");
+  }
   require_success(message, answer);
 }
 

@@ -123,6 +123,27 @@ std::string written(const Buffer &buffer, size_t size) {
   return std::string(buffer.bytes().substr(0, size));
 }
 
+/// An agent without memory for a request reports whatever step comes to notice.
+bool may_lack_memory(const Answer &answer) {
+  constexpr size_t kLarge = 1 << 20;  // no request without a TA image comes near
+  return answer.request_len > kLarge &&
+         (answer.status == OTRP_BAD_REQUEST || answer.status == OTRP_NO_MEMORY ||
+          answer.status == TEEC_ERROR_OUT_OF_MEMORY);
+}
+
+/// What a failure has to do with sizes; empty when nothing.
+std::string size_detail(const Answer &answer) {
+  if (answer.needed_capacity != 0) {
+    return "the device did what was asked, but the TA image did not fit: the answer takes a "
+           "capacity of " +
+           std::to_string(answer.needed_capacity) + " bytes";
+  }
+  if (!may_lack_memory(answer)) return "";
+  return "the TA image is too large for the agent's memory, unless the request is bad in another "
+         "way: it has " +
+         std::to_string(answer.request_len) + " bytes; send a smaller image";
+}
+
 }  // namespace
 
 const TEEC_UUID kAgentUuid = OTRP_AGENT_UUID;
@@ -249,17 +270,15 @@ Answer send(Session &agent, const Message &message, std::string_view request, ui
                     .input = Buffer(build_frame(static_cast<uint32_t>(message.id), request)),
                     .capacity = capacity});
   if (reply.result != TEEC_SUCCESS) throw Error(message.command, reply.result, reply.origin);
-  return parse_answer(reply.output.bytes(), reply.size);
+  Answer answer = parse_answer(reply.output.bytes(), reply.size);
+  answer.request_len = request.size();
+  return answer;
 }
 
 void require_success(const Message &message, const Answer &answer) {
-  if (answer.status == 0) return;
-  const std::string detail = answer.needed_capacity == 0
-                                 ? ""
-                                 : "the device did what was asked, but the TA image did not fit: "
-                                   "the answer takes a capacity of " +
-                                       std::to_string(answer.needed_capacity) + " bytes";
-  throw Error(message.command, answer.status, Origin::kStatusWord, detail);
+  if (answer.status != 0) {
+    throw Error(message.command, answer.status, Origin::kStatusWord, size_detail(answer));
+  }
 }
 
 QueryAnswer query(Session &agent, std::string_view taid) {

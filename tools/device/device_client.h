@@ -145,6 +145,7 @@ struct Answer {
   std::string response;              // empty when there is none
   std::optional<std::string> image;  // the TA image
   size_t needed_capacity = 0;        // 0, unless the TA image did not fit
+  size_t request_len = 0;            // of what is answered, as far as known
 };
 
 /// Reads the answer in `buffer`, of which the agent said that it takes `size` bytes.

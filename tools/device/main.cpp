@@ -6,7 +6,9 @@
 #include <string>
 #include <vector>
 
+#include "common/command_line.h"
 #include "common/error_line.h"
+#include "common/process.h"
 #include "device/commands.h"
 #include "device/device_client.h"
 #include "device/inspect.h"
@@ -185,17 +187,11 @@ void add_inspection(CLI::App *app, Arguments &arguments, const Command *&chosen)
   add_commands(objects, kObjectCommands, arguments, chosen);
 }
 
-/// A word that has no place says more than what is missing because of it.
-std::string usage_text(const CLI::App &app, const CLI::ParseError &error) {
-  const std::vector<std::string> unknown = app.remaining(true);
-  return (unknown.empty() ? error.what() : "\"" + unknown.front() + "\" is not expected here") +
-         std::string(" (see --help)");
-}
-
-void run(int argc, char **argv) {
+void run(std::span<char *> words) {
   Arguments arguments;
   const Command *chosen = nullptr;
   CLI::App app("Drives an OTrP device from the normal world", kProgram);
+  app.fallthrough();
   app.footer(
       footer("Standard output carries only the result; \"-\" names standard input or output.\n"
              "Exit: 0 success, 1 the device answered with a failure, 2 wrong usage.\n",
@@ -203,19 +199,11 @@ void run(int argc, char **argv) {
   app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
   app.add_option("--state", arguments.state_directory, "State directory of the device")
       ->required()
-      ->type_name("DIR");
+      ->type_name("DIR")
+      ->envname("OTRP_STATE");
   add_commands(&app, kCommands, arguments, chosen);
   if (device::inspection() != nullptr) add_inspection(&app, arguments, chosen);
-
-  try {
-    app.parse(argc, argv);
-  } catch (const CLI::Success &wanted) {  // help or version
-    app.exit(wanted);
-    return;
-  } catch (const CLI::ParseError &error) {
-    throw tools::UsageError(usage_text(app, error));
-  }
-  chosen->run(arguments);
+  if (tools::parse_command_line(app, words)) chosen->run(arguments);
 }
 
 int report_failure() {
@@ -233,8 +221,9 @@ int report_failure() {
 }  // namespace
 
 int main(int argc, char **argv) {
+  tools::prepare_process();
   try {
-    run(argc, argv);
+    run({argv, static_cast<size_t>(argc)});
   } catch (...) {
     return report_failure();
   }

@@ -7,7 +7,9 @@
 #include <variant>
 #include <vector>
 
+#include "common/command_line.h"
 #include "common/error_line.h"
+#include "common/process.h"
 #include "tsm/commands.h"
 #include "tsm/explain.h"
 #include "tsm/inspect.h"
@@ -198,6 +200,10 @@ const Command kCommands[] = {
      "Verify, decrypt and show a response, and keep the device state",
      {{"RESPONSE", &Arguments::response_file, "The device's response"},
       kOneDevice,
+      {"--request", &Arguments::request_file,
+       "The request that it answers (default: one of those that wait for an answer)"},
+      {"--accept-old", &Arguments::accept_old,
+       "Take a response that was not asked for, or that brings an older state"},
       kDsi,
       kDsiOut,
       kJson},
@@ -286,23 +292,6 @@ void add_commands(CLI::App *app, std::span<const Command> commands, Arguments *a
   }
 }
 
-/// The commands that the deepest command on the line can be followed by.
-std::string expected_commands(const CLI::App *app) {
-  while (!app->get_subcommands().empty()) app = app->get_subcommands().front();
-  std::string names;
-  for (const CLI::App *command : app->get_subcommands([](const CLI::App *) { return true; })) {
-    names += (names.empty() ? "" : ", ") + command->get_name();
-  }
-  return names;
-}
-
-std::string explain(const CLI::ParseError &error, const CLI::App &app) {
-  const std::string commands = expected_commands(&app);
-  const bool lacks_command = !commands.empty() && error.get_name() == "RequiredError";
-  return lacks_command ? "expected a command: " + commands
-                       : std::string(error.what()) + " (--help tells more)";
-}
-
 int parse_and_run(std::span<char *> words) {
   CLI::App app("A Trusted Service Manager: makes requests for OTrP devices, reads their responses.",
                kProgram);
@@ -312,21 +301,18 @@ int parse_and_run(std::span<char *> words) {
       "verify.");
   Arguments arguments;
   app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
-  app.add_option("--home", arguments.home, "This TSM's home directory")->capture_default_str();
+  app.add_option("--home", arguments.home, "This TSM's home directory")
+      ->capture_default_str()
+      ->envname("OTRP_HOME");
   const Command *chosen = nullptr;
   add_commands(&app, kCommands, &arguments, &chosen);
-  try {
-    app.parse(static_cast<int>(words.size()), words.data());
-  } catch (const CLI::ParseError &error) {
-    if (error.get_exit_code() == 0) return app.exit(error);  // help or version
-    throw tools::UsageError(explain(error, app));
-  }
-  return chosen->run(arguments);
+  return tools::parse_command_line(app, words) ? chosen->run(arguments) : 0;
 }
 
 }  // namespace
 
 int run_command_line(std::span<char *> words) {
+  tools::prepare_process();
   try {
     return parse_and_run(words);
   } catch (const NotVerified &error) {

@@ -6,9 +6,8 @@
 
 #include "common/error_line.h"
 #include "common/files.h"
-#include "common/result_names.h"
-#include "device/device_client.h"
-#include "tsm/dsi.h"
+#include "tsm/channel.h"
+#include "tsm/exchange.h"
 #include "tsm/home.h"
 #include "tsm/image.h"
 #include "tsm/operator_input.h"
@@ -36,79 +35,25 @@ std::string default_ca_file() {
   return program.parent_path().parent_path() / "share" / "otrp" / kDevCaName;
 }
 
-/// The state that the operator names, or the one that the home keeps.
-std::optional<Json> known_state(const Home &home, const DeviceInfo &device,
-                                const std::string &dsi_file) {
-  return parse_known_dsi(dsi_file.empty() ? home.load_dsi(device)
-                                          : std::optional(tools::read_file(dsi_file)));
-}
-
-/// Keeps and shows what a verified response brought; the exit code says whether it is a refusal.
-int finish_response(const Arguments &arguments, const Home &home, const DeviceInfo &device,
-                    const Response &response) {
-  if (response.dsi_text) home.keep_dsi(device, *response.dsi_text);
-  if (response.dsi_text && !arguments.dsi_out_file.empty()) {
-    tools::write_file(arguments.dsi_out_file, *response.dsi_text);
+/// Shows a verified response that is kept; the exit code says whether it is a refusal.
+int finish(const Arguments &arguments, const Exchange &done) {
+  std::string refusal = refusal_of(done.response);
+  if (!refusal.empty() && done.tie != Tie::kIds) {
+    refusal += "; tied by " + std::string(tie_text(done.tie));
   }
-  const bool is_refusal = response.error_code.has_value();
   if (arguments.json) {
-    print_json(report_json(response));
-  } else if (!is_refusal && arguments.dsi_out_file != "-") {
-    print(report_lines(response));
+    print_json(report_json(done.response, done.tie));
+  } else if (refusal.empty() && arguments.dsi_out_file != "-") {
+    print(report_lines(done.response, done.tie));
   }
-  if (!is_refusal) return 0;
-  tools::print_error_line("otrp-tsm", "the device refused " +
-                                          std::string(response.message->command) + ": " +
-                                          tools::describe_result(*response.error_code));
-  return tools::kExitRefused;
+  for (const std::string &failure : {refusal, done.failure}) {
+    if (!failure.empty()) tools::print_error_line("otrp-tsm", failure);
+  }
+  return refusal.empty() && done.failure.empty() ? 0 : tools::kExitRefused;
 }
 
-/// A verified response proves who sent it, not that it answers this very request.
-void check_answers(const Response &response, const RequestOptions &options) {
-  const bool is_ta_info = response.message->id == MessageId::kGetTaInfo;
-  const std::pair<const char *, const std::string &> echoes[] = {
-      {is_ta_info ? "spid" : "rid", is_ta_info ? options.spid : options.rid},
-      {is_ta_info ? "taid" : "tid", is_ta_info ? options.taid : options.tid}};
-  for (const auto &[name, sent] : echoes) {
-    const std::string *echo = find_string(response.members, name);
-    const bool may_lack_it = response.error_code.has_value();
-    if (echo == nullptr ? !may_lack_it : *echo != sent) {
-      throw NotVerified("the response answers another request: its \"" + std::string(name) +
-                        "\" differs");
-    }
-  }
-}
-
-int manage(const Arguments &arguments) {
-  const Home home(arguments.home);
-  const Identity tsm = home.load_identity();
-  device::Device machine(arguments.state_dir);
-  const device::Info info = device::read_info(machine);
-  const std::optional<RsaKey> tee_key = RsaKey::from_encoded(info.tee_public_key);
-  if (!tee_key) throw NotVerified("the device's TEE key is no RSA key");
-  const DeviceInfo device = {info.device_id, *tee_key};
-
-  const std::optional<Json> dsi = known_state(home, device, "");
-  const Json *document = dsi ? &*dsi : nullptr;
-  RequestOptions options = prepare_options(arguments, dsi);
-  if (options.rid.empty()) options.rid = random_id();
-  if (options.tid.empty()) options.tid = random_id();
-  const std::string request = make_request(arguments.message, options, tsm, device, document);
-
-  const std::string name(message_of(arguments.message).command);
-  const device::Message &message = *device::find_message(name);
-  device::Session agent(machine, device::kAgentUuid);
-  const device::Answer answer = device::send(agent, message, request);
-  if (answer.response.empty()) device::require_success(message, answer);
-  const Response response = open_response(
-      answer.response, {.tee_key = device.tee_key, .tsm_key = tsm.key, .dsi = document});
-  check_answers(response, options);
-  if (answer.image && !arguments.image_out_file.empty()) {
-    tools::write_file(arguments.image_out_file, *answer.image);
-  }
-  const int exit_code = finish_response(arguments, home, device, response);
-  device::require_success(message, answer);  // the message may have passed and its image not fit
-  return exit_code;
+DeviceInfo read_device_file(const std::string &file) {
+  return parse_device_info(tools::read_file(file));
 }
 
 }  // namespace
@@ -125,24 +70,34 @@ int run_init(const Arguments &arguments) {
 int run_request(const Arguments &arguments) {
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
-  const DeviceInfo device = parse_device_info(tools::read_file(arguments.device_file));
-  const std::optional<Json> dsi = known_state(home, device, arguments.dsi_file);
-  const RequestOptions options = prepare_options(arguments, dsi);
-  const std::string request =
-      make_request(arguments.message, options, tsm, device, dsi ? &*dsi : nullptr);
-  tools::write_file(arguments.output_file, request);
+  DeviceRecord record = home.open_record(read_device_file(arguments.device_file));
+  const std::optional<Json> dsi = state_for(arguments.message, record, arguments.dsi_file);
+  tools::OutputFile output(arguments.output_file);
+  output.write(make_kept_request(arguments, tsm, dsi, &record).text);
   return 0;
 }
 
 int run_response(const Arguments &arguments) {
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
-  const DeviceInfo device = parse_device_info(tools::read_file(arguments.device_file));
-  const std::optional<Json> dsi = known_state(home, device, arguments.dsi_file);
-  const Response response =
-      open_response(tools::read_file(arguments.response_file),
-                    {.tee_key = device.tee_key, .tsm_key = tsm.key, .dsi = dsi ? &*dsi : nullptr});
-  return finish_response(arguments, home, device, response);
+  const std::string text = tools::read_file(arguments.response_file);
+  TiePolicy policy = {.accept_old = arguments.accept_old};
+  if (!arguments.request_file.empty()) {
+    policy.named = read_request(tools::read_file(arguments.request_file), tsm.key);
+  }
+
+  DeviceRecord record = home.open_record(read_device_file(arguments.device_file));
+  const std::optional<Json> dsi = state_for(
+      parse_envelope(text).message->id == MessageId::kGetTaInfo ? MessageId::kGetTaInfo
+                                                                : MessageId::kGetDeviceState,
+      record, arguments.dsi_file);
+  const Response response = open_response(
+      text, {.tee_key = record.device().tee_key, .tsm_key = tsm.key, .dsi = dsi ? &*dsi : nullptr});
+  const Tie tie = record.take(response, policy);
+  if (response.dsi_text && !arguments.dsi_out_file.empty()) {
+    tools::write_file(arguments.dsi_out_file, *response.dsi_text);
+  }
+  return finish(arguments, {.response = response, .tie = tie});
 }
 
 int run_image_pack(const Arguments &arguments) {
@@ -170,9 +125,13 @@ int run_image_show(const Arguments &arguments) {
 }
 
 int run_manage(const Arguments &arguments) {
+  const Home home(arguments.home);
+  const Identity tsm = home.load_identity();
   try {
-    return manage(arguments);
-  } catch (const device::Error &error) {
+    const std::unique_ptr<Channel> channel = open_local_device(arguments.state_dir);
+    DeviceRecord record = home.open_record(channel->info());
+    return finish(arguments, exchange(arguments, tsm, channel.get(), &record));
+  } catch (const ChannelError &error) {
     tools::print_error_line("otrp-tsm", error.what());
     return tools::kExitRefused;
   }
@@ -187,8 +146,8 @@ int run_show(const Arguments &arguments) {
   const Home home(arguments.home);
   std::vector<KnownDevice> devices = home.known_devices();
   if (!arguments.device_file.empty()) {
-    const DeviceInfo device = parse_device_info(tools::read_file(arguments.device_file));
-    devices = {{device, home.load_dsi(device)}};
+    const DeviceInfo device = read_device_file(arguments.device_file);
+    devices = {{device, home.folder_of(device)}};
   }
   if (devices.empty() && !arguments.json) {
     print("no devices known in " + arguments.home + ": run get-device-state\n");
@@ -196,7 +155,7 @@ int run_show(const Arguments &arguments) {
 
   Json list = Json::array();
   for (const KnownDevice &known : devices) {
-    const std::optional<Json> dsi = parse_known_dsi(known.dsi_text);
+    const std::optional<Json> dsi = read_dsi(known.folder);
     const Json *document = dsi ? &*dsi : nullptr;
     if (arguments.json) {
       list.push_back(device_json(known.device, document));

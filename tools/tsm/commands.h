@@ -23,6 +23,8 @@ struct Arguments {
   std::string dsi_file;
   std::string dsi_out_file;
   std::string response_file;
+  std::string request_file;
+  bool accept_old = false;
   std::string input_file;
   std::string output_file = "-";
   std::string image_file;

@@ -262,6 +262,15 @@ size_t RsaKey::modulus_len() const {
   return static_cast<size_t>(EVP_PKEY_get_size(get()));
 }
 
+size_t RsaKey::modulus_bits() const {
+  return static_cast<size_t>(EVP_PKEY_get_bits(get()));
+}
+
+bool RsaKey::has_sound_exponent() const {
+  const BigNumber exponent = number_of(number_param(get(), OSSL_PKEY_PARAM_RSA_E));
+  return BN_is_odd(exponent.get()) == 1 && BN_is_one(exponent.get()) == 0;
+}
+
 std::string RsaKey::fingerprint() const {
   return hex_encode(sha256(encoded())).substr(0, 16);
 }

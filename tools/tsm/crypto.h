@@ -44,6 +44,8 @@ class RsaKey {
   std::string private_pem() const;
   bool has_private_half() const;
   size_t modulus_len() const;  // bytes
+  size_t modulus_bits() const;
+  bool has_sound_exponent() const;  // odd, and not 1
   /// The first 16 hex digits of the SHA-256 digest of the encoded form: a name for people.
   std::string fingerprint() const;
 

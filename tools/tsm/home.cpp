@@ -18,11 +18,6 @@ constexpr std::string_view kCaFile = "ca-tsm.pem";
 constexpr size_t kCaModulusLen = 256;
 constexpr size_t kMaxTsmidLen = 55;  // with its prefix it is a storage object ID of 64 bytes
 
-bool exists(const std::string &path) {
-  std::error_code ignored;
-  return fs::exists(path, ignored);
-}
-
 void make_directory(const std::string &path) {
   std::error_code failure;
   const bool is_new = fs::create_directories(path, failure);
@@ -52,31 +47,59 @@ RsaKey parse_ca(std::string_view pem) {
   return *ca;
 }
 
+/// A key that an unfinished `init` left, if there is one.
+std::optional<RsaKey> left_key(const std::string &file) {
+  if (!tools::file_exists(file)) return std::nullopt;
+  const std::optional<RsaKey> key = RsaKey::from_pem(tools::read_file(file));
+  if (!key || !key->has_private_half()) {
+    throw UsageError(file + " holds no private key, and no TSM lives here yet: remove it");
+  }
+  return key;
+}
+
+DeviceInfo read_device(const std::string &file) {
+  try {
+    return parse_device_info(tools::read_file(file));
+  } catch (const UsageError &error) {
+    throw UsageError(file + ": " + error.what() +
+                     "; remove it, the next message to the device writes it anew");
+  }
+}
+
 }  // namespace
 
 Identity Home::create(std::string_view tsmid, std::string_view ca_pem) const {
   check_tsmid(tsmid);
-  for (const std::string_view file : {kIdentityFile, kKeyFile, kCaFile}) {
-    if (exists(path(file))) {
-      throw UsageError("a TSM lives in " + directory_ + " already (" + std::string(file) +
-                       "): choose another --home");
-    }
-  }
-  const Identity tsm = make_identity(tsmid, parse_ca(ca_pem));
-
+  const RsaKey ca = parse_ca(ca_pem);
   make_directory(directory_);
+  const tools::FileLock lock(path("lock"));
+  if (tools::file_exists(path(kIdentityFile))) {
+    throw UsageError("a TSM lives in " + directory_ + " already: choose another --home");
+  }
+  const std::optional<RsaKey> left_ca = left_key(path(kCaFile));
+  if (left_ca && left_ca->fingerprint() != ca.fingerprint()) {
+    throw UsageError(path(kCaFile) +
+                     " is the key of another CA-TSM: remove it, or name it in --ca");
+  }
+  const std::optional<RsaKey> key = left_key(path(kKeyFile));
+  const Identity tsm = admit(tsmid, key ? *key : RsaKey::generate(), ca);
+
   const Json identity = {{"tsmid", tsm.tsmid}, {"key_chain", tsm.key_chain}};
   tools::write_file(path(kKeyFile), tsm.key.private_pem(), tools::FileAccess::kOwnerOnly);
   tools::write_file(path(kCaFile), tsm.ca->private_pem(), tools::FileAccess::kOwnerOnly);
-  tools::write_file(path(kIdentityFile), identity.dump(2) + "\n");
+  tools::write_file(path(kIdentityFile), identity.dump(2) + "\n");  // last: it makes the TSM
   return tsm;
 }
 
-Identity Home::load_identity() const {
-  if (!exists(path(kIdentityFile))) {
+void Home::require_identity() const {
+  if (!tools::file_exists(path(kIdentityFile))) {
     throw UsageError("no TSM lives in " + directory_ +
                      ": run `otrp-tsm init` first, or name its --home");
   }
+}
+
+Identity Home::load_identity() const {
+  require_identity();
   const std::optional<Json> identity = parse_json(tools::read_file(path(kIdentityFile)));
   const std::string *tsmid = identity ? find_string(*identity, "tsmid") : nullptr;
   const Json *chain = identity ? find_object(*identity, "key_chain") : nullptr;
@@ -87,38 +110,27 @@ Identity Home::load_identity() const {
   }
 
   std::optional<RsaKey> ca;
-  if (exists(path(kCaFile))) ca = RsaKey::from_pem(tools::read_file(path(kCaFile)));
+  if (tools::file_exists(path(kCaFile))) ca = RsaKey::from_pem(tools::read_file(path(kCaFile)));
   if (ca && !ca->has_private_half()) ca.reset();
   return {*tsmid, *key, *chain, ca};
 }
 
-std::string Home::device_path(const DeviceInfo &device) const {
+std::string Home::folder_of(const DeviceInfo &device) const {
   return path("devices/" + device.tee_key.fingerprint());
 }
 
-std::optional<std::string> Home::load_dsi(const DeviceInfo &device) const {
-  const std::string file = device_path(device) + "/dsi.json";
-  if (!exists(file)) return std::nullopt;
-  return tools::read_file(file);
-}
-
-void Home::keep_dsi(const DeviceInfo &device, std::string_view dsi_text) const {
-  const std::string directory = device_path(device);
-  make_directory(path("devices"));
-  make_directory(directory);
-  tools::write_file(directory + "/device.json", device_info_json(device).dump(2) + "\n");
-  tools::write_file(directory + "/dsi.json", dsi_text);
-}
-
 std::vector<KnownDevice> Home::known_devices() const {
+  require_identity();
   std::vector<KnownDevice> known;
+  if (!tools::file_exists(path("devices"))) return known;
   std::error_code failure;
-  for (const fs::directory_entry &entry : fs::directory_iterator(path("devices"), failure)) {
-    const std::string file = entry.path().string() + "/device.json";
-    if (!exists(file)) continue;
-    const DeviceInfo device = parse_device_info(tools::read_file(file));
-    known.push_back({device, load_dsi(device)});
+  for (fs::directory_iterator entry(path("devices"), failure), end; !failure && entry != end;
+       entry.increment(failure)) {
+    const std::string folder = entry->path().string();
+    const std::string file = folder + "/device.json";
+    if (tools::file_exists(file)) known.push_back({read_device(file), folder});
   }
+  if (failure) throw UsageError("cannot read " + path("devices") + ": " + failure.message());
   std::ranges::sort(known, {}, [](const KnownDevice &entry) {
     return std::pair(entry.device.device_id, entry.device.tee_key.fingerprint());
   });

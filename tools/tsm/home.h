@@ -4,46 +4,49 @@
 ///     tsm.json           tsmid and the key chain that admits this TSM's key
 ///     tsm-key.pem        its private key
 ///     ca-tsm.pem         the CA-TSM private key it was made with; needed only for TA images
-///     devices/KEY/       one per device, named by its key's fingerprint:
-///       device.json        the device file
-///       dsi.json           the last verified state document, as the device made it
+///     devices/KEY/       one per device, named by its key's fingerprint: see device_record.h
+///     lock               held while an identity is made
 ///
 /// Functions throw tools::UsageError. Files with private keys are made 0600, directories 0700.
+/// What cannot be read is an error, never taken for absent.
 #ifndef TSM_HOME_H
 #define TSM_HOME_H
 
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "tsm/device_record.h"
 #include "tsm/parties.h"
 
 namespace tsm {
 
 struct KnownDevice {
   DeviceInfo device;
-  std::optional<std::string> dsi_text;
+  std::string folder;
 };
 
 class Home {
  public:
   explicit Home(std::string directory) : directory_(std::move(directory)) {}
 
-  /// Makes a new identity, admitted by the CA in `ca_pem`; never replaces one.
+  /// Makes a new identity, admitted by the CA in `ca_pem`; never replaces one. Of several at once
+  /// one succeeds. A key that was left by one which did not come to its end is taken over.
   Identity create(std::string_view tsmid, std::string_view ca_pem) const;
 
   Identity load_identity() const;
 
-  /// Nothing when the device has not reported its state yet.
-  std::optional<std::string> load_dsi(const DeviceInfo &device) const;
-  void keep_dsi(const DeviceInfo &device, std::string_view dsi_text) const;
+  DeviceRecord open_record(const DeviceInfo &device) const {
+    return DeviceRecord(folder_of(device), device);
+  }
+  std::string folder_of(const DeviceInfo &device) const;
 
+  /// Those that have been sent something, by their IDs.
   std::vector<KnownDevice> known_devices() const;
 
  private:
   std::string path(std::string_view name) const { return directory_ + "/" + std::string(name); }
-  std::string device_path(const DeviceInfo &device) const;
+  void require_identity() const;
 
   std::string directory_;
 };

@@ -91,7 +91,8 @@ void add_home(const Home &home, bool has_device, AtHand *at_hand) {
   for (const KnownDevice &known : devices) {
     const std::string name = "device " + known.device.device_id;
     add_device(known.device, name, false, at_hand);
-    if (known.dsi_text) at_hand->states.push_back({"the state of " + name, *known.dsi_text, false});
+    const std::optional<std::string> dsi_text = read_dsi_text(known.folder);
+    if (dsi_text) at_hand->states.push_back({"the state of " + name, *dsi_text, false});
   }
   if (devices.size() == 1) at_hand->device_id = devices.front().device.device_id;
 }
@@ -105,7 +106,8 @@ AtHand read_at_hand(const Arguments &arguments) {
   if (has_device) {
     const DeviceInfo device = parse_device_info(tools::read_file(arguments.device_file));
     add_device(device, arguments.device_file, true, &at_hand);
-    const std::optional<std::string> known = has_home ? home.load_dsi(device) : std::nullopt;
+    const std::optional<std::string> known =
+        has_home ? read_dsi_text(home.folder_of(device)) : std::nullopt;
     if (known && arguments.dsi_file.empty()) {
       at_hand.states.push_back({"the state of " + arguments.device_file + " in the home", *known});
     }

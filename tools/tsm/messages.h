@@ -8,6 +8,7 @@
 namespace tsm {
 
 using tools::find_message_by_command;
+using tools::find_message_by_request;
 using tools::find_message_by_response;
 using tools::Message;
 using tools::message_of;

@@ -60,11 +60,6 @@ Json parse_dsi(const std::string &text) {
   return *dsi;
 }
 
-std::optional<Json> parse_known_dsi(const std::optional<std::string> &text) {
-  if (!text) return std::nullopt;
-  return parse_dsi(*text);
-}
-
 RequestOptions prepare_options(const Arguments &arguments, const std::optional<Json> &dsi) {
   RequestOptions options = arguments.request;
   if (quotes_dsi(arguments.message)) {

@@ -12,9 +12,8 @@
 
 namespace tsm {
 
-/// Parses a state document as --dsi-out and the home keep it.
+/// Parses a state document as --dsi-out writes it.
 Json parse_dsi(const std::string &text);
-std::optional<Json> parse_known_dsi(const std::optional<std::string> &text);
 
 /// The complete options of the request that `arguments` ask for. `dsi` is the last known state of
 /// the device; the messages that change something cannot do without.

@@ -5,6 +5,17 @@
 #include "tsm/trust.h"
 
 namespace tsm {
+namespace {
+
+/// With another key, anyone could read what is encrypted for it, or sign with it.
+bool is_device_key(const RsaKey &key) {
+  constexpr size_t kMinModulusBits = 2048;
+  constexpr size_t kMaxModulusBits = 4096;
+  const size_t num_bits = key.modulus_bits();
+  return num_bits >= kMinModulusBits && num_bits <= kMaxModulusBits && key.has_sound_exponent();
+}
+
+}  // namespace
 
 Identity make_identity(std::string_view tsmid, const RsaKey &ca) {
   return admit(tsmid, RsaKey::generate(), ca);
@@ -25,6 +36,11 @@ DeviceInfo parse_device_info(std::string_view text) {
     throw tools::UsageError(
         "not a device file: expected what `otrp-device info` prints, "
         "{\"device_id\": \"...\", \"tee_public_key\": \"...\"}");
+  }
+  if (!is_device_key(*key)) {
+    throw tools::UsageError(
+        "bad \"tee_public_key\" in the device file: expected a modulus of 2048 to 4096 bits, and "
+        "an odd exponent from 3 on");
   }
   return {*device_id, *key};
 }

@@ -30,7 +30,7 @@ struct DeviceInfo {
 };
 
 /// Reads {"device_id": text, "tee_public_key": base64url of the encoded key}; throws
-/// tools::UsageError for anything else.
+/// tools::UsageError for anything else, and for a key that no device has.
 DeviceInfo parse_device_info(std::string_view text);
 Json device_info_json(const DeviceInfo &device);
 

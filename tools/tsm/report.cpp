@@ -29,13 +29,14 @@ std::string aik_line(const Json &content) {
 Json reason_json(uint32_t code) {
   const tools::ResultName *result = tools::find_result(code);
   return {{"error_code", code},
+          {"code", tools::code_text(code)},
           {"name", result == nullptr ? "" : result->name},
           {"hint", result == nullptr ? "" : result->hint}};
 }
 
 }  // namespace
 
-std::string report_lines(const Response &response) {
+std::string report_lines(const Response &response, Tie tie) {
   const bool is_ta_info = response.message->id == MessageId::kGetTaInfo;
   std::string lines = std::string(response.message->response) + ": signature verified with the " +
                       (is_ta_info ? "SP's AIK" : "device's TEE key") + "\n";
@@ -43,6 +44,7 @@ std::string report_lines(const Response &response) {
        {"rid", "tid", "status", "taid", "spid", "tsmid", "ta_version", "signercert"}) {
     lines += member_line(response.members, name);
   }
+  if (tie != Tie::kIds) lines += line("tied by", tie_text(tie));
   lines += member_line(response.content, "sdname") + aik_line(response.content);
   if (response.dsi_text) {
     lines += line("DSI hash", dsi_hash_of_text(*response.dsi_text));
@@ -52,10 +54,11 @@ std::string report_lines(const Response &response) {
   return lines;
 }
 
-Json report_json(const Response &response) {
+Json report_json(const Response &response, Tie tie) {
   Json report = {{"message", response.message->command},
                  {"response", response.message->response},
                  {"verified", true},
+                 {"tied_by", tie_text(tie)},
                  {"payload", response.members}};
   if (!response.status.empty()) report["status"] = response.status;
   if (response.error_code) report["reason"] = reason_json(*response.error_code);

@@ -9,13 +9,14 @@
 #include "tsm/json.h"
 #include "tsm/parties.h"
 #include "tsm/response.h"
+#include "tsm/waiting.h"
 
 namespace tsm {
 
 /// Lines for a response that is not a refusal.
-std::string report_lines(const Response &response);
+std::string report_lines(const Response &response, Tie tie);
 
-Json report_json(const Response &response);
+Json report_json(const Response &response, Tie tie);
 
 /// One device: a heading, and its state as a tree. `dsi` is NULL when the state is not known.
 std::string device_lines(const DeviceInfo *device, const Json *dsi);

@@ -1,0 +1,285 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: BSD-2-Clause
+"""otrp-tsm as an operator meets it, with real devices: exit codes, standard streams, files left.
+
+The programs, with what runs them where this machine cannot, are in $OTRP_DEVICE and $OTRP_TSM.
+"""
+import base64
+import hashlib
+import json
+import os
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+DEVICE, TSM = (os.environ[name].split() for name in ("OTRP_DEVICE", "OTRP_TSM"))
+TAID = "77a11e7a000000000000000000000001"
+
+
+class Operator(unittest.TestCase):
+    """A fresh folder with a TSM in ./tsm; its devices are made as they are named."""
+
+    @classmethod
+    def setUpClass(cls):
+        cls.made = tempfile.mkdtemp()  # a TSM and a device that it knows, to start from
+        for words in (TSM + ["init", "--tsmid", "tsm1"],
+                      TSM + ["manage", "--state", "d", "get-device-state"]):
+            subprocess.run(words, cwd=cls.made, check=True, capture_output=True)
+        with open(f"{cls.made}/device.json", "w") as file:
+            subprocess.run(DEVICE + ["--state", "d", "info"], cwd=cls.made, check=True, stdout=file)
+
+    @classmethod
+    def tearDownClass(cls):
+        shutil.rmtree(cls.made)
+
+    def setUp(self):
+        self.folder = tempfile.mkdtemp()
+        self.addCleanup(shutil.rmtree, self.folder)
+        os.rmdir(self.folder)
+        shutil.copytree(self.made, self.folder)
+
+    def path(self, name):
+        return os.path.join(self.folder, name)
+
+    def write(self, name, text):
+        with open(self.path(name), "wb") as file:
+            file.write(text if isinstance(text, bytes) else text.encode())
+
+    def read(self, name):
+        with open(self.path(name), "rb") as file:
+            return file.read()
+
+    def run_words(self, words, code, text="", stdout=subprocess.PIPE):
+        """Whatever is printed must have `text` in it."""
+        done = subprocess.run(words, cwd=self.folder, stdout=stdout, stderr=subprocess.PIPE)
+        done.out, done.err = done.stdout or b"", done.stderr.decode(errors="replace")
+        self.assertEqual(done.returncode, code, f"{words}\n{done.err}")
+        self.assertIn(text, done.err + done.out.decode(errors="replace"), words)
+        return done
+
+    def tsm(self, line, code=0, text="", **more):
+        return self.run_words(TSM + line.split(), code, text, **more)
+
+    def device(self, line, code=0, text="", **more):
+        return self.run_words(DEVICE + ["--state", "d"] + line.split(), code, text, **more)
+
+    def manage(self, line, code=0, text="", **more):
+        return self.tsm("manage --state d " + line, code, text, **more)
+
+    def request(self, line, name, **more):
+        return self.tsm(f"request --device device.json -o {name} {line}", **more)
+
+    def response(self, line, code=0, text=""):
+        return self.tsm("response --device device.json " + line, code, text)
+
+    def send(self, message, name):
+        return self.device(f"send {message} {name} -o {name}.answer")
+
+    def kept(self, name):
+        [device] = os.listdir(self.path("tsm/devices"))
+        return f"tsm/devices/{device}/{name}"
+
+
+class Answers(Operator):
+    def delete_sd(self, name):
+        self.request("delete-sd --sd sd --delete-ta true", name)
+        self.send("delete-sd", name)
+
+    def test_an_earlier_answer_is_not_taken_for_that_of_a_later_request(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        self.delete_sd("one")
+        self.response("one.answer")
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        state = self.read(self.kept("dsi.json"))
+        self.request("delete-sd --sd sd --delete-ta true", "two")  # and never sent
+        for line in ("one.answer", "one.answer --request two", "one.answer --request one"):
+            self.assertEqual(self.response(line, 3).out, b"")
+        self.assertEqual(self.read(self.kept("dsi.json")), state)
+        self.response("one.answer --accept-old", 0, "tied by")
+        self.assertNotEqual(self.read(self.kept("dsi.json")), state)
+
+    def test_each_waiting_request_is_answered_once_and_in_order(self):
+        for name in ("one", "two"):
+            self.request("get-device-state", name)
+            self.send("get-device-state", name)
+            self.manage("create-sd --sp sp --sd %s --sp-cert text" % name)
+        self.response("two.answer", 3, "older")  # than what create-sd brought
+        self.response("one.answer --accept-old")
+        self.response("two.answer")
+        self.response("two.answer", 3, "no request that waits")
+
+    def test_answers_without_ids_are_tied_to_the_only_request_of_their_kind(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        stale = self.path(self.kept("dsi.json")) + ".old"
+        shutil.copy(self.path(self.kept("dsi.json")), stale)
+        self.manage("create-sd --sp sp --sd more --sp-cert text")
+        for name in ("one", "two"):
+            self.request(f"--dsi {stale} update-sd --sp sp --sd sd", name)
+        self.send("update-sd", "one")
+        self.response("one.answer", 3, "carries no IDs, and 2 requests wait")
+        self.response("one.answer --request one", 1, "tied by its kind alone")
+        self.response("one.answer", 1, "tied by its kind alone")  # two's it could be
+        self.response("one.answer", 3, "no request that waits")
+
+    def test_ta_info_is_tied_by_sp_and_ta(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        self.write("file", "code")
+        self.tsm("image pack file -o image")
+        self.manage(f"install-ta --sp sp --sd sd --ta {TAID} --ta-version 1 --image image")
+        self.request(f"get-ta-info --sp sp --ta {TAID}", "one")
+        self.send("get-ta-info", "one")
+        self.request(f"get-ta-info --sp sp --ta {TAID[:-1]}2", "two")
+        self.response("one.answer --request two", 3)
+        self.response("one.answer", 0, "SP and TA alone")
+        self.response("one.answer", 3)
+
+    def test_what_does_not_verify_is_not_shown(self):
+        self.request("get-device-state", "one")
+        self.send("get-device-state", "one")
+        answer = self.read("one.answer")
+        self.write("tampered", answer[:60] + (b"B" if answer[60:61] == b"A" else b"A") + answer[61:])
+        for flags in ("", " --json", " --accept-old"):
+            self.assertEqual(self.response("tampered --dsi-out dsi.json" + flags, 3).out, b"")
+        self.assertFalse(os.path.exists(self.path("dsi.json")))
+        self.response("one.answer --dsi-out dsi.json", 0, "no service providers")
+        self.assertEqual(self.read("dsi.json"), self.read(self.kept("dsi.json")))
+
+
+class Requests(Operator):
+    def test_wrong_input_gets_one_line_and_leaves_no_file(self):
+        device = " --device device.json -o made.json"
+        sd = "request create-sd --sp sp --sp-cert c --sd "
+        self.write("file", "code")
+        for line in (
+                "fly", "explain 0xdead0003", "request", "request get-device-state -o made.json",
+                "request get-device-state --device missing.json -o made.json",
+                "request get-device-state --device file -o made.json",
+                "request get-device-state --device device.json -o missing/made.json",
+                'request get-device-state --rid a"b' + device,
+                sd + "sd --dsi device.json" + device, sd + "sd --sp-cert \udcff" + device,
+                sd + "s\1" + device, sd + "\udcff" + device, sd + "x" * 57 + device,
+                "request install-ta --sd sd --sp sp --ta short --ta-version 1 --image file" + device,
+                f"request install-ta --sd sd --sp sp --ta {TAID} --ta-version 1 --image file" + device,
+                "request delete-sd --sd sd --delete-ta maybe" + device,
+                "response missing.json --device device.json", "response file --device device.json",
+                "image show file", "image pack missing -o made.json",
+                "--home nowhere request get-device-state" + device,
+                "--home new init --tsmid a\1b", "--home new init --ca device.json",
+                "manage --state file get-device-state --home nowhere"):
+            with self.subTest(line):
+                outcome = self.tsm(line, 3 if line.startswith("response file") else 2)
+                self.assertEqual(outcome.out, b"")
+                self.assertRegex(outcome.err, r"\Aotrp-tsm: [^\n]+\n\Z")
+                for name in ("made.json", "new", "nowhere"):
+                    self.assertFalse(os.path.exists(self.path(name)))
+
+    def test_requests_are_made_from_the_kept_state_or_a_named_one(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text --dsi-out dsi.json", 0, "SD sd")
+        expected = hashlib.sha256(base64.b64encode(self.read("dsi.json"))).hexdigest()
+        for source in ("", " --dsi dsi.json"):
+            self.request("delete-sd --sd sd --delete-ta true" + source, "made")
+            payload = json.loads(self.read("made"))["DeleteSDRequest"]["payload"]
+            members = json.loads(base64.urlsafe_b64decode(payload + "=="))["DeleteSDTBSRequest"]
+            self.assertEqual(members["dsihash"], expected)
+        self.write("file", "code")
+        self.tsm("image pack file -o image")
+        install = f"install-ta --sd sd --ta {TAID} --ta-version 1 --image image --sp "
+        self.request(install + "sp", "made")
+        self.request(install + "other", "made", code=2, text="no AIK")
+        os.remove(self.path("tsm/ca-tsm.pem"))
+        self.request(install + "sp", "made", code=2, text="CA-TSM key's signature")
+
+
+class HomeFolder(Operator):
+    def test_damage_is_named_with_its_remedy(self):
+        state = self.kept("dsi.json")
+        self.write(state, "{}")
+        create = "create-sd --sp sp --sd sd --sp-cert text"
+        self.manage(create, 2, f"{state} is damaged: expected a device state document; "
+                    "get-device-state replaces it")
+        self.tsm("show", 2, state)
+        self.manage("get-device-state")
+        self.manage(create)
+        for name, remedy in (("requests.json", "remove it"), ("device.json", "remove it")):
+            self.write(self.kept(name), "{")
+            self.tsm("show", 2 if name == "device.json" else 0)
+            self.manage("get-device-state", 2 if name == "requests.json" else 0)
+            os.remove(self.path(self.kept(name)))
+            self.manage("get-device-state")
+
+    def test_what_cannot_be_read_is_not_taken_for_empty(self):
+        self.tsm("--home nowhere show", 2, "no TSM lives in nowhere")
+        shutil.rmtree(self.path("tsm/devices"))
+        os.symlink("devices", self.path("tsm/devices"))  # a loop, which root cannot read either
+        self.tsm("show", 2, "tsm/devices")
+        os.symlink("loop", self.path("loop"))
+        self.tsm("--home loop/tsm show", 2, "loop/tsm")
+
+    def test_init_is_repeated_and_wins_once(self):
+        self.tsm("init", 2, "lives in")
+        key = self.read("tsm/tsm-key.pem")
+        for name in ("tsm/tsm-key.pem", "tsm/ca-tsm.pem"):
+            self.assertEqual(os.stat(self.path(name)).st_mode & 0o777, 0o600)
+        os.remove(self.path("tsm/tsm.json"))  # the last file that is written
+        self.tsm("init")
+        self.assertEqual(self.read("tsm/tsm-key.pem"), key)
+        started = [subprocess.Popen(TSM + ["--home", "new", "init"], cwd=self.folder,
+                                    stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+                   for _ in range(4)]
+        outputs = [process.communicate()[0].decode() for process in started]
+        self.assertEqual(sorted(process.returncode for process in started), [0, 2, 2, 2])
+        shown = "".join(outputs).split()[1]
+        self.assertEqual(json.loads(self.read("new/tsm.json"))["tsmid"], shown)
+
+    def test_device_files_hold_keys_that_devices_have(self):
+        def key(n, e):
+            fields = [n.to_bytes(-(-n.bit_length() // 8), "big"), e.to_bytes(3, "big").lstrip(b"\0")]
+            return b"".join(len(field).to_bytes(4, "little") + field for field in fields)
+        modulus = (1 << 2047) + 12345
+        for n, e, code in ((modulus, 65537, 0), (modulus, 1, 2), (modulus, 2, 2),
+                           (modulus >> 1536 | 1, 65537, 2), (modulus << 4096 | 1, 3, 2)):
+            text = base64.urlsafe_b64encode(key(n, e)).decode().rstrip("=")
+            self.write("device.json", json.dumps({"device_id": "x", "tee_public_key": text}))
+            self.request("get-device-state", "made", code=code)
+
+
+class Streams(Operator):
+    def test_closed_streams_are_not_taken_by_files(self):
+        for closed in ("1>&-", "2>&-", "0<&- 1>&- 2>&-"):
+            for words in (DEVICE + ["--state d info"], TSM + ["manage --state d get-device-state"]):
+                self.run_words(["sh", "-c", " ".join(words) + " " + closed], 2 if "1" in closed else 0)
+        self.assertEqual([name for name in os.listdir(self.path("d")) if b"OTrP" in self.read("d/" + name)
+                          or b"device_id" in self.read("d/" + name)], [])
+        self.manage("get-device-state")
+
+    def test_no_answer_is_lost(self):
+        for name in ("one", "two"):
+            self.request("create-sd --sp sp --sd %s --sp-cert text" % name, name)
+        self.device("send create-sd one -o nowhere/answer", 2, "cannot write nowhere/answer")
+        self.manage("--dsi-out nowhere/dsi get-device-state", 2, "cannot write nowhere/dsi")
+        self.assertNotIn(b"one", self.device("objects list").out)
+        printed = self.device("send create-sd one -o /dev/full", 2, "went to standard output")
+        self.write("answer", printed.out)
+        self.response("answer", 0, "SD one")
+        printed = self.manage("--dsi-out /dev/full get-device-state", 2, "went to standard output")
+        self.assertIn(b"GetDeviceTEEStateResponse", printed.out)
+
+    def test_an_image_that_is_too_large_is_called_so(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        self.write("file", bytes(3_000_000))
+        self.tsm("image pack file -o image")
+        line = f"install-ta --sp sp --sd sd --ta {TAID} --ta-version 1 --image image"
+        self.manage(line, 1, "image is too large")
+        self.request(line, "one")
+        self.device("send install-ta one", 1, "image is too large")
+
+    def test_help_that_cannot_be_written_fails(self):
+        with open("/dev/full", "wb") as full:
+            for program in (DEVICE, TSM):
+                for word in ("--help", "--version"):
+                    self.run_words(program + [word], 2, stdout=full)
+
+
+if __name__ == "__main__":
+    unittest.main()

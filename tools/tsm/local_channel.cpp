@@ -1,0 +1,59 @@
+// SPDX-License-Identifier: BSD-2-Clause
+#include "device/device_client.h"
+#include "tsm/channel.h"
+#include "tsm/response.h"
+
+namespace tsm {
+namespace {
+
+/// Runs a step with the device; what fails there is told as a channel's failure.
+template <class Step>
+auto with_device(Step &&step) {
+  try {
+    return step();
+  } catch (const device::Error &error) {
+    throw ChannelError(error.what());
+  }
+}
+
+class LocalChannel : public Channel {
+ public:
+  explicit LocalChannel(const std::string &state_directory) : device_(state_directory) {}
+
+  DeviceInfo info() override {
+    const device::Info info = with_device([&] { return device::read_info(device_); });
+    const std::optional<RsaKey> tee_key = RsaKey::from_encoded(info.tee_public_key);
+    if (!tee_key) throw NotVerified("the device's TEE key is no RSA key");
+    return {info.device_id, *tee_key};
+  }
+
+  ChannelAnswer send(const Message &message, const std::string &request) override {
+    return with_device([&] {
+      const device::Message &known = *device::find_message(message.command);
+      device::Session agent(device_, device::kAgentUuid);
+      device::Answer answer = device::send(agent, known, request);
+      return ChannelAnswer{std::move(answer.response), std::move(answer.image),
+                           failure_of(known, answer)};
+    });
+  }
+
+ private:
+  static std::string failure_of(const device::Message &message, const device::Answer &answer) {
+    try {
+      device::require_success(message, answer);
+      return "";
+    } catch (const device::Error &error) {
+      return error.what();
+    }
+  }
+
+  device::Device device_;
+};
+
+}  // namespace
+
+std::unique_ptr<Channel> open_local_device(const std::string &state_directory) {
+  return with_device([&] { return std::make_unique<LocalChannel>(state_directory); });
+}
+
+}  // namespace tsm
