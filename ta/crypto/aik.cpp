@@ -19,22 +19,34 @@ TEE_Result generate_aik(tlv_box **box) {
   return TEE_SUCCESS;
 }
 
-TEE_Result get_aik_tlv_box_by_spid(const char *spid, tlv_box **box) {
-  CHECK(spid != nullptr && spid[0] != 0 && box != nullptr, OTRP_MISSING,
-        "get_aik_tlv_box_by_spid input is NULL");
-  *box = nullptr;
+// Both look-ups log under the name of the older.
+static const char kLookUp[] = "get_aik_tlv_box_by_spid";
 
-  const json_ptr sp_info(get_json_by_name(SP_INFO_PREFIX, spid));
-  CHECK(sp_info, OTRP_SP_NOT_FOUND, "get_sp_info_persistent_object_to_json_value error code: 0x%x",
-        OTRP_SP_NOT_FOUND);
+TEE_Result find_aik(const char *spid, tlv_box **box, TEE_Result *doubt) {
+  if (box != nullptr) *box = nullptr;
+  *doubt = TEE_SUCCESS;
+  CHECK_AS(kLookUp, spid != nullptr && spid[0] != 0 && box != nullptr, OTRP_MISSING,
+           "get_aik_tlv_box_by_spid input is NULL");
+
+  json_ptr sp_info;
+  const TEE_Result read = read_json_by_name(SP_INFO_PREFIX, spid, out(sp_info));
+  if (read != TEE_SUCCESS && read != TEE_ERROR_ITEM_NOT_FOUND) *doubt = read;
+  CHECK_AS(kLookUp, sp_info, OTRP_SP_NOT_FOUND,
+           "get_sp_info_persistent_object_to_json_value error code: 0x%x", OTRP_SP_NOT_FOUND);
+  const char *aik = json_object_get_string(json_value_get_object(sp_info.get()), "aik");
+  if (aik != nullptr && aik[0] != 0) *doubt = OTRP_NO_MEMORY;
   secret_bytes bytes;
-  bytes.len = base64DecodeStringRemoveEndZero(
-      json_object_get_string(json_value_get_object(sp_info.get()), "aik"), &bytes.data);
-  CHECK(bytes.data != nullptr && bytes.len != 0, OTRP_MISSING, "decode aik string fail");
-  box_ptr parsed(tlv_box_parse(bytes.data, bytes.len));
-  CHECK(parsed, OTRP_NO_MEMORY, "tlv_box_parse error");
-  *box = parsed.release();
+  bytes.len = base64DecodeStringRemoveEndZero(aik, &bytes.data);
+  CHECK_AS(kLookUp, bytes.data != nullptr && bytes.len != 0, OTRP_MISSING,
+           "decode aik string fail");
+  *box = tlv_box_parse(bytes.data, bytes.len);
+  CHECK_AS(kLookUp, *box != nullptr, OTRP_NO_MEMORY, "tlv_box_parse error");
   return TEE_SUCCESS;
+}
+
+TEE_Result get_aik_tlv_box_by_spid(const char *spid, tlv_box **box) {
+  TEE_Result ignored = TEE_SUCCESS;
+  return find_aik(spid, box, &ignored);
 }
 
 // The first steps of both readers below, with the same texts.
@@ -46,9 +58,9 @@ static TEE_Result load_box(const char *caller, const char *spid, box_ptr *box) {
 }
 
 TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key) {
+  if (key != nullptr) *key = TEE_HANDLE_NULL;
   CHECK(spid != nullptr && spid[0] != 0 && key != nullptr, OTRP_MISSING,
         "get_aik_key_handle params is null");
-  *key = TEE_HANDLE_NULL;
 
   box_ptr box;
   TRY(load_box(__func__, spid, &box));
@@ -58,10 +70,10 @@ TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key) {
 }
 
 TEE_Result read_public_aik(const char *spid, uint8_t **encoded, uint32_t *encoded_len) {
+  if (encoded != nullptr) *encoded = nullptr;
+  if (encoded_len != nullptr) *encoded_len = 0;
   CHECK(spid != nullptr && spid[0] != 0 && encoded != nullptr && encoded_len != nullptr,
         OTRP_MISSING, "read_public_aik input is NULL");
-  *encoded = nullptr;
-  *encoded_len = 0;
 
   box_ptr box;
   TRY(load_box(__func__, spid, &box));

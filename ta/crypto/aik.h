@@ -16,6 +16,11 @@
 /// OTRP_SP_NOT_FOUND without a readable record, OTRP_NO_MEMORY when the key is no box.
 [[nodiscard]] TEE_Result get_aik_tlv_box_by_spid(const char *spid, tlv_box **box);
 
+/// The same, for who would make a new key in the place of one that is not there. After a failure
+/// `*doubt` is TEE_SUCCESS when the SP certainly has no AIK, and otherwise says why that is open:
+/// a code of the storage, or OTRP_NO_MEMORY for a record or key that could not be taken apart.
+[[nodiscard]] TEE_Result find_aik(const char *spid, tlv_box **box, TEE_Result *doubt);
+
 /// The SP's AIK as a new key-pair object; codes as above.
 [[nodiscard]] TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key);
 

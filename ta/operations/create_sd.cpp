@@ -10,7 +10,6 @@
 #include "platform.h"
 #include "record_names.h"
 #include "state/dsi.h"
-#include "state/object_store.h"
 #include "state/records.h"
 
 namespace {
@@ -69,22 +68,32 @@ static TEE_Result check_sp_record(const char *caller, const char *spid, const ch
   return TEE_SUCCESS;
 }
 
-// An AIK that could not be read, for want of memory or by a failing storage, must not be replaced.
-static TEE_Result check_sp_has_no_aik(const char *caller, const char *spid) {
-  if (spid == nullptr) return TEE_SUCCESS;
-  tee_ptr<char> id;
-  concat_pobj_name(SP_INFO_PREFIX, spid, out(id));
-  CHECK_AS(caller, id, OTRP_NO_MEMORY, "no memory for sp_info_name");
-  const auto id_len = static_cast<uint32_t>(strlen(id.get()));
-  secret_bytes record;
-  const TEE_Result loaded =
-      allocate_and_load_data_from_persistent_object(id.get(), id_len, &record.data, &record.len);
-  if (loaded == TEE_ERROR_ITEM_NOT_FOUND || loaded == TEE_ERROR_BAD_PARAMETERS) return TEE_SUCCESS;
-  if (loaded != TEE_SUCCESS) return loaded;
+// Gives the SP an AIK: in the DSI first, then in a new record.
+static TEE_Result add_aik(const char *caller, const char *spid, const char *spcert,
+                          uint8_t **pubkey, uint32_t *pubkey_len) {
+  TRY(check_sp_record(caller, spid, spcert));
   box_ptr box;
-  CHECK_AS(caller, get_aik_tlv_box_by_spid(spid, out(box)) != TEE_SUCCESS, OTRP_NO_MEMORY,
-           "create sd fail, the aik could not be read");
+  TRY(make_aik(caller, &box, pubkey, pubkey_len));
+  // An earlier attempt may have announced a key that was never stored.
+  TRY_LOG_AS(caller, delete_dsi_spl_item_with_spid(g_dsi, spid),
+             "delete_dsi_spl_item_with_spid error code: 0x%x");
+  TRY(announce_aik(caller, spid, *pubkey, *pubkey_len));
+  secret_text encoded_box;
+  TRY(encode_aik(caller, box.get(), out(encoded_box)));
+  TRY_LOG_AS(caller, save_sp_info(spid, spcert, encoded_box.get()),
+             "save_sp_info fail error code: 0x%x");
   return TEE_SUCCESS;
+}
+
+static TEE_Result find_or_add_aik(const char *caller, const char *spid, const char *spcert,
+                                  uint8_t **pubkey, uint32_t *pubkey_len) {
+  box_ptr box;
+  TEE_Result doubt = TEE_SUCCESS;
+  const TEE_Result found = find_aik(spid, out(box), &doubt);
+  if (found == TEE_SUCCESS) return read_public_half(caller, box.get(), pubkey, pubkey_len);
+  // An AIK that is there but could not be read now must not be replaced.
+  CHECK_AS(caller, doubt == TEE_SUCCESS, doubt, "create sd fail, the aik could not be read");
+  return add_aik(caller, spid, spcert, pubkey, pubkey_len);
 }
 
 // Creates security domain `sdname` for SP `spid`; an SP without an AIK gets one.
@@ -111,19 +120,7 @@ static TEE_Result create_sd(const char *spid, const char *sdname, const char *sp
   // State changes from here on: SP, SD, list last, so that the list never names a missing SD.
   tee_ptr<uint8_t> key;
   uint32_t key_len = 0;
-  box_ptr box;
-  const TEE_Result found = get_aik_tlv_box_by_spid(spid, out(box));
-  if (found == TEE_SUCCESS && box) {
-    TRY(read_public_half(__func__, box.get(), out(key), &key_len));
-  } else {
-    TRY(check_sp_has_no_aik(__func__, spid));
-    TRY(check_sp_record(__func__, spid, spcert));
-    TRY(make_aik(__func__, &box, out(key), &key_len));
-    TRY(announce_aik(__func__, spid, key.get(), key_len));
-    secret_text encoded_box;
-    TRY(encode_aik(__func__, box.get(), out(encoded_box)));
-    TRY_LOG(save_sp_info(spid, spcert, encoded_box.get()), "save_sp_info fail error code: 0x%x");
-  }
+  TRY(find_or_add_aik(__func__, spid, spcert, out(key), &key_len));
   TRY_LOG(save_sd_info(spid, tsmid, sdname), "save_sd_info error code 0x%x");
   TRY_LOG(add_sd_item_to_sd_list(sdname, names), "add_sd_item_to_sd_list error code 0x%x");
   CHECK(save_sd_list(sd_list.get()) == TEE_SUCCESS, OTRP_NO_MEMORY, "save_sd_list error");

@@ -58,14 +58,13 @@ TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const 
 
 TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_t id_len,
                                                          uint8_t **data, uint32_t *len) {
+  if (data != nullptr) *data = nullptr;
+  if (len != nullptr) *len = 0;
   CHECK(id_len != 0 && id_len <= TEE_OBJECT_ID_MAX_LEN && data != nullptr && len != nullptr,
         TEE_ERROR_BAD_PARAMETERS,
         "pobj_id length too large, or pobj_id_size is zero, or NULL parameter pobj_id_length %u "
         "data_buf %p length %p\n",
         id_len, static_cast<void *>(data), static_cast<void *>(len));
-  *data = nullptr;
-  *len = 0;
-
   stored_object object;
   TEE_Result result =
       TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
@@ -126,15 +125,31 @@ void concat_pobj_name(const char *prefix, const char *name, char **id) {
   *id = text;
 }
 
-JSON_Value *get_json_by_name(const char *prefix, const char *name) {
+static TEE_Result read_json(const char *caller, const char *prefix, const char *name,
+                            JSON_Value **value) {
+  *value = nullptr;
+  if (name == nullptr) return TEE_ERROR_ITEM_NOT_FOUND;
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
-  CHECK(id, nullptr, "No memory for sd_pobj_name");
+  CHECK_AS(caller, id, OTRP_NO_MEMORY, "No memory for sd_pobj_name");
+  const auto id_len = static_cast<uint32_t>(strlen(id.get()));
   secret_bytes data;
-  const TEE_Result result = allocate_and_load_data_from_persistent_object(
-      id.get(), static_cast<uint32_t>(strlen(id.get())), &data.data, &data.len);
-  if (result != TEE_SUCCESS || data.data == nullptr) return nullptr;
-  return json_parse_string(reinterpret_cast<const char *>(data.data));
+  TRY(allocate_and_load_data_from_persistent_object(id.get(), id_len, &data.data, &data.len));
+  if (data.len == 0) return TEE_ERROR_ITEM_NOT_FOUND;
+  if (data.data != nullptr) *value = json_parse_string(reinterpret_cast<char *>(data.data));
+  return *value != nullptr ? TEE_SUCCESS : OTRP_NO_MEMORY;
+}
+
+TEE_Result read_json_by_name(const char *prefix, const char *name, JSON_Value **value) {
+  const TEE_Result result = read_json("get_json_by_name", prefix, name, value);
+  // No object has an ID that is too long for one.
+  return result == TEE_ERROR_BAD_PARAMETERS ? TEE_ERROR_ITEM_NOT_FOUND : result;
+}
+
+JSON_Value *get_json_by_name(const char *prefix, const char *name) {
+  JSON_Value *value = nullptr;
+  (void)read_json_by_name(prefix, name, &value);
+  return value;
 }
 
 static TEE_Result read_record(const char *prefix, const char *name, TEE_Result missing,

@@ -40,7 +40,14 @@
 /// `*id` receives a new text, prefix followed by name; NULL when either is NULL or memory ran out.
 void concat_pobj_name(const char *prefix, const char *name, char **id);
 
-/// The record `prefix` + `name` as a new JSON value; NULL when there is none that parses.
+/// The record `prefix` + `name` as a new JSON value.
+///
+/// TEE_ERROR_ITEM_NOT_FOUND when there certainly is no such record. Any other failure leaves that
+/// open: a code of the storage, or OTRP_NO_MEMORY for a record that did not parse.
+[[nodiscard]] TEE_Result read_json_by_name(const char *prefix, const char *name,
+                                           JSON_Value **value);
+
+/// The same; NULL when there is none that parses.
 JSON_Value *get_json_by_name(const char *prefix, const char *name);
 
 /// The same for one kind of record. OTRP_NOT_FOUND (OTRP_SP_NOT_FOUND for an SP) with NULL.
