@@ -178,9 +178,10 @@ static bool copy_text_member(JSON_Object *entry, const JSON_Object *record, cons
 TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Object *record) {
   const bool named =
       copy_text_member(entry, record, "name") && copy_text_member(entry, record, "spid");
+  CHECK_AS(caller, named, TEE_ERROR_OUT_OF_MEMORY, "no memory for name and spid of sd object");
   const bool has_talist = json_object_get_array(record, "talist") != nullptr;
   json_ptr talist;
-  if (named && has_talist) {
+  if (has_talist) {
     talist.reset(json_value_deep_copy(json_object_get_value(record, "talist")));
   }
   CHECK_AS(caller, talist && json_object_set_value(entry, "talist", talist.get()) == JSONSuccess,

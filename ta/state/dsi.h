@@ -23,6 +23,7 @@ struct dsi_json_str_t {
   char *sdl_json_str;  // SD entries
   char *spl_json_str;  // AIK entries
   char *tal_json_str;  // always an empty array
+  bool lacks_an_sd;    // an entry could not be loaded; until the next instance
 };
 
 struct dsi_t {
@@ -90,7 +91,7 @@ JSON_Value *construct_dsi();
 [[nodiscard]] TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,
                                         uint32_t key_len, const char *spaiktype);
 
-/// Sets `*found` to 1 when an SD entry has this spid, else to 0.
+/// Sets `*found` to 1 when an SD entry has this spid, or could have it were it there; else to 0.
 [[nodiscard]] TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid,
                                                uint32_t *found);
 

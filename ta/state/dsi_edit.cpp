@@ -66,27 +66,35 @@ TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, ui
   const JSON_Array *entries = json_value_get_array(working->sdl);
   size_t index = 0;
   TRY(find_entry(entries, "spid", spid, &index));
-  *found = index < json_array_get_count(entries) ? 1 : 0;
+  // An SD that is not in the DSI may be the SP's as well.
+  *found = index < json_array_get_count(entries) || dsi->lacks_an_sd ? 1 : 0;
   return TEE_SUCCESS;
 }
 
-TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
+static TEE_Result load_sd(const char *caller, dsi_json_str_t *dsi, const char *sdname) {
   json_ptr entry(json_value_init_object());
-  CHECK(entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
+  CHECK_AS(caller, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
   JSON_Object *members = json_value_get_object(entry.get());
-  CHECK(members != nullptr, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_object\n");
+  CHECK_AS(caller, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
+           "Bad get item object sdl_item_object\n");
   dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(open_dsi(caller, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
 
   const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
-  CHECK(record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
-        sdname != nullptr ? sdname : "(null)");
-  TRY(fill_sd_entry(__func__, members, json_value_get_object(record.get())));
+  CHECK_AS(caller, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
+           sdname != nullptr ? sdname : "(null)");
+  TRY(fill_sd_entry(caller, members, json_value_get_object(record.get())));
   const JSON_Status appended =
       json_array_append_value(json_value_get_array(working->sdl), entry.get());
   if (appended != JSONSuccess) return static_cast<TEE_Result>(appended);
   (void)entry.release();
-  return close_dsi(__func__, working.get(), dsi);
+  return close_dsi(caller, working.get(), dsi);
+}
+
+TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
+  const TEE_Result result = load_sd(__func__, dsi, sdname);
+  if (result != TEE_SUCCESS) dsi->lacks_an_sd = true;
+  return result;
 }
 
 TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname) {
