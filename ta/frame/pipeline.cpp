@@ -120,13 +120,17 @@ static TEE_Result verify(const message_entry *entry, const jsmn_string *message,
   return TEE_SUCCESS;
 }
 
-// Finds out which TSM sent the message; a GetTAInfo request names none.
+// Finds out which TSM sent the message; a GetTAInfo request names none. One that is named and
+// cannot be copied is not left out: the message would fail as another TSM's.
 static TEE_Result read_sender(const jsmn_object *tokens, work *job) {
   job->request.reset(tokens != nullptr ? jsmn_copy_object(tokens)
                                        : jsmn_init_object(job->message.get()));
   CHECK_AS(kName, job->request, OTRP_BAD_REQUEST, "init request_json get NULL");
   const slice_ptr tsmid(jsmn_object_get_string(job->request.get(), "tsmid"));
-  if (tsmid && tsmid->len != 0) job->tsmid.reset(jsmn_string_dup(tsmid->data, tsmid->len));
+  CHECK_AS(kName, tsmid, OTRP_NO_MEMORY, "no memory for tsmid");
+  if (tsmid->len == 0) return TEE_SUCCESS;
+  job->tsmid.reset(jsmn_string_dup(tsmid->data, tsmid->len));
+  CHECK_AS(kName, job->tsmid, OTRP_NO_MEMORY, "no memory for tsmid");
   return TEE_SUCCESS;
 }
 

@@ -80,7 +80,9 @@ TEE_Result check_dsihash(const exchange &x) {
   const exchange_texts &say = *x.texts;
   const slice_ptr slice(jsmn_object_get_string(x.request.get(), "dsihash"));
   CHECK_AS(say.process, slice || say.no_dsihash == nullptr, OTRP_BAD_REQUEST, "%s", say.no_dsihash);
+  const bool is_there = !slice || slice->data != nullptr;  // or there may be one
   const tee_ptr<char> hash(slice ? jsmn_string_dup(slice->data, slice->len) : nullptr);
+  CHECK_AS(say.process, hash || !is_there, OTRP_NO_MEMORY, "no memory for dsihash");
   const TEE_Result result = validate_dsihash(hash.get());
   if (result == TEE_SUCCESS || say.dsihash_failed == nullptr) return result;
   FAIL_AS(say.process, result, say.dsihash_failed, result);
@@ -96,7 +98,7 @@ TEE_Result decrypt_content(exchange *x, const JSON_Object **members) {
   text.reset();
 
   const key_object tee_key(jwe ? get_tee_key() : nullptr);
-  x->decrypted.reset(jwe ? decrypt_json(tee_key.get(), jwe.get()) : nullptr);
+  x->decrypted.reset(decrypt_json(tee_key.get(), jwe.get()));
   CHECK_AS(say.process, x->decrypted, OTRP_BAD_REQUEST, "decrypt_json error");
   *members = json_value_get_object(x->decrypted.get());
   CHECK_AS(say.process, *members != nullptr || say.content_no_object == nullptr, OTRP_NO_MEMORY,

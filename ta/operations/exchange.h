@@ -34,7 +34,7 @@ struct exchange_texts {
   const char *ids_failed;
   const char *no_dsihash;  // NULL: a header that cannot be made counts as no hash
   const char *dsihash_failed;
-  const char *content_unreadable;  // NULL: reported like one that does not decrypt
+  const char *content_unreadable;  // NULL: left to the decryption, which says so
   const char *content_no_object;   // NULL: the members of such a content are all missing
 
   const char *not_serialized;

@@ -242,10 +242,14 @@ static char *encode_aad(const char *caller, const uint8_t *header, uint32_t head
   return aad;
 }
 
-static bool unwrap_cek(TEE_ObjectHandle key, const uint8_t *encrypted_cek,
+static bool unwrap_cek(const char *caller, TEE_ObjectHandle key, const uint8_t *encrypted_cek,
                        uint32_t encrypted_cek_len, uint32_t cek_len, secret_bytes *cek) {
-  return rsa_decrypt(key, encrypted_cek, encrypted_cek_len, &cek->data, &cek->len) == TEE_SUCCESS &&
-         cek->len == cek_len;
+  const TEE_Result result =
+      rsa_decrypt(key, encrypted_cek, encrypted_cek_len, &cek->data, &cek->len);
+  if (result != TEE_SUCCESS) return false;
+  CHECK_AS(caller, cek->len == cek_len, false, "the content key has %u bytes, not %u", cek->len,
+           cek_len);
+  return true;
 }
 
 // `plain` is followed by a zero byte.
@@ -263,7 +267,8 @@ JSON_Value *decrypt_json_with_aes_cbc(TEE_ObjectHandle key, const uint8_t *ciphe
   const tee_ptr<char> aad(encode_aad(__func__, header, header_len));
   if (!aad) return nullptr;
   secret_bytes cek;
-  if (!unwrap_cek(key, encrypted_cek, encrypted_cek_len, kCbcCekLen, &cek)) return nullptr;
+  if (!unwrap_cek(__func__, key, encrypted_cek, encrypted_cek_len, kCbcCekLen, &cek))
+    return nullptr;
   const TEE_Result verified =
       verify_jwe_auth_tag(cek.data, cek.len, bytes_of(aad.get()), len_of(aad.get()), cipher,
                           cipher_len, iv, iv_len, tag, tag_len);
@@ -283,7 +288,8 @@ JSON_Value *decrypt_json_with_aes_gcm(TEE_ObjectHandle key, const uint8_t *ciphe
   const tee_ptr<char> aad(encode_aad(__func__, header, header_len));
   if (!aad) return nullptr;
   secret_bytes cek;
-  if (!unwrap_cek(key, encrypted_cek, encrypted_cek_len, kGcmCekLen, &cek)) return nullptr;
+  if (!unwrap_cek(__func__, key, encrypted_cek, encrypted_cek_len, kGcmCekLen, &cek))
+    return nullptr;
   secret_bytes plain;
   const TEE_Result decrypted =
       aes_gcm_decrypt(cek.data, cek.len, iv, iv_len, bytes_of(aad.get()), len_of(aad.get()), tag,
