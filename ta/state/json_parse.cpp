@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "failure.h"
 #include "state/json_node.h"
+#include "state/json_number.h"
 
 namespace {
 
@@ -202,73 +203,43 @@ static bool process_string(parser *in, decoded_string *string) {
 
 // ---- Numbers
 
-static constexpr double kPowersOfTen[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,
-                                          1e8,  1e9,  1e10, 1e11, 1e12, 1e13, 1e14, 1e15,
-                                          1e16, 1e17, 1e18, 1e19, 1e20, 1e21, 1e22};
-static constexpr int64_t kLastPower = 22;  // the last that a double holds exactly
-
-// Exact when `digits` has at most 15 digits and the exponent is in the table.
-static double scale(uint64_t digits, int64_t exponent) {
-  auto value = static_cast<double>(digits);
-  if (digits == 0 || exponent < -400) return 0;  // beyond the range of a double
-  if (exponent > 400) exponent = 400;
-  for (; exponent > kLastPower; exponent -= kLastPower) value *= kPowersOfTen[kLastPower];
-  for (; exponent < -kLastPower; exponent += kLastPower) value /= kPowersOfTen[kLastPower];
-  return exponent < 0 ? value / kPowersOfTen[-exponent] : value * kPowersOfTen[exponent];
-}
-
-namespace {
-
-struct decimal {
-  uint64_t digits;
-  int64_t exponent;
-};
-
-}  // namespace
-
 static bool is_digit(char c) {
   return c >= '0' && c <= '9';
 }
 
-// Digits that no double can tell apart any more only move the point.
-static const char *take_digits(const char *at, bool fraction, decimal *number) {
-  for (; is_digit(*at); ++at) {
-    const bool kept = number->digits < 1000000000000000000;
-    if (kept) number->digits = number->digits * 10 + static_cast<uint64_t>(*at - '0');
-    if (kept && fraction) --number->exponent;
-    if (!kept && !fraction) ++number->exponent;
-  }
+static const char *skip_digits(const char *at) {
+  while (is_digit(*at)) ++at;
   return at;
 }
 
 // `at` is returned unchanged when there is no complete exponent.
-static const char *take_exponent(const char *at, decimal *number) {
+static const char *take_exponent(const char *at, int64_t *exponent) {
   if ((*at | 0x20) != 'e') return at;
   const bool negative = at[1] == '-';
   const char *digit = negative || at[1] == '+' ? at + 2 : at + 1;
   if (!is_digit(*digit)) return at;
-  int64_t exponent = 0;
+  int64_t size = 0;
   for (; is_digit(*digit); ++digit) {
-    if (exponent < INT64_MAX / 20) exponent = exponent * 10 + (*digit - '0');
+    if (size < INT64_MAX / 20) size = size * 10 + (*digit - '0');
   }
-  number->exponent += negative ? -exponent : exponent;
+  *exponent = negative ? -size : size;
   return digit;
 }
 
 static bool take_number(parser *in, double *value) {
   const bool negative = *in->at == '-';
   const char *start = negative ? in->at + 1 : in->at;
-  decimal number = {};
-  const char *at = take_digits(start, false, &number);
-  const bool has_point = *at == '.';
-  if (has_point) at = take_digits(at + 1, true, &number);
-  if (at - start == (has_point ? 1 : 0)) return false;
-  at = take_exponent(at, &number);
+  const char *end = skip_digits(start);
+  const bool has_point = *end == '.';
+  if (has_point) end = skip_digits(end + 1);
+  if (end - start == (has_point ? 1 : 0)) return false;
+  int64_t exponent = 0;
+  const char *at = take_exponent(end, &exponent);
 
   const bool leading_zero = *start == '0' && at - start > 1 && start[1] != '.';
   if (leading_zero || (*at | 0x20) == 'x') return false;
-  const double magnitude = scale(number.digits, number.exponent);
-  if (magnitude - magnitude != 0) return false;  // too large for a double
+  double magnitude = 0;
+  if (!nearest_double(start, end, exponent, &magnitude)) return false;
   *value = negative ? -magnitude : magnitude;
   in->at = at;
   return true;

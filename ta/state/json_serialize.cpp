@@ -160,7 +160,8 @@ static void put_fraction(Sink *out, const binary_number &number) {
 static constexpr uint32_t kBillion = 1000000000;
 static constexpr uint32_t kMaxBillions = 35;  // limbs of 2^1024
 
-// An integer of 2^63 or more, exactly: limbs of nine digits, doubled as often as it takes.
+// An integer of 2^63 or more, exactly, and six zeros: limbs of nine digits, doubled as often as it
+// takes.
 template <class Sink>
 static void put_large(Sink *out, const binary_number &number) {
   uint32_t limbs[kMaxBillions] = {};
@@ -180,6 +181,7 @@ static void put_large(Sink *out, const binary_number &number) {
   }
   put_digits(out, limbs[num_limbs - 1], 1);
   for (uint32_t i = num_limbs - 1; i-- > 0;) put_digits(out, limbs[i], 9);
+  out->put_run(".000000", 7);
 }
 
 template <class Sink>
