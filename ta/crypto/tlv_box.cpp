@@ -36,6 +36,7 @@ void tlv_box_destroy(tlv_box *box) {
 }
 
 int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t len) {
+  if (box->serialized != nullptr) return TLV_SERIALIZED;
   if (len > UINT16_MAX || (value == nullptr && len != 0)) return TLV_ERROR;
   item_ptr item(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
   CHECK(item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
@@ -64,7 +65,6 @@ int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value) {
 }
 
 int tlv_box_put_bytes(tlv_box *box, uint16_t type, const uint8_t *value, uint32_t len) {
-  if (box->serialized != nullptr) return TLV_SERIALIZED;
   return tlv_box_putobject(box, type, value, len);
 }
 

@@ -44,10 +44,10 @@ void tlv_box_destroy(tlv_box *box);
 
 using box_ptr = owned<tlv_box *, tlv_box_destroy>;
 
-/// Copies a value of at most 65535 bytes into the box, be it open or not.
+/// Copies a value of at most 65535 bytes into an open box.
 [[nodiscard]] int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t len);
 
-/// The same for an open box; an int takes 4 bytes.
+/// The same; an int takes 4 bytes.
 [[nodiscard]] int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value);
 [[nodiscard]] int tlv_box_put_bytes(tlv_box *box, uint16_t type, const uint8_t *value,
                                     uint32_t len);

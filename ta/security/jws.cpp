@@ -274,6 +274,7 @@ static char *encode_signature(const char *caller, const char *payload, const cha
 
 char *construct_json_signature(const char *name, const char *payload, const char *protect,
                                JSON_Value *header, TEE_ObjectHandle key) {
+  json_ptr own_header(header);
   const json_ptr root(json_value_init_object());
   CHECK(name != nullptr && payload != nullptr && protect != nullptr, nullptr, "null parameter");
   CHECK(root, nullptr, "init response json error");
@@ -296,8 +297,9 @@ char *construct_json_signature(const char *name, const char *payload, const char
       add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
   if (!complete) return nullptr;
   payload_text.reset();
-  if (header != nullptr && json_object_set_value(members, "header", header) != JSONSuccess) {
-    return nullptr;
+  if (own_header) {
+    if (json_object_set_value(members, "header", header) != JSONSuccess) return nullptr;
+    (void)own_header.release();
   }
   CHECK(
       json_object_set_value(json_value_get_object(root.get()), name, envelope.get()) == JSONSuccess,

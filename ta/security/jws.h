@@ -39,8 +39,8 @@
                                     const jsmn_string *protect, const jsmn_string *signature,
                                     secret_bytes *decoded);
 
-/// The envelope of a response as a new text, or NULL. `header` replaces the generated one and is
-/// taken over on success, unless it is NULL; without `key` the device's TEE key signs.
+/// The envelope of a response as a new text, or NULL. `header`, unless it is NULL, replaces the
+/// generated one; it is freed whatever comes of the call. Without `key` the device's TEE key signs.
 char *construct_json_signature(const char *name, const char *payload, const char *protect,
                                JSON_Value *header, TEE_ObjectHandle key);
 

@@ -243,8 +243,8 @@ TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_l
 }
 
 TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key) {
+  if (key != nullptr) *key = TEE_HANDLE_NULL;
   CHECK(tsmid != nullptr && key != nullptr, OTRP_MISSING, "get_tsm_pubkey_by_tsmid input is NULL");
-  *key = TEE_HANDLE_NULL;
 
   tee_ptr<char> id;
   concat_pobj_name(TSM_INFO_PREFIX, tsmid, out(id));
