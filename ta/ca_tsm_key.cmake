@@ -39,7 +39,7 @@ function(otrp_generate_ca_tsm_key pem header)
   string(REPEAT "0x[0-9A-F][0-9A-F], " 8 row)
   string(REGEX REPLACE "(${row})" "\\1\n    " bytes "${bytes}")
   file(CONFIGURE OUTPUT ${header} CONTENT [[
-/// Generated from OTRP_CA_TSM_KEY: the root from which TSM keys are admitted.
+/// Generated from OTRP_CA_TSM_KEY: whose signature admits TSMs.
 #ifndef CA_TSM_KEY_H
 #define CA_TSM_KEY_H
 

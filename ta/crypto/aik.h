@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The attestation identity key (AIK) of a service provider: an RSA key pair made in the TEE and
-/// kept as a key box, in base64, in the "aik" member of the SP's record.
+/// Attestation identity keys (AIKs): one RSA key pair for each service provider, made here, never
+/// seen outside, and stored as a key box with what else is recorded of the provider.
 #ifndef AIK_H
 #define AIK_H
 
@@ -24,7 +24,7 @@
 /// The SP's AIK as a new key-pair object; codes as above.
 [[nodiscard]] TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key);
 
-/// The SP's encoded AIK public key in a new buffer; codes as above.
+/// Its public half, encoded, in a new buffer; codes as above.
 [[nodiscard]] TEE_Result read_public_aik(const char *spid, uint8_t **encoded,
                                          uint32_t *encoded_len);
 

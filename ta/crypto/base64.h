@@ -12,7 +12,7 @@
 
 #include <stdint.h>
 
-/// NULL when `data` is NULL or memory ran out; only the second logs.
+/// Without `data` NULL and nothing in the log; for want of memory NULL and a line.
 char *base64EncodeAddEndZero(const uint8_t *data, uint32_t len);
 char *base64urlEncodeAddEndZero(const uint8_t *data, uint32_t len);
 

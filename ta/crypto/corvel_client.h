@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// Client of the key service Corvel, which holds the device's identity and keys.
+/// What the agent asks of Corvel, the trusted application that knows who this device is and has its
+/// key.
 ///
-/// Each call opens a session, invokes one command and closes the session; nothing is kept. Codes
-/// of the key service are passed through. Lengths are what the key service's value output says,
-/// but never more than the buffer that it was given: TEE_ERROR_EXCESS_DATA then.
+/// Each question has a session to itself. Corvel's own codes are handed on. Lengths are what the
+/// key service's value output says, but never more than the buffer that it was given:
+/// TEE_ERROR_EXCESS_DATA then.
 #ifndef CORVEL_CLIENT_H
 #define CORVEL_CLIENT_H
 

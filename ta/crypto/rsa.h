@@ -7,7 +7,7 @@
 ///     0x11 modulus    0x12 public exponent    0x13 private exponent
 ///     0x14 first prime    0x15 second prime    0x16, 0x17 CRT exponents    0x18 CRT coefficient
 ///
-/// Records 0x14 to 0x18 are all present or all absent. An encoded public key is
+/// The last five come together or not at all. An encoded public key is
 ///
 ///     modulus length (4 bytes, little-endian) | modulus | exponent length (same) | exponent
 ///

@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// AES-GCM, AES-CBC with PKCS#7 padding, HMAC-SHA256, digests and random bytes on byte buffers.
 ///
-/// Each function builds its key object and operation, runs one complete operation and frees both:
-/// nothing is kept between calls. Keys are raw bytes. Outputs are new buffers, the caller's.
-/// Codes: TEE_ERROR_BAD_PARAMETERS for a missing out-pointer, TEE_ERROR_OUT_OF_MEMORY,
-/// TEE_ERROR_GENERIC when the AES key object cannot be built, else the platform's own.
+/// A call is a whole operation from a key in bytes to new buffers, and leaves nothing behind in the
+/// platform. Codes: TEE_ERROR_BAD_PARAMETERS for a missing out-pointer, TEE_ERROR_OUT_OF_MEMORY,
+/// TEE_ERROR_GENERIC for an AES key that the platform does not take, else the platform's own.
 #ifndef SYMMETRIC_H
 #define SYMMETRIC_H
 
@@ -48,9 +47,9 @@ TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len);
                                          uint32_t iv_len, const uint8_t *cipher,
                                          uint32_t cipher_len, uint8_t **plain, uint32_t *plain_len);
 
-/// Decrypts `buffer` where it lies, one block per update, so that a TA image is never in memory
-/// twice. Takes the buffer over: `*plain` is the same buffer, and after a failure it has been
-/// wiped and freed, except when an out-pointer was missing.
+/// Decrypts `buffer` where it lies, block by block: there is no room for a TA image twice. Takes
+/// the buffer over: `*plain` is the same buffer, and after a failure it has been wiped and freed,
+/// except when an out-pointer was missing.
 [[nodiscard]] TEE_Result aes_cbc_decrypt_with_update_block(const uint8_t *key, uint32_t key_len,
                                                            const uint8_t *iv, uint32_t iv_len,
                                                            uint8_t *buffer, uint32_t buffer_len,

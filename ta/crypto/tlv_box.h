@@ -64,7 +64,7 @@ uint32_t tlv_box_get_size(const tlv_box *box);
 /// A new box; NULL when the bytes are not whole records, a type repeats, or memory ran out.
 tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len);
 
-/// A record of fewer than 4 bytes holds no int: TLV_ERROR, as for one that is not there.
+/// TLV_ERROR for a value too short for an int, as for none.
 [[nodiscard]] int tlv_box_get_int(const tlv_box *box, uint16_t type, uint32_t *value);
 
 /// `*len` is the capacity and then the value's length; what the value leaves of the capacity is

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// The TA's entry points and its command interface.
+// Where the TEE comes in, and which command goes where.
 #include "crypto/corvel_client.h"
 #include "failure.h"
 #include "frame/pipeline.h"

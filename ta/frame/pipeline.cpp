@@ -71,7 +71,7 @@ TEE_Result add_ta_bin_to_out_buf(void *destination, const uint8_t *image, uint32
 
 // ---- The input frame
 
-// Nothing uses the reserved word and the two blocks, but a frame must have them, and they must fit
+// The word and both blocks at the start of a frame are for nobody, but they must be there, and fit
 // the heap.
 static bool take_copy(reader *in, uint32_t len, tee_ptr<uint8_t> *copy) {
   const uint8_t *bytes = nullptr;

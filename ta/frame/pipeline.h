@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The message pipeline: one OTrP request in, one signed OTrP response out.
+/// What becomes of a request frame on its way to an answer frame.
 ///
 ///     in:   reserved word | L1 | L1 bytes | L2 | L2 bytes | message ID | M | M bytes of JSON
 ///     out:  status | R | R bytes of JSON [ | T | T bytes of TA image ]
@@ -19,7 +19,7 @@
 /// image that did not fit, what would have been. Both buffers are shared with the normal world,
 /// and `out` serves as working memory for the decoded payload, which is wiped before returning.
 ///
-/// TEE_SUCCESS once the frame has been read, whatever came of the message. Otherwise
+/// TEE_SUCCESS when the frame was whole, whatever came of the message in it. Otherwise
 /// TEE_ERROR_BAD_PARAMETERS, TEE_ERROR_SHORT_BUFFER, OTRP_NO_MEMORY or TEE_ERROR_OUT_OF_MEMORY,
 /// and `*out_len` is as it was.
 [[nodiscard]] TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out,

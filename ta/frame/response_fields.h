@@ -8,8 +8,9 @@
 
 struct jsmn_object;
 
-/// Sets "ver" (always "1.0"), and "rid" and "tid" as the raw text between the quotes of the
-/// request. OTRP_BAD_REQUEST when the request lacks one, OTRP_NO_MEMORY, or the setter's -1.
+/// Sets "ver" (always "1.0"), and "rid" and "tid" with the request's own characters, escape
+/// sequences and all. OTRP_BAD_REQUEST when the request lacks one, OTRP_NO_MEMORY, or the setter's
+/// -1.
 [[nodiscard]] TEE_Result add_ver_rid_tid(JSON_Object *response, const jsmn_object *tbs);
 
 /// Sets the outcome. A `result` other than 0 gives "reason" and "status" "fail". 0 gives "status"

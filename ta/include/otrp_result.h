@@ -18,7 +18,7 @@
 constexpr TEE_Result OTRP_DSI_MISMATCH = 0xDEAD0001;
 /// CreateSD: the SD name is taken.
 constexpr TEE_Result OTRP_SD_EXISTS = 0xDEAD0002;
-/// UpdateSD: name, SP or TSM differs from the SD record.
+/// UpdateSD: the SD is recorded under another name, SP or TSM.
 constexpr TEE_Result OTRP_SD_MISMATCH = 0xDEAD0004;
 /// Malformed, unknown, unverifiable or undecryptable.
 constexpr TEE_Result OTRP_BAD_REQUEST = 0xDEAD0006;

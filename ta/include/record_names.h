@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// IDs of the agent's persistent objects: a prefix followed by the record's own name, or a fixed
-/// ID. An ID has at most TEE_OBJECT_ID_MAX_LEN bytes, which bounds the names.
+/// Under which IDs the agent stores. Where there is one object for each SD, SP, TA or TSM, its name
+/// stands behind a prefix, and both must fit TEE_OBJECT_ID_MAX_LEN bytes.
 #ifndef RECORD_NAMES_H
 #define RECORD_NAMES_H
 

@@ -88,7 +88,7 @@ static void delete_sd_ta(const JSON_Object *sd_info) {
   }
 }
 
-// An SP goes with its last SD.
+// The last SD takes its SP along.
 static TEE_Result check_dsi_sdl_if_spid_not_exist_delete(const char *spid) {
   uint32_t found = 0;
   TRY_LOG(check_spid_in_dsi_sdl(g_dsi, spid, &found), "check_spid_in_dsi_sdl error code: 0x%x");

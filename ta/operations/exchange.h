@@ -71,7 +71,7 @@ struct exchange {
 /// Echoes "ver", "rid" and "tid".
 [[nodiscard]] TEE_Result add_ids(exchange *x);
 
-/// Compares the request's "dsihash" with the state of the device.
+/// Refuses a request that was made for another state of the device.
 [[nodiscard]] TEE_Result check_dsihash(const exchange &x);
 
 /// Decrypts the request's "content" with the TEE key. `*members` stays the exchange's; it is NULL

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// GetTAInfo: what is recorded of a TA, signed with the AIK of the SP that the request names. A
-// failure has no response.
+// GetTAInfo: tells anyone who asks what is recorded of a TA. The SP's AIK signs it, not the device.
+// A failure has no response.
 #include "crypto/aik.h"
 #include "failure.h"
 #include "operations/exchange.h"

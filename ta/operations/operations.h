@@ -31,7 +31,7 @@
                                            char **response, ta_image *image,
                                            const jsmn_object *request);
 
-/// The encode function of GetTAInfo: the AIK of the SP named in the response signs.
+/// How GetTAInfo encodes: with the AIK of the SP that its response is about.
 [[nodiscard]] TEE_Result gettainfo_sign_encode(const char *response, uint8_t *destination,
                                                uint32_t *len);
 

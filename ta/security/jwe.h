@@ -41,14 +41,14 @@ JSON_Value *encrypt_json_with_gcm_iv_cek(TEE_ObjectHandle key, const JSON_Value 
                                          const uint8_t *iv, uint32_t iv_len, const uint8_t *cek,
                                          uint32_t cek_len, const char *header, uint32_t header_len);
 
-/// Encodes the five byte strings and fills the object.
+/// A JWE object from its parts.
 JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,
                                    const uint8_t *encrypted_cek, uint32_t encrypted_cek_len,
                                    const uint8_t *iv, uint32_t iv_len, const uint8_t *cipher,
                                    uint32_t cipher_len, const uint8_t *tag, uint32_t tag_len);
 
-/// The A128CBC-HS256 tag (RFC 7518, 5.2.2.1) in a new buffer of which `*tag_len` bytes are the
-/// tag. The MAC key is the first half of the CEK.
+/// The A128CBC-HS256 tag (RFC 7518, 5.2.2.1) with the front half of the CEK, in a new buffer
+/// of which `*tag_len` bytes are the tag.
 [[nodiscard]] TEE_Result compute_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len,
                                               const uint8_t *aad, uint32_t aad_len,
                                               const uint8_t *cipher, uint32_t cipher_len,

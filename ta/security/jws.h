@@ -23,7 +23,7 @@
 
 #define JWS_HEADER_RS256 "{\"alg\":\"RS256\"}"
 
-/// The verify stage of every message: checks the signature with the key of the header's tsmid and
+/// How a message is verified: checks the signature with the key of the header's tsmid and
 /// sets the context's payload. A GetDeviceState request brings that key along; a GetTAInfo
 /// request is not signed, and its payload is the message itself.
 ///
@@ -40,7 +40,8 @@
                                     secret_bytes *decoded);
 
 /// The envelope of a response as a new text, or NULL. `header`, unless it is NULL, replaces the
-/// generated one; it is freed whatever comes of the call. Without `key` the device's TEE key signs.
+/// generated one; it is freed whatever comes of the call. Where `key` is NULL, the device's
+/// own signs.
 char *construct_json_signature(const char *name, const char *payload, const char *protect,
                                JSON_Value *header, TEE_ObjectHandle key);
 
@@ -57,8 +58,8 @@ char *construct_json_signature(const char *name, const char *payload, const char
                                              uint8_t **signature, uint32_t *signature_len,
                                              TEE_ObjectHandle key);
 
-/// Sets "header" in a response: "deviceId", and "spekid" when `mode`, the signature-header mode
-/// word, is 2.
+/// Sets "header" in a response: "deviceId", and "spekid" when `mode` is 2, as a build can
+/// set it.
 [[nodiscard]] bool add_signature_header(JSON_Object *envelope, uint32_t mode);
 
 #endif

@@ -191,7 +191,7 @@ TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Obje
   return TEE_SUCCESS;
 }
 
-// One AIK entry serves every SD of an SP.
+// An SP has one entry, however many SDs it has.
 static TEE_Result dsi_init_sp(dsi_t *dsi, const char *spid) {
   const TEE_Result judged = judge_sp_exist(dsi->spl, spid);
   CHECK(judged != TEE_SUCCESS, TEE_SUCCESS, "judge_sp_exist %s", "exist");

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The JSON document model: every document that is stored, hashed, signed, encrypted or sent is
-/// parsed, built, edited and serialized here.
+/// JSON documents as trees: what the agent builds, changes or reads as a whole. Two builds of one
+/// document give one text, byte for byte, since hashes and signatures are taken over it.
 ///
-/// An object keeps its members in the order in which they were first added; names are unique in it.
+/// A name stands once in an object, where it was set first, whatever is set under it later.
 /// A value belongs to the caller until it is set into an object or appended to an array; from then
 /// on it lives and dies with that document. Pointers to it stay valid over that, and until it is
 /// removed, replaced or freed. What json_*_get_* returns is borrowed.
@@ -74,7 +74,7 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
 [[nodiscard]] JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value);
 [[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
 
-/// Frees an element; the last element takes its place.
+/// Frees an element; the array's last one moves there.
 [[nodiscard]] JSON_Status json_array_remove(JSON_Array *array, size_t index);
 
 // ---- Texts

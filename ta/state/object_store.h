@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The agent's persistent objects: save, load, delete, and the reader of JSON records.
+/// What the agent keeps over the end of its instance, as byte strings under IDs, and as JSON.
 ///
 /// An object's data stream is
 ///
 ///     length N (4 bytes, little-endian) | N bytes of payload | leftovers of a longer payload
 ///
-/// An existing object is rewritten from its start and not truncated, so readers go by N alone.
-/// Every operation opens, uses and closes its object. No other code opens persistent objects.
+/// A save writes over what is there and cuts nothing off, so N alone says where the payload ends.
+/// This is the one place that knows the platform's storage; nothing stays open behind a call.
 /// IDs have at most 64 bytes; codes of the platform are passed through.
 #ifndef OBJECT_STORE_H
 #define OBJECT_STORE_H
@@ -19,7 +19,7 @@
 /// Creates the object or writes it over, length and payload in one write: the platform leaves the
 /// old record or the new one, whatever happens meanwhile. A creation that gets no further leaves an
 /// empty object, which readers take for none. `overwrite` is the flag of that name in the creation
-/// call; an existing object is opened and written over either way.
+/// call; what is there already is written over either way.
 /// TEE_ERROR_OUT_OF_MEMORY, with nothing changed, when the payload cannot be copied.
 [[nodiscard]] TEE_Result save_data_to_persistent_object(const void *data, uint32_t len,
                                                         const char *id, uint32_t id_len,

@@ -43,8 +43,8 @@
 
 // ---- SD records
 
-/// A new record with an empty "talist". The first failing setter's -1 is returned. When the
-/// template cannot be built, TEE_SUCCESS with nothing handed out.
+/// A new record with an empty "talist". A text that cannot be set gives its setter's -1; a record
+/// that cannot even be begun TEE_SUCCESS, with nothing handed out.
 [[nodiscard]] TEE_Result init_sd_info(const char *spid, const char *tsmid, const char *sdname,
                                       JSON_Object **object, JSON_Value **value);
 
@@ -66,7 +66,7 @@
 
 // ---- TA records
 
-/// With `replace` an existing record is deleted first; a missing one is no error.
+/// With `replace` an older record is deleted first, where there is one.
 [[nodiscard]] TEE_Result save_ta_info_to_persistent_object(const char *spid, const char *sdname,
                                                            const char *taid, const char *ta_version,
                                                            bool replace);

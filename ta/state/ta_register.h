@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The table of installed TA images: which taid was installed with which image digest.
+/// Which image each TA was installed from, by its digest.
 ///
 /// It is one object, OTRP_TA_REGISTER_INFO, whose payload is
 ///
 ///     count (4 bytes, little-endian) | count rows of: taid (32 characters) | digest (32 bytes)
 ///
-/// Rows stay in the order in which they were added; a deletion closes the gap.
+/// New rows go to the end; a deletion closes the gap.
 #ifndef TA_REGISTER_H
 #define TA_REGISTER_H
 

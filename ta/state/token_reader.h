@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The token reader: picks values out of request texts without building a tree.
+/// Reads a few members of a large text at the price of its tokens: requests are mostly ciphertext,
+/// which nobody wants twice on the heap.
 ///
-/// It hands out slices of the text itself, as they stand there, escape sequences included. The
-/// text must outlive every slice and object that comes from it; freeing those leaves it alone.
+/// Values are pointers into the text, with its escape sequences. So the text has to stay for as
+/// long as they are used, and freeing them leaves it alone.
 ///
 /// A lookup takes the token that follows the first string equal to the key, in text order and at
 /// any depth, be that string a member's name or a value. So the first of two members wins, inner
@@ -37,11 +38,11 @@ jsmn_object *jsmn_init_object(const jsmn_string *slice);
 /// A new object like `object`, over the same text, which is not read again.
 jsmn_object *jsmn_copy_object(const jsmn_object *object);
 
-/// A new slice of the value that follows `key`, without the quotes of a string. Its `data` is NULL
-/// when there is no such value; that of an empty string is not. NULL: no memory.
+/// A new slice of the value behind `key`, without the quotes of a string. A value that is missing
+/// has NULL `data`, an empty string has not. NULL: no memory.
 jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key);
 
-/// A new object over the value that follows `key`; NULL when there is none or it is no object.
+/// A new object over the value behind `key`; NULL unless that is an object.
 jsmn_object *jsmn_object_get_object(const jsmn_object *object, const char *key);
 
 /// Both accept NULL.

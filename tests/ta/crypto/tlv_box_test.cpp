@@ -43,6 +43,15 @@ TEST_F(TlvBox, SerializesTheNewestRecordFirstAndCloses) {
   EXPECT_EQ(put(parse(expected), 0x20, {1}), TLV_SERIALIZED);
 }
 
+TEST_F(TlvBox, TakesNothingMoreOnceItIsClosed) {
+  const box_ptr parsed = parse({1, 0, 1, 0, 9});
+  const box_ptr serialized(tlv_box_create());
+  ASSERT_EQ(tlv_box_serialize(serialized.get()), 0);
+  for (tlv_box *box : {parsed.get(), serialized.get()}) {
+    EXPECT_EQ(tlv_box_putobject(box, 2, "value", 5), TLV_SERIALIZED);
+  }
+}
+
 TEST_F(TlvBox, LookupsThatFailLeaveTheirOutputsAlone) {
   EXPECT_EQ(tlv_box_parse(nullptr, 4), nullptr);
   const box_ptr box = parse({0x11, 0, 3, 0, 7, 8, 9});
