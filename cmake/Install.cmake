@@ -5,9 +5,12 @@ set(otrp_data_dir ${CMAKE_INSTALL_DATADIR}/otrp)
 set(otrp_ta_dir ${CMAKE_INSTALL_LIBDIR}/otrp/ta)  # beside the library, which looks there
 set(otrp_cmake_dir ${CMAKE_INSTALL_LIBDIR}/cmake/otrp-tee)
 
-# Programs and images find the library beside them, wherever the whole was moved to.
-file(RELATIVE_PATH bin_to_lib /${CMAKE_INSTALL_BINDIR} /${CMAKE_INSTALL_LIBDIR})
+# Programs find the library beside them, wherever the whole was moved to; images are loaded by it. A
+# path of the build's own would end in an empty element, which is the current directory.
+file(RELATIVE_PATH bin_to_lib /bin /${CMAKE_INSTALL_LIBDIR})
 set_target_properties(otrp-device otrp-tsm PROPERTIES INSTALL_RPATH "$ORIGIN/${bin_to_lib}")
+set_target_properties(otrp-device otrp-tsm tee otrp_agent_image corvel_image PROPERTIES
+  BUILD_WITH_INSTALL_RPATH ON)
 
 install(TARGETS otrp-device otrp-tsm RUNTIME)
 install(TARGETS tee EXPORT otrp-tee LIBRARY)
