@@ -4,19 +4,25 @@
 #include "failure.h"
 #include "ownership.h"
 
-// Characters are classified by comparing, sixteen at a time, and never looked up: what is encoded
+// Characters are classified by comparing, a block at a time, and never looked up: what is encoded
 // and decoded here may be a private key, and a table would show its bytes to whoever shares the
 // cache.
 
 namespace {
 
-using characters = int8_t __attribute__((vector_size(16)));
-using octets = uint8_t __attribute__((vector_size(16)));
-using quartets = uint32_t __attribute__((vector_size(16)));  // the same bytes, four by four
-
-constexpr uint32_t kNumCharacters = sizeof(characters);
+// Without vector registers the compiler writes out what happens to each character, and a block of
+// sixteen costs four times the code of one of four.
+#if defined(__SSE2__) || defined(__ARM_NEON)
+constexpr uint32_t kNumCharacters = 16;
+#else
+constexpr uint32_t kNumCharacters = 4;
+#endif
 constexpr uint32_t kNumQuartets = kNumCharacters / 4;
-constexpr uint32_t kBlockLen = kNumQuartets * 3;  // bytes behind sixteen characters
+constexpr uint32_t kBlockLen = kNumQuartets * 3;  // bytes behind that many characters
+
+using characters = int8_t __attribute__((vector_size(kNumCharacters)));
+using octets = uint8_t __attribute__((vector_size(kNumCharacters)));
+using quartets = uint32_t __attribute__((vector_size(kNumCharacters)));  // the same, four by four
 
 struct alphabet {
   int8_t value_62;
@@ -53,8 +59,9 @@ static uint32_t load_big_endian(const uint8_t *bytes) {
 // Reads one byte more than it encodes.
 template <const alphabet &To>
 static void encode_block(const uint8_t *bytes, char *text) {
-  const quartets bits = {load_big_endian(bytes), load_big_endian(bytes + 3),
-                         load_big_endian(bytes + 6), load_big_endian(bytes + 9)};
+  quartets bits;
+#pragma GCC unroll 4
+  for (uint32_t i = 0; i < kNumQuartets; ++i) bits[i] = load_big_endian(bytes + 3 * i);
   const quartets pairs = bits >> 20 | ((bits << 8) & 0x0FFF0000);
   const quartets split = first_byte_lowest(((pairs >> 6) & 0x003F003F) | (pairs & 0x003F003F) << 8);
   characters values;
@@ -148,20 +155,27 @@ static inline characters distances_of(characters text) {
 }
 
 static bool any_nonzero(characters flags) {
-  uint64_t halves[2];
-  memcpy(halves, &flags, sizeof halves);
-  return (halves[0] | halves[1]) != 0;
+  uint64_t words[(sizeof flags + 7) / 8] = {};
+  memcpy(words, &flags, sizeof flags);
+  uint64_t any = 0;
+  for (const uint64_t word : words) any |= word;
+  return any != 0;
 }
 
-// Two numbers of 24 bits. Eight bytes are quicker, where what follows is yet to be written.
-template <size_t Num>
-static inline void store_big_endian(uint32_t first, uint32_t second, uint8_t *to) {
-  uint64_t both = uint64_t{first} << 40 | uint64_t{second} << 16;
-  if (kLittleEndian) both = __builtin_bswap64(both);
-  memcpy(to, &both, Num);
+// Numbers of 24 bits, two at a time. Eight bytes are quicker, where what follows is yet to be
+// written.
+static inline void store_big_endian(const quartets &numbers, uint8_t *to) {
+#pragma GCC unroll 2
+  for (uint32_t i = 0; i < kNumQuartets; i += 2) {
+    const bool is_last = i + 2 >= kNumQuartets;
+    const uint32_t second = i + 1 < kNumQuartets ? numbers[i + 1] : 0;
+    uint64_t both = uint64_t{numbers[i]} << 40 | uint64_t{second} << 16;
+    if (kLittleEndian) both = __builtin_bswap64(both);
+    memcpy(to + 3 * i, &both, is_last ? kBlockLen - 3 * i : sizeof both);
+  }
 }
 
-// False, and nothing stored, when one of the sixteen characters has to be skipped.
+// False, and nothing stored, when one of the block's characters has to be skipped.
 template <const alphabet &Also>
 static inline bool decode_block(const char *from, uint8_t *to) {
   characters text;
@@ -174,8 +188,7 @@ static inline bool decode_block(const char *from, uint8_t *to) {
   split = first_byte_lowest(split);
   const quartets pairs = (split & 0x00FF00FF) << 6 | ((split >> 8) & 0x00FF00FF);
   const quartets bits = (pairs & 0xFFF) << 12 | pairs >> 16;
-  store_big_endian<8>(bits[0], bits[1], to);
-  store_big_endian<6>(bits[2], bits[3], to + 6);
+  store_big_endian(bits, to);
   return true;
 }
 
