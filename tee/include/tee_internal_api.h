@@ -8,8 +8,8 @@
 /// Lengths are in bytes, sizes of keys in bits. Outputs with a length pointer take the capacity of
 /// the buffer there and leave the length that was written; when that is too small the call returns
 /// TEE_ERROR_SHORT_BUFFER and leaves the length that is needed. Handles belong to the instance that
-/// opened them, which closes what it leaves open when it ends, without what was written there;
-/// TEE_HANDLE_NULL may be closed and freed. What the standard calls a programmer error (a handle
+/// opened them, which closes what it leaves open when it ends; TEE_HANDLE_NULL may be closed and
+/// freed. What the standard calls a programmer error (a handle
 /// that is not open, a call out of order, an attribute of another type) panics: one line on
 /// standard error, and the process aborts.
 #ifndef TEE_INTERNAL_API_H
@@ -280,8 +280,9 @@ TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo *objectInf
 TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attributeID, void *buffer,
                                         TEE_LengthType *size);
 
-/// Closes an object. What was written through a persistent object's handle becomes durable now, as
-/// a whole; with several handles that have written, when the last of them closes.
+/// Closes an object. It cannot fail: what was written is durable already. An object that was
+/// created empty and never written becomes durable now; when storage cannot take it, it is not
+/// there when it is opened next.
 void TEE_CloseObject(TEE_ObjectHandle object);
 
 /// Makes an object for a key of up to `maxObjectSize` bits, to be populated or generated.
@@ -317,9 +318,11 @@ TEE_Result TEE_OpenPersistentObject(uint32_t storageID, const void *objectID,
                                     TEE_LengthType objectIDLen, uint32_t flags,
                                     TEE_ObjectHandle *object);
 
-/// Creates an object with `initialData` (may be NULL when it is empty), positioned at its start; it
-/// is stored when the handle closes. `attributes` is TEE_HANDLE_NULL: objects with keys give
-/// TEE_ERROR_NOT_SUPPORTED. `object` must not be NULL, as it may in the standard.
+/// Creates an object with `initialData` (may be NULL when it is empty), positioned at its start. It
+/// is durable when the call returns; without data it may wait for the first TEE_WriteObjectData()
+/// (of any size, 0 included) or for TEE_CloseObject(), and what it replaces stays until then.
+/// `attributes` is TEE_HANDLE_NULL: objects with keys give TEE_ERROR_NOT_SUPPORTED. `object` must
+/// not be NULL, as it may in the standard.
 ///
 /// Returns TEE_ERROR_ACCESS_CONFLICT when the object exists and TEE_DATA_FLAG_OVERWRITE is not set,
 /// or when it is open; TEE_ERROR_STORAGE_NO_SPACE, or another code of the storage.
@@ -328,8 +331,9 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
                                       TEE_ObjectHandle attributes, const void *initialData,
                                       TEE_LengthType initialDataLen, TEE_ObjectHandle *object);
 
-/// Deletes an object that was opened with TEE_DATA_FLAG_ACCESS_WRITE_META. The handle is closed
-/// whatever the result.
+/// Deletes an object that was opened with TEE_DATA_FLAG_ACCESS_WRITE_META, durably. The handle is
+/// closed whatever the result, which is TEE_ERROR_STORAGE_NOT_AVAILABLE when the object is still
+/// there.
 TEE_Result TEE_CloseAndDeletePersistentObject1(TEE_ObjectHandle object);
 
 /// Reads up to `size` bytes from the position on; `*count` receives how many. At the end of the
@@ -337,7 +341,11 @@ TEE_Result TEE_CloseAndDeletePersistentObject1(TEE_ObjectHandle object);
 TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void *buffer, TEE_LengthType size,
                               TEE_LengthType *count);
 
-/// Writes all bytes at the position, over what is there and past its end, or none.
+/// Writes all bytes at the position, over what is there and past its end, or none. They are durable
+/// when the call returns.
+///
+/// Returns TEE_ERROR_STORAGE_NO_SPACE when the storage or the host's memory is full, or another
+/// code of the storage (TEE_ERROR_STORAGE_NOT_AVAILABLE, TEE_ERROR_CORRUPT_OBJECT).
 TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_LengthType size);
 
 // ---- Cryptographic operations (section 6)

@@ -29,7 +29,7 @@ enum class Fault {
 /// Tells of the latest fault: what was hit, for messages of a failing sweep.
 struct FaultReport {
   bool fired = false;  // a plan has been carried out since the last was made
-  std::string call;    // for example "TEE_WriteObjectData"
+  std::string call;    // "TEE_WriteObjectData"; of a power cut what it met: "save ID", "remove ID"
 };
 
 /// What an image's header would say of a trusted application.
@@ -75,6 +75,10 @@ class Device {
   /// After kPowerCut fired: gives back what storage really holds and lets writes happen again.
   void restore_power();
 
+  /// Makes a creation without data durable in its own call, as many TEEs do. Otherwise it waits for
+  /// the first write or the close of its handle.
+  void create_at_once(bool at_once);
+
   /// All objects of a trusted application: ID to raw data stream.
   std::map<std::string, std::string> objects(const TEE_UUID &uuid) const;
 
@@ -84,7 +88,7 @@ class Device {
   /// Removes an object, if there is one, past all faults.
   void remove_object(const TEE_UUID &uuid, const std::string &id);
 
-  /// Durable writes (object creations, closes after writing, deletions) so far, of all TAs.
+  /// Durable writes (creations, writes, deletions) so far, of all TAs.
   uint64_t durable_writes() const;
 
   struct Impl;

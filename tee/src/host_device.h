@@ -51,6 +51,7 @@ class HostDevice {
   FaultPlans faults;
   std::unique_ptr<Storage> storage;
   OpenObjects open_objects;
+  bool creates_at_once = false;  // a creation without data is stored like one with data
 
  private:
   Program program_of(const TEE_UUID &ta) const;

@@ -73,7 +73,6 @@ TEEC_Result tee_inspect_get(TEEC_Context *context, const TEEC_UUID *uuid, const 
 TEEC_Result tee_inspect_put(TEEC_Context *context, const TEEC_UUID *uuid, const void *id,
                             size_t id_len, const void *data, size_t data_len) {
   return inspect(context, [&](HostDevice &device) {
-    device.storage->expect_room(data_len);
     device.storage->save(key_of(uuid, id, id_len),
                          ByteView(static_cast<const uint8_t *>(data), data_len));
     return TEE_SUCCESS;

@@ -30,24 +30,13 @@ OpenData::OpenData(HostDevice &of_device, std::shared_ptr<OpenObject> opened, ui
 OpenData::~OpenData() {
   const std::lock_guard guard(device.lock);
   object->handles.erase(std::ranges::find(object->handles, flags));
-  if (unsaved) --object->num_unsaved;
   object.reset();
 }
 
-void OpenData::mark_unsaved() {
-  if (unsaved) return;
-  unsaved = true;
-  ++object->num_unsaved;
-}
-
-void OpenData::save() {
-  if (!unsaved) return;
-  if (object->num_unsaved == 1) {
-    device.storage->save(object->key, object->data);
-    object->stored = true;
-  }
-  --object->num_unsaved;
-  unsaved = false;
+void OpenData::store(Bytes data) {
+  device.storage->save(object->key, data);
+  object->data = std::move(data);
+  object->creation_waits = false;
 }
 
 namespace {
@@ -103,7 +92,6 @@ std::shared_ptr<OpenObject> find_or_load(HostDevice &device, const ObjectKey &ke
   if (!data) return nullptr;
   auto object = add_open(device, key);
   object->data = std::move(*data);
-  object->stored = true;
   return object;
 }
 
@@ -129,38 +117,55 @@ TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
   HostDevice &device = current_instance().device;
   const std::lock_guard guard(device.lock);
   if (find_open(device, key)) return TEE_ERROR_ACCESS_CONFLICT;
-  const bool stored = device.storage->load(key).has_value();
-  if (stored && (flags & TEE_DATA_FLAG_OVERWRITE) == 0) return TEE_ERROR_ACCESS_CONFLICT;
+  if ((flags & TEE_DATA_FLAG_OVERWRITE) == 0 && device.storage->load(key)) {
+    return TEE_ERROR_ACCESS_CONFLICT;
+  }
   if (data.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
-  device.storage->expect_room(data.size());
 
-  std::shared_ptr<OpenObject> object = add_open(device, key);
-  object->data.assign(data.begin(), data.end());
-  object->stored = stored;
-  auto opened =
-      std::make_unique<OpenData>(device, std::move(object), flags & (kAccessFlags | kShareFlags));
-  opened->mark_unsaved();
+  auto opened = std::make_unique<OpenData>(device, add_open(device, key),
+                                           flags & (kAccessFlags | kShareFlags));
+  opened->object->creation_waits = true;
+  if (!data.empty() || device.creates_at_once) opened->store({data.begin(), data.end()});
   *handle = hand_out(std::move(opened));
   return TEE_SUCCESS;
 }
 
 TEE_Result write_data(OpenData &data, ByteView bytes) {
   const std::lock_guard guard(data.device.lock);
+  if (bytes.empty() && !data.object->creation_waits) return TEE_SUCCESS;
   if (data.at + bytes.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
-  Bytes &stream = data.object->data;
-  const size_t new_len = std::max(stream.size(), data.at + bytes.size());
-  data.device.storage->expect_room(new_len);
-  stream.resize(new_len);
+  Bytes stream = data.object->data;
+  stream.resize(std::max(stream.size(), data.at + bytes.size()));
   std::ranges::copy(bytes, stream.begin() + data.at);
+  data.store(std::move(stream));
   data.at += static_cast<uint32_t>(bytes.size());
-  data.mark_unsaved();
   return TEE_SUCCESS;
+}
+
+void store_waiting_creation(OpenData &data) {
+  const std::lock_guard guard(data.device.lock);
+  if (data.object->creation_waits) data.store(data.object->data);
 }
 
 TEE_Result delete_object(OpenData &data) {
   const std::lock_guard guard(data.device.lock);
-  if (data.object->stored) data.device.storage->remove(data.object->key);
+  data.device.storage->remove(data.object->key);
+  data.object->creation_waits = false;
   return TEE_SUCCESS;
+}
+
+// `call` works on storage. What goes wrong there without a code of its own in the standard is the
+// storage's failing.
+template <class Call>
+TEE_Result storage_result_of(Call &&call) {
+  switch (const TEE_Result result = result_of(call)) {
+    case TEE_ERROR_BUSY:
+    case TEE_ERROR_ACCESS_DENIED:
+    case TEE_ERROR_GENERIC:
+      return TEE_ERROR_STORAGE_NOT_AVAILABLE;
+    default:
+      return result;
+  }
 }
 
 bool storage_fault_due(const char *call, TEE_Result *code) {
@@ -181,7 +186,7 @@ TEE_Result TEE_OpenPersistentObject(uint32_t storageID, const void *objectID,
   check_flags(flags, kAccessFlags | kShareFlags, __func__);
   if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
   if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
-  return result_of([&] { return open_object(key, flags, object); });
+  return storage_result_of([&] { return open_object(key, flags, object); });
 }
 
 // Objects with attributes are not kept here: no trusted application of ours stores keys that way.
@@ -198,19 +203,16 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
   if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
   if (attributes != TEE_HANDLE_NULL) return TEE_ERROR_NOT_SUPPORTED;
   const ByteView data(static_cast<const uint8_t *>(initialData), initialDataLen);
-  return result_of([&] { return create_object(key, flags, data, object); });
+  return storage_result_of([&] { return create_object(key, flags, data, object); });
 }
 
 void TEE_CloseObject(TEE_ObjectHandle object) {
   if (object == TEE_HANDLE_NULL) return;
-  OpenData *data = checked_object(object, __func__).persistent.get();
-  if (data != nullptr) {
-    const std::lock_guard guard(data->device.lock);
-    const TEE_Result result = result_of([&] {
-      data->save();
+  if (OpenData *data = checked_object(object, __func__).persistent.get()) {
+    result_of([&] {
+      store_waiting_creation(*data);
       return TEE_SUCCESS;
     });
-    if (result != TEE_SUCCESS) panic(__func__, last_error());
   }
   close_handle(object);
 }
@@ -219,9 +221,12 @@ void TEE_CloseObject(TEE_ObjectHandle object) {
 TEE_Result TEE_CloseAndDeletePersistentObject1(TEE_ObjectHandle object) {
   if (object == TEE_HANDLE_NULL) return TEE_SUCCESS;
   OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_WRITE_META, __func__);
-  TEE_Result result;
+  TEE_Result result = TEE_SUCCESS;
   if (!storage_fault_due(__func__, &result)) {
-    result = result_of([&] { return delete_object(data); });
+    // The standard has one code for whatever goes wrong.
+    if (result_of([&] { return delete_object(data); }) != TEE_SUCCESS) {
+      result = TEE_ERROR_STORAGE_NOT_AVAILABLE;
+    }
   }
   close_handle(object);
   return result;
@@ -249,9 +254,8 @@ TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_
   OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_WRITE, __func__);
   if (buffer == nullptr && size != 0) panic(__func__, "buffer is NULL");
   if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
-  if (size == 0) return TEE_SUCCESS;
   const ByteView bytes(static_cast<const uint8_t *>(buffer), size);
-  const TEE_Result result = result_of([&] { return write_data(data, bytes); });
+  const TEE_Result result = storage_result_of([&] { return write_data(data, bytes); });
   // The standard has no other code for a stream that cannot grow.
   return result == TEE_ERROR_OUT_OF_MEMORY ? TEE_ERROR_STORAGE_NO_SPACE : result;
 }

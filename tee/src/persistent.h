@@ -1,14 +1,15 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// Open data streams of persistent objects.
 ///
-/// An object is read whole when its first handle opens; its handles share that copy. What is
-/// written, a creation included, is in memory until the handle closes, and reaches storage in one
-/// change then: after a crash the object is as it was before or after. Handles that share an
-/// object for writing are saved together, when the last of them that wrote closes. A handle that
-/// its instance never closed saves nothing.
+/// An object is read whole when its first handle opens; its handles share that copy. Each write is
+/// stored before its call returns, or fails and leaves the object as it was, here and in storage.
 ///
-/// TEE_CloseObject() cannot report a failure, so a full disk is looked for when data is written;
-/// should saving fail all the same, the trusted application panics rather than go on believing.
+/// A creation without data waits for what its trusted application does next, so that creating and
+/// filling an object costs one durable change: the first write stores it, or else the first handle
+/// that closes. TEE_CloseObject() cannot report a failure; a creation that cannot be stored then is
+/// lost, as in a power cut before it, and who opens the object next is told what there is. Who
+/// must know writes, were it no bytes. A creation that is still waiting when its instance ends is
+/// dropped.
 #ifndef TEE_PERSISTENT_H
 #define TEE_PERSISTENT_H
 
@@ -35,8 +36,7 @@ struct OpenObject {
   OpenObjects &table;
   const ObjectKey key;
   Bytes data;
-  bool stored = false;            // storage has an object of this name
-  uint32_t num_unsaved = 0;       // handles that wrote
+  bool creation_waits = false;    // storage has no such object yet, or the one that it replaces
   std::vector<uint32_t> handles;  // TEE_DATA_FLAG_* of each
 };
 
@@ -50,14 +50,13 @@ struct OpenData {
   uint32_t data_size() const { return static_cast<uint32_t>(object->data.size()); }
   uint32_t position() const { return at; }
 
-  void mark_unsaved();
-  void save();
+  /// Makes `data` the object's, durably.
+  void store(Bytes data);
 
   HostDevice &device;
   std::shared_ptr<OpenObject> object;
   const uint32_t flags;
   uint32_t at = 0;
-  bool unsaved = false;
 };
 
 }  // namespace tee

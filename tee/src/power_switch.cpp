@@ -9,7 +9,7 @@ std::optional<Bytes> PowerSwitch::load(const ObjectKey &key) {
 }
 
 void PowerSwitch::save(const ObjectKey &key, ByteView data) {
-  if (!reaches_medium(key, "TEE_CloseObject")) {
+  if (!reaches_medium("save", key)) {
     lost_[key] = Bytes(data.begin(), data.end());
     return;
   }
@@ -19,7 +19,7 @@ void PowerSwitch::save(const ObjectKey &key, ByteView data) {
 
 bool PowerSwitch::remove(const ObjectKey &key) {
   if (!load(key)) return false;
-  if (!reaches_medium(key, "TEE_CloseAndDeletePersistentObject1")) {
+  if (!reaches_medium("remove", key)) {
     lost_[key] = std::nullopt;
     return true;
   }
@@ -49,9 +49,10 @@ void PowerSwitch::restore() {
   lost_.clear();
 }
 
-bool PowerSwitch::reaches_medium(const ObjectKey &key, const char *call) {
+bool PowerSwitch::reaches_medium(const char *change, const ObjectKey &key) {
+  const std::string what = std::string(change) + " " + key.id;
   TEE_Result ignored;
-  cut_ = cut_ || faults_.due(key.ta, test::Fault::kPowerCut, call, TEE_SUCCESS, &ignored);
+  cut_ = cut_ || faults_.due(key.ta, test::Fault::kPowerCut, what.c_str(), TEE_SUCCESS, &ignored);
   return !cut_;
 }
 

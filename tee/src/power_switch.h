@@ -19,14 +19,13 @@ class PowerSwitch : public Storage {
   void save(const ObjectKey &key, ByteView data) override;
   bool remove(const ObjectKey &key) override;
   std::vector<ObjectListing> list(const UuidBytes &ta) override;
-  void expect_room(size_t len) override { medium_->expect_room(len); }
 
   Storage &medium() { return *medium_; }
   uint64_t durable_writes() const { return durable_writes_; }
   void restore();
 
  private:
-  bool reaches_medium(const ObjectKey &key, const char *call);
+  bool reaches_medium(const char *change, const ObjectKey &key);
 
   std::unique_ptr<Storage> medium_;
   FaultPlans &faults_;

@@ -2,7 +2,6 @@
 #include "sqlite_storage.h"
 
 #include <sys/stat.h>
-#include <sys/statvfs.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -27,11 +26,13 @@ constexpr char kExpectedStamp[] = "1413825903.1";
 constexpr off_t kPageLen = 4096;
 constexpr char kSetPageLen[] = "PRAGMA page_size = 4096";
 
-// Beside the object itself: changed pages of the tree and frame headers.
-constexpr uint64_t kRoomForPages = 64 * 1024;
-
 ByteView bytes_of(const std::string &text) {
   return {reinterpret_cast<const uint8_t *>(text.data()), text.size()};
+}
+
+// SQLite knows of one kind alone.
+bool is_lack_of_space(int error) {
+  return error == ENOSPC || error == EDQUOT || error == EFBIG;
 }
 
 off_t file_size(const std::string &path) {
@@ -206,15 +207,6 @@ std::vector<ObjectListing> SqliteStorage::list(const UuidBytes &ta) {
   return listing;
 }
 
-// The log takes a copy of the object now, the database another one later.
-void SqliteStorage::expect_room(size_t len) {
-  struct statvfs status;
-  if (::statvfs(directory_.path().c_str(), &status) != 0) return;
-  if (uint64_t{status.f_bavail} * status.f_frsize < 2 * uint64_t{len} + kRoomForPages) {
-    throw Error{TEE_ERROR_STORAGE_NO_SPACE, "no space left for " + path_};
-  }
-}
-
 // ---- SQLite
 
 SqliteStorage::Statement SqliteStorage::prepare(const char *sql) const {
@@ -248,6 +240,11 @@ void SqliteStorage::fail(int result) const {
       damaged(text);
     case SQLITE_NOMEM:
       throw std::bad_alloc();
+    case SQLITE_IOERR:
+      if (!is_lack_of_space(sqlite3_system_errno(db_.get()))) {
+        throw Error{TEE_ERROR_STORAGE_NOT_AVAILABLE, path_ + ": " + text};
+      }
+      [[fallthrough]];
     case SQLITE_FULL:
       throw Error{TEE_ERROR_STORAGE_NO_SPACE, path_ + ": " + text};
     case SQLITE_BUSY:

@@ -27,10 +27,6 @@ class SqliteStorage : public Storage {
   bool remove(const ObjectKey &key) override;
   std::vector<ObjectListing> list(const UuidBytes &ta) override;
 
-  /// Asks the file system: a full disk is to show when an object is written, for closing it cannot
-  /// report anything.
-  void expect_room(size_t len) override;
-
  private:
   using Connection = std::unique_ptr<sqlite3, FreedBy<sqlite3_close>>;
   using Statement = std::unique_ptr<sqlite3_stmt, FreedBy<sqlite3_finalize>>;

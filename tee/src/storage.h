@@ -47,9 +47,6 @@ class Storage {
 
   /// In the byte order of the IDs.
   virtual std::vector<ObjectListing> list(const UuidBytes &ta) = 0;
-
-  /// Throws TEE_ERROR_STORAGE_NO_SPACE when an object of `len` bytes could not be saved now.
-  virtual void expect_room(size_t len) = 0;
 };
 
 class MemoryStorage : public Storage {
@@ -58,7 +55,6 @@ class MemoryStorage : public Storage {
   void save(const ObjectKey &key, ByteView data) override;
   bool remove(const ObjectKey &key) override;
   std::vector<ObjectListing> list(const UuidBytes &ta) override;
-  void expect_room(size_t) override {}
 
  private:
   std::map<ObjectKey, Bytes> objects_;

@@ -90,6 +90,11 @@ void Device::restore_power() {
   impl_->power->restore();
 }
 
+void Device::create_at_once(bool at_once) {
+  const std::lock_guard guard(impl_->device->lock);
+  impl_->device->creates_at_once = at_once;
+}
+
 std::map<std::string, std::string> Device::objects(const TEE_UUID &uuid) const {
   const std::lock_guard guard(impl_->device->lock);
   const UuidBytes ta = uuid_bytes(uuid);

@@ -11,6 +11,14 @@
 
 using namespace tee::test;
 
+// SQLite's calls end here.
+static bool g_disk_is_broken = false;
+extern "C" int fdatasync(int file) {
+  if (!g_disk_is_broken) return ::fsync(file);
+  errno = EIO;
+  return -1;
+}
+
 namespace fs = std::filesystem;
 
 namespace {
@@ -176,18 +184,60 @@ TEST_F(StateDirectory, WhatCannotBeUsedIsRefused) {
   EXPECT_EQ(Client(state).result, TEEC_SUCCESS);
 }
 
-// The handle's writes went well, and the disk is full when they are to be stored.
-TEST_F(StateDirectory, AnObjectThatCannotBeStoredAfterAllPanics) {
-  const auto save_in_vain = [&] {
-    Device device(state);
-    const InsideTa ta(device);
-    const rlimit limit{64 * 1024, 64 * 1024};
+// ---- Storage that fails
+
+// Files that cannot grow, as on a full disk, while it lives.
+struct FullDisk {
+  FullDisk() {
     ::signal(SIGXFSZ, SIG_IGN);
-    ::setrlimit(RLIMIT_FSIZE, &limit);
-    write_object("id", std::string(200000, 'x'));
-  };
-  EXPECT_DEATH(save_in_vain(), "TEE panic: TA .*: TEE_CloseObject: .*objects.db");
-  EXPECT_TRUE(Device(state).objects({}).empty());
+    ::getrlimit(RLIMIT_FSIZE, &before);
+    const rlimit full{1, before.rlim_max};
+    ::setrlimit(RLIMIT_FSIZE, &full);
+  }
+  ~FullDisk() { ::setrlimit(RLIMIT_FSIZE, &before); }
+  rlimit before;
+};
+
+// Syncs that report what the disk did not take, while it lives.
+struct BrokenDisk {
+  BrokenDisk() { g_disk_is_broken = true; }
+  ~BrokenDisk() { g_disk_is_broken = false; }
+};
+
+template <class Trouble>
+class FailingStorage : public StateDirectory {};
+using Troubles = testing::Types<FullDisk, BrokenDisk>;
+TYPED_TEST_SUITE(FailingStorage, Troubles);
+
+TYPED_TEST(FailingStorage, IsTheCallsResultAndTheObjectIsAsBefore) {
+  const bool is_full = std::is_same_v<TypeParam, FullDisk>;
+  const TEE_Result code = is_full ? TEE_ERROR_STORAGE_NO_SPACE : TEE_ERROR_STORAGE_NOT_AVAILABLE;
+  const std::map<std::string, std::string> before = {{"a", "before"}, {"b", "B"}};
+  auto device = std::make_unique<Device>(this->state);
+  for (const auto &[id, data] : before) device->put_object({}, id, data);
+  const uint32_t access = TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE;
+  {
+    const InsideTa ta(*device);
+    TEE_ObjectHandle object, doomed, fresh;
+    ASSERT_EQ(open_object("a", access, &object), TEE_SUCCESS);
+    ASSERT_EQ(open_object("b", TEE_DATA_FLAG_ACCESS_WRITE_META, &doomed), TEE_SUCCESS);
+    {
+      const TypeParam trouble;
+      EXPECT_EQ(TEE_WriteObjectData(object, "after, and longer", 17), code);
+      EXPECT_EQ(create_object("new", "data", access, &fresh), code);
+      EXPECT_EQ(fresh, TEE_HANDLE_NULL);
+      EXPECT_EQ(create_object("new", "", access, &fresh), TEE_SUCCESS);
+      TEE_CloseObject(fresh);
+      EXPECT_EQ(TEE_CloseAndDeletePersistentObject1(doomed), TEE_ERROR_STORAGE_NOT_AVAILABLE);
+      EXPECT_EQ(open_object("new", access, &fresh), TEE_ERROR_ITEM_NOT_FOUND);
+    }
+    EXPECT_EQ(device->objects({}), before);
+    EXPECT_EQ(read_on(object, 9), "before");
+    EXPECT_EQ(TEE_WriteObjectData(object, "!", 1), TEE_SUCCESS);
+    TEE_CloseObject(object);
+  }
+  device.reset();
+  EXPECT_EQ(this->stored("a"), "before!");
 }
 
 }  // namespace

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // Persistent objects, on both kinds of storage.
+#include <cstring>
 #include <memory>
+#include <optional>
 
 #include "tee_support.h"
 
@@ -77,16 +79,46 @@ TEST_P(Persistent, WritingOverAnObjectKeepsWhatLiesBehind) {
   EXPECT_EQ(stored()["id"], "01AB456789CD");
 }
 
-TEST_P(Persistent, NothingIsStoredBeforeTheHandleCloses) {
-  write_object("old", "before");
-  TEE_ObjectHandle fresh;
-  ASSERT_EQ(open_object("old", kWrite, &object), TEE_SUCCESS);
-  ASSERT_EQ(create_object("new", "initial", kWrite, &fresh), TEE_SUCCESS);
-  EXPECT_EQ(TEE_WriteObjectData(object, "after!", 6), TEE_SUCCESS);
-  EXPECT_EQ(stored(), (ObjectMap{{"old", "before"}}));
-  reopen();  // the instance dies with both handles open
-  EXPECT_EQ(stored(), (ObjectMap{{"old", "before"}}));
-  EXPECT_EQ(write_object("new", "created at last", 0), TEE_SUCCESS);
+// The instance dies with the handles open.
+TEST_P(Persistent, WhatWasWrittenIsStoredAndOnlyAnEmptyCreationWaits) {
+  const uint32_t create = kWrite | TEE_DATA_FLAG_OVERWRITE;
+  const struct {
+    const char *name;
+    const char *initial;
+    const char *written;  // NULL: nothing is
+    bool closed;
+    std::optional<std::string> stored, stored_at_once;
+  } kCases[] = {
+      {"WithData", "initial", nullptr, false, "initial", "initial"},
+      {"Written", "", "abc", false, "abc", "abc"},
+      {"WrittenOver", "initial", "abc", false, "abctial", "abctial"},
+      {"NoBytesWritten", "", "", false, "", ""},
+      {"Closed", "", nullptr, true, "", ""},
+      {"Left", "", nullptr, false, std::nullopt, ""},
+  };
+  for (const std::string before : {"", "there before"}) {
+    for (const bool at_once : {false, true}) {
+      for (const auto &c : kCases) {
+        SCOPED_TRACE(std::string(c.name) + (at_once ? ", at once, " : ", ") + before);
+        device->create_at_once(at_once);
+        device->remove_object({}, "id");
+        if (!before.empty()) device->put_object({}, "id", before);
+        const uint64_t writes = device->durable_writes();
+        ASSERT_EQ(create_object("id", c.initial, create, &object), TEE_SUCCESS);
+        if (c.written != nullptr) {
+          const auto len = static_cast<uint32_t>(std::strlen(c.written));
+          EXPECT_EQ(TEE_WriteObjectData(object, c.written, len), TEE_SUCCESS);
+        }
+        if (c.closed) TEE_CloseObject(object);
+        const bool one = !at_once && c.name != std::string("WrittenOver");
+        if (one) EXPECT_LE(device->durable_writes(), writes + 1);
+        reopen();
+        std::optional<std::string> expected = at_once ? c.stored_at_once : c.stored;
+        if (!expected && !before.empty()) expected = before;
+        EXPECT_EQ(stored(), expected ? ObjectMap{{"id", *expected}} : ObjectMap{});
+      }
+    }
+  }
 }
 
 TEST_P(Persistent, CreationHeedsWhatIsThere) {

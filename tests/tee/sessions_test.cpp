@@ -66,7 +66,7 @@ TEST_F(Sessions, WhatATrustedApplicationLeavesOpenEndsWithIt) {
     TEE_ObjectHandle object;
     EXPECT_NE(TEE_Malloc(100, TEE_MALLOC_FILL_ZERO), nullptr);
     EXPECT_EQ(open_ta(kTaB, &session), TEE_SUCCESS);
-    return create_object("left", "data", TEE_DATA_FLAG_ACCESS_WRITE, &object);
+    return create_object("left", "", TEE_DATA_FLAG_ACCESS_WRITE, &object);
   };
   ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
   EXPECT_EQ(client.invoke(0), TEEC_SUCCESS);
