@@ -31,6 +31,15 @@ Records records_of(const AgentDevice &device, const Records &before = {}) {
   return records;
 }
 
+/// Objects that a cut has left without a payload.
+std::set<std::string> hollow_objects(const AgentDevice &device) {
+  std::set<std::string> ids;
+  for (const auto &[id, raw] : device.objects()) {
+    if (device.record(id).value_or("").empty()) ids.insert(id);
+  }
+  return ids;
+}
+
 /// The state without its order, and without the keys.
 std::set<std::string> state_of(const Scene &scene) {
   std::set<std::string> state;
@@ -121,6 +130,7 @@ class Sweep {
     const tee::test::TraceSink log;
     Scene scene(origin_, snapshot_);
     tee::test::Device &host = scene.device.host();
+    host.create_at_once(kind_.create_at_once);
     if (scenario_.ask != Ask::kCreation) scene.device.open();
     host.fail(kAgentUuid, kind_.fault, n, kind_.and_after);
     perform(scene);
@@ -130,7 +140,10 @@ class Sweep {
     if (kind_.fault == Fault::kPowerCut) host.restore_power();
     check_what_is_left(scene);
     // How life goes on depends on what is stored alone.
-    if (survived_.insert(records_of(scene.device, before_)).second) check_life_goes_on(scene);
+    const auto left = std::pair(records_of(scene.device, before_), hollow_objects(scene.device));
+    if (survived_.insert(left).second) check_life_goes_on(scene);
+    const bool was_cut = kind_.fault == Fault::kPowerCut && report.fired;
+    if (was_cut && lived_on_.insert(report.call).second) live_on(scene);
     return report.fired;
   }
 
@@ -165,6 +178,31 @@ class Sweep {
     EXPECT_EQ(state_of(scene), final_);
   }
 
+  /// The TSM manages the device as ever, and ends with one that holds nothing.
+  static void live_on(Scene &scene) {
+    ASSERT_TRUE(scene.device.open());
+    ASSERT_TRUE(scene.get_device_state().passed());
+    const std::string sp = scene.aik_list().empty() ? "sp8" : scene.aik_list()[0].at("spid");
+    EXPECT_TRUE(scene.create_sd(sp, "sd8").passed());
+    EXPECT_TRUE(scene.create_sd("sp9", "sd9").passed());
+    for (const char *ta : {"ta8", "ta9"}) {
+      EXPECT_TRUE(scene.install_ta("sp9", "sd9", taid(ta)).passed());
+    }
+    EXPECT_TRUE(scene.update_ta("sp9", "sd9", taid("ta8")).passed());
+    EXPECT_TRUE(scene.update_sd("sp9", "sd9").passed());
+    EXPECT_TRUE(scene.get_ta_info("sp9", taid("ta8")).passed());
+    EXPECT_TRUE(scene.delete_ta("sd9", taid("ta9")).passed());
+    EXPECT_TRUE(scene.device.restart());
+    EXPECT_TRUE(scene.get_device_state().passed());
+    for (const std::string &name : scene.sd_names()) {
+      EXPECT_TRUE(scene.delete_sd(name, "true").passed()) << name;
+    }
+    EXPECT_TRUE(scene.get_device_state().passed());
+    EXPECT_TRUE(scene.sd_list().empty());
+    EXPECT_TRUE(scene.aik_list().empty());
+    scene.device.expect_clean();
+  }
+
   const Scenario &scenario_;
   const FaultKind &kind_;
   Scene origin_;
@@ -174,7 +212,8 @@ class Sweep {
   Snapshot snapshot_;
   Records before_;
   std::set<Records> orderly_;
-  std::set<Records> survived_;
+  std::set<std::pair<Records, std::set<std::string>>> survived_;
+  std::set<std::string> lived_on_;  // what each cut met
   std::set<std::string> final_;
 };
 

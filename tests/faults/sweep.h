@@ -33,6 +33,7 @@ struct FaultKind {
   const char *name;
   tee::test::Fault fault;
   bool and_after = false;
+  bool create_at_once = false;  // on storage that makes each creation durable in its own call
 };
 
 /// Runs the whole sweep. Returns the number of points tried, and fails the test that calls it.

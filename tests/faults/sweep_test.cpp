@@ -17,7 +17,7 @@ const FaultKind kKinds[] = {
     {"Allocation", Fault::kAllocation}, {"AllocationsFrom", Fault::kAllocation, true},
     {"Storage", Fault::kStorage},       {"Crypto", Fault::kCrypto},
     {"TaCall", Fault::kTaCall},         {"ShortRead", Fault::kShortRead},
-    {"PowerCut", Fault::kPowerCut},
+    {"PowerCut", Fault::kPowerCut},     {"PowerCutCreating", Fault::kPowerCut, false, true},
 };
 
 void nothing(Scene &) {}
@@ -39,12 +39,21 @@ void stale_hash(Options &options) {
   options.dsihash = std::string(64, '0');
 }
 
+void one_sd(Scene &scene) {
+  known_tsm(scene);
+  ASSERT_TRUE(scene.create_sd("sp1", "sd1").passed());
+}
+
 void known_sp(Options &options) {
   options.spid = "sp1";
 }
 
 void last_sd(Options &options) {
   options = {.sdname = "sd3", .deleteta = "false"};
+}
+
+void first_ta(Options &options) {
+  options.sdname = "sd1";
 }
 
 void known_ta(Options &options) {
@@ -67,6 +76,7 @@ const Scenario kScenarios[] = {
     {"DeleteSd", furnished, kDeleteSd, nullptr, {kResponseFailed}, kTas},  // it is not listed then
     {"DeleteLastSd", furnished, kDeleteSd, last_sd, {kResponseFailed}},
     {"InstallTa", furnished, kInstallTa, nullptr, {kTaExists}},
+    {"InstallFirstTa", one_sd, kInstallTa, first_ta, {kTaExists}},
     {"InstallTaRefused", furnished, kInstallTa, known_ta, {kTaExists}},
     {"UpdateTa", furnished, kUpdateTa},
     {"DeleteTa", furnished, kDeleteTa, nullptr, {TEEC_ERROR_ITEM_NOT_FOUND}},
