@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstring>
 
 #include "error.h"
 
@@ -30,9 +31,20 @@ ByteView bytes_of(const std::string &text) {
   return {reinterpret_cast<const uint8_t *>(text.data()), text.size()};
 }
 
-// SQLite knows of one kind alone.
+// SQLite knows of one kind alone, and does not keep the error of its log.
 bool is_lack_of_space(int error) {
   return error == ENOSPC || error == EDQUOT || error == EFBIG;
+}
+
+bool exists(const std::string &path) {
+  return ::access(path.c_str(), F_OK) == 0;
+}
+
+void expect_owners_alone(const host::File &file, const std::string &path) {
+  struct stat status;
+  if (::fstat(file.get(), &status) != 0) throw system_error("cannot use " + path);
+  if ((status.st_mode & (S_IWGRP | S_IWOTH)) == 0) return;
+  throw Error{TEE_ERROR_ACCESS_DENIED, "database " + path + " can be written by others"};
 }
 
 off_t file_size(const std::string &path) {
@@ -84,19 +96,51 @@ class SqliteStorage::Run {
   int bound_ = 0;
 };
 
+// Undone at its end, unless it was committed.
+class SqliteStorage::Transaction {
+ public:
+  explicit Transaction(const SqliteStorage &storage) : storage_(storage) {
+    Run(storage, storage.run_->begin).step();
+  }
+  ~Transaction() {
+    // Some failures have undone it already.
+    if (sqlite3_get_autocommit(storage_.db_.get())) return;
+    sqlite3_step(storage_.run_->rollback.get());
+    sqlite3_reset(storage_.run_->rollback.get());
+  }
+  Transaction(const Transaction &) = delete;
+  Transaction &operator=(const Transaction &) = delete;
+
+ private:
+  const SqliteStorage &storage_;
+};
+
 // ---- Opening
 
 SqliteStorage::SqliteStorage(StateDirectory directory)
     : directory_(std::move(directory)),
       path_(directory_.path() / "objects.db"),
+      log_(path_ + "-wal"),
+      acknowledged_(path_ + "-count"),
       hash_(EVP_MD_CTX_new()) {
   if (!hash_) throw std::bad_alloc();
   open_database();
   check_or_create();
-  load_ = prepare("SELECT data FROM objects WHERE ta = ? AND id = ?");
-  save_ = prepare("INSERT OR REPLACE INTO objects (ta, id, digest, data) VALUES (?, ?, ?, ?)");
-  remove_ = prepare("DELETE FROM objects WHERE ta = ? AND id = ?");
-  list_ = prepare("SELECT id, length(data) FROM objects WHERE ta = ? ORDER BY id");
+  run_ = Statements{
+      .load = prepare("SELECT data FROM objects WHERE ta = ? AND id = ?"),
+      .save = prepare("INSERT OR REPLACE INTO objects (ta, id, digest, data) VALUES (?, ?, ?, ?)"),
+      .remove = prepare("DELETE FROM objects WHERE ta = ? AND id = ?"),
+      .list = prepare("SELECT id, length(data) FROM objects WHERE ta = ? ORDER BY id"),
+      .begin = prepare("BEGIN IMMEDIATE"),
+      .commit = prepare("COMMIT"),
+      .rollback = prepare("ROLLBACK"),
+  };
+}
+
+SqliteStorage::~SqliteStorage() {
+  run_.reset();
+  db_.reset();
+  if (!exists(log_)) acknowledged_.remove();
 }
 
 // SQLite gives its logs the mode of the database, so only the database is created here. Two kinds
@@ -104,7 +148,7 @@ SqliteStorage::SqliteStorage(StateDirectory directory)
 // which it would throw away, and a file that ends inside a page.
 void SqliteStorage::open_database() {
   const off_t len = file_size(path_);
-  const off_t log_len = file_size(path_ + "-wal");
+  const off_t log_len = file_size(log_);
   if (len == 0 && log_len != 0) damaged("it is empty, its log is not");
   if (len % kPageLen != 0 && log_len == 0 && file_size(path_ + "-journal") == 0) {
     damaged("it is cut off");
@@ -112,6 +156,7 @@ void SqliteStorage::open_database() {
   const host::File file = host::open_or_create(path_.c_str());
   if (!file.valid() && errno == EISDIR) damaged("it is a directory");
   if (!file.valid()) throw system_error("cannot open " + path_);
+  expect_owners_alone(file, path_);
 
   sqlite3 *db = nullptr;
   const int result =
@@ -122,7 +167,6 @@ void SqliteStorage::open_database() {
 
 // Until the database has passed, nothing may write to it; closing would, with a log at hand.
 void SqliteStorage::check_or_create() {
-  const std::string log = path_ + "-wal";
   try {
     sqlite3_db_config(db_.get(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
     execute(
@@ -133,11 +177,12 @@ void SqliteStorage::check_or_create() {
     } else {
       check();
     }
+    check_count();
     execute("PRAGMA journal_mode = WAL");
     sqlite3_db_config(db_.get(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 0, nullptr);
   } catch (...) {
     db_.reset();
-    if (file_size(log) == 0) ::unlink(log.c_str());  // reading had created it
+    if (file_size(log_) == 0) ::unlink(log_.c_str());  // reading had created it
     throw;
   }
 }
@@ -173,6 +218,19 @@ void SqliteStorage::check_digests() {
   }
 }
 
+void SqliteStorage::check_count() {
+  const Statement count = prepare("SELECT data FROM objects WHERE ta = x'' AND id = x''");
+  Run run(*this, count);
+  if (run.step()) {
+    const ByteView bytes = run.blob(0);
+    std::memcpy(&num_changes_, bytes.data(), std::min(bytes.size(), sizeof(num_changes_)));
+  }
+  if (const uint64_t acknowledged = acknowledged_.read(); acknowledged > num_changes_) {
+    damaged("its log has lost " + std::to_string(acknowledged - num_changes_) +
+            " changes that were acknowledged");
+  }
+}
+
 void SqliteStorage::damaged(const std::string &how) const {
   throw Error{TEE_ERROR_CORRUPT_OBJECT, "database " + path_ + " is damaged: " + how};
 }
@@ -180,25 +238,46 @@ void SqliteStorage::damaged(const std::string &how) const {
 // ---- Objects
 
 std::optional<Bytes> SqliteStorage::load(const ObjectKey &key) {
-  Run run(*this, load_);
+  Run run(*this, run_->load);
   if (!run.bind(key.ta).bind(bytes_of(key.id)).step()) return std::nullopt;
   const ByteView data = run.blob(0);
   return Bytes(data.begin(), data.end());
 }
 
 void SqliteStorage::save(const ObjectKey &key, ByteView data) {
-  const Digest sum = digest(key.ta, bytes_of(key.id), data);
-  Run(*this, save_).bind(key.ta).bind(bytes_of(key.id)).bind(sum).bind(data).step();
+  change([&] {
+    save_row(key.ta, bytes_of(key.id), data);
+    return true;
+  });
 }
 
 bool SqliteStorage::remove(const ObjectKey &key) {
-  Run(*this, remove_).bind(key.ta).bind(bytes_of(key.id)).step();
-  return sqlite3_changes(db_.get()) != 0;
+  return change([&] {
+    Run(*this, run_->remove).bind(key.ta).bind(bytes_of(key.id)).step();
+    return sqlite3_changes(db_.get()) != 0;
+  });
+}
+
+void SqliteStorage::save_row(ByteView ta, ByteView id, ByteView data) {
+  const Digest sum = digest(ta, id, data);
+  Run(*this, run_->save).bind(ta).bind(id).bind(sum).bind(data).step();
+}
+
+template <class Make>
+bool SqliteStorage::change(Make &&make) {
+  const Transaction transaction(*this);
+  if (!make()) return false;
+  const uint64_t count = num_changes_ + 1;
+  const auto *bytes = reinterpret_cast<const uint8_t *>(&count);
+  save_row({}, {}, {bytes, sizeof(count)});
+  Run(*this, run_->commit).step();
+  acknowledged_.write(num_changes_ = count);
+  return true;
 }
 
 std::vector<ObjectListing> SqliteStorage::list(const UuidBytes &ta) {
   std::vector<ObjectListing> listing;
-  Run run(*this, list_);
+  Run run(*this, run_->list);
   run.bind(ta);
   while (run.step()) {
     const ByteView id = run.blob(0);
@@ -231,6 +310,7 @@ std::string SqliteStorage::text_of(const char *sql) const {
 }
 
 void SqliteStorage::fail(int result) const {
+  const int error = errno;
   const std::string text = sqlite3_errmsg(db_.get());
   switch (result & 0xFF) {
     case SQLITE_CORRUPT:
@@ -241,7 +321,7 @@ void SqliteStorage::fail(int result) const {
     case SQLITE_NOMEM:
       throw std::bad_alloc();
     case SQLITE_IOERR:
-      if (!is_lack_of_space(sqlite3_system_errno(db_.get()))) {
+      if (!is_lack_of_space(error)) {
         throw Error{TEE_ERROR_STORAGE_NOT_AVAILABLE, path_ + ": " + text};
       }
       [[fallthrough]];

@@ -52,7 +52,7 @@ TEST_F(StateDirectory, IsItsOwnersAloneAndOneFileWhenClosed) {
     }
   }
   ::umask(mask);
-  EXPECT_FALSE(fs::exists(log));
+  EXPECT_EQ(std::distance(fs::directory_iterator(state), {}), 2);  // the lock is the other
   fs::rename(state, folder.path / "moved");
   EXPECT_EQ(Device(folder.path / "moved").objects({})["id"], "data");
 }
@@ -172,6 +172,66 @@ TEST_F(StateDirectory, ALogLeftBehindIsRecoveredAndKeptBesideADamagedDatabase) {
   EXPECT_EQ(stored("id1"), "in the log");
 }
 
+// Each change is stored with a copy of what lies beside the database after it.
+class LogLeftBehind : public StateDirectory {
+ protected:
+  LogLeftBehind() {
+    fill();
+    exit_code_of(spawn([&] {
+      auto *device = new Device(state);
+      for (int i = 0; i < kNumChanges; ++i) {
+        device->put_object({}, "n", std::to_string(i));
+        for (const fs::path &file : {log, count}) fs::copy_file(file, copy_of(file, i));
+      }
+      return 0;
+    }));
+    sound = tools::read_file(database);
+  }
+  fs::path copy_of(const fs::path &file, int i) const {
+    return folder.path / (std::to_string(i) + file.extension().string());
+  }
+  std::string kept(const fs::path &file, int i) const { return tools::read_file(copy_of(file, i)); }
+
+  static constexpr int kNumChanges = 5;
+  const fs::path count = state / "objects.db-count";
+  std::string sound;
+};
+
+TEST_F(LogLeftBehind, NoByteOfItChangesUnnoticed) {
+  const std::string whole = tools::read_file(log);
+  for (size_t at = 0; at < whole.size(); at += at < 100 ? 1 : 211) {
+    SCOPED_TRACE(at);
+    std::string changed = whole;
+    changed[at] ^= 4;
+    tools::write_file(log, changed);
+    EXPECT_EQ(Client(state).result, TEEC_ERROR_CORRUPT_OBJECT);
+    EXPECT_TRUE(tools::read_file(log) == changed);
+  }
+  fs::remove(log);
+  EXPECT_EQ(Client(state).result, TEEC_ERROR_CORRUPT_OBJECT);
+  EXPECT_EQ(Client(state).result, TEEC_ERROR_CORRUPT_OBJECT);  // and again
+  EXPECT_TRUE(tools::read_file(database) == sound);
+}
+
+// The last change is torn, and the count may be one of long before.
+TEST_F(LogLeftBehind, APowerCutRaisesNoAlarm) {
+  for (int i = 0; i < kNumChanges; ++i) {
+    const std::string next = kept(log, std::min(i + 1, kNumChanges - 1));
+    const size_t len = kept(log, i).size();
+    for (const size_t tail : {size_t{0}, size_t{1}, (next.size() - len) / 2, next.size() - len}) {
+      for (const std::string &said : {kept(count, i), kept(count, 0), std::string(16, '\0')}) {
+        SCOPED_TRACE(std::to_string(i) + ", " + std::to_string(tail));
+        std::string torn = next.substr(0, len + tail);
+        if (tail != 0) torn[len + tail / 2] ^= 1;
+        tools::write_file(database, sound);
+        tools::write_file(log, torn);
+        tools::write_file(count, said);
+        EXPECT_EQ(stored("n"), std::to_string(i));
+      }
+    }
+  }
+}
+
 TEST_F(StateDirectory, WhatCannotBeUsedIsRefused) {
   tools::write_file(folder.path / "file", "");
   EXPECT_EQ(Client(folder.path / "file").result, TEEC_ERROR_BAD_PARAMETERS);
@@ -182,6 +242,12 @@ TEST_F(StateDirectory, WhatCannotBeUsedIsRefused) {
   fs::remove(database);
   tools::write_file(database, "");  // holds nothing: new
   EXPECT_EQ(Client(state).result, TEEC_SUCCESS);
+  for (const fs::perms others : {fs::perms::group_write, fs::perms::others_write}) {
+    fs::permissions(database, fs::perms::owner_read | fs::perms::owner_write | others);
+    EXPECT_EQ(Client(state).result, TEEC_ERROR_ACCESS_DENIED);
+    EXPECT_EQ(tee_inspect_last_error(),
+              "database " + database.string() + " can be written by others");
+  }
 }
 
 // ---- Storage that fails
@@ -225,7 +291,7 @@ TYPED_TEST(FailingStorage, IsTheCallsResultAndTheObjectIsAsBefore) {
       const TypeParam trouble;
       EXPECT_EQ(TEE_WriteObjectData(object, "after, and longer", 17), code);
       EXPECT_EQ(create_object("new", "data", access, &fresh), code);
-      EXPECT_EQ(fresh, TEE_HANDLE_NULL);
+      EXPECT_EQ(fresh, nullptr);
       EXPECT_EQ(create_object("new", "", access, &fresh), TEE_SUCCESS);
       TEE_CloseObject(fresh);
       EXPECT_EQ(TEE_CloseAndDeletePersistentObject1(doomed), TEE_ERROR_STORAGE_NOT_AVAILABLE);

@@ -79,44 +79,44 @@ TEST_P(Persistent, WritingOverAnObjectKeepsWhatLiesBehind) {
   EXPECT_EQ(stored()["id"], "01AB456789CD");
 }
 
-// The instance dies with the handles open.
+// Of an object that is there or not. The instance dies with the handle open, unless it was closed.
 TEST_P(Persistent, WhatWasWrittenIsStoredAndOnlyAnEmptyCreationWaits) {
-  const uint32_t create = kWrite | TEE_DATA_FLAG_OVERWRITE;
+  const std::string kBefore = "there before";
   const struct {
     const char *name;
-    const char *initial;
-    const char *written;  // NULL: nothing is
+    std::string initial;
+    std::optional<std::string> written;
     bool closed;
-    std::optional<std::string> stored, stored_at_once;
+    std::string stored;
+    uint64_t num_writes, num_at_once;
   } kCases[] = {
-      {"WithData", "initial", nullptr, false, "initial", "initial"},
-      {"Written", "", "abc", false, "abc", "abc"},
-      {"WrittenOver", "initial", "abc", false, "abctial", "abctial"},
-      {"NoBytesWritten", "", "", false, "", ""},
-      {"Closed", "", nullptr, true, "", ""},
-      {"Left", "", nullptr, false, std::nullopt, ""},
+      {"WithData", "initial", std::nullopt, false, "initial", 1, 1},
+      {"Written", "", "abc", false, "abc", 1, 2},
+      {"WrittenOver", "initial", "abc", false, "abctial", 2, 2},
+      {"NoBytesWritten", "", "", false, "", 1, 1},
+      {"Closed", "", std::nullopt, true, "", 1, 1},
+      {"Left", "", std::nullopt, false, "", 0, 1},
   };
-  for (const std::string before : {"", "there before"}) {
-    for (const bool at_once : {false, true}) {
-      for (const auto &c : kCases) {
-        SCOPED_TRACE(std::string(c.name) + (at_once ? ", at once, " : ", ") + before);
-        device->create_at_once(at_once);
-        device->remove_object({}, "id");
-        if (!before.empty()) device->put_object({}, "id", before);
-        const uint64_t writes = device->durable_writes();
-        ASSERT_EQ(create_object("id", c.initial, create, &object), TEE_SUCCESS);
-        if (c.written != nullptr) {
-          const auto len = static_cast<uint32_t>(std::strlen(c.written));
-          EXPECT_EQ(TEE_WriteObjectData(object, c.written, len), TEE_SUCCESS);
-        }
-        if (c.closed) TEE_CloseObject(object);
-        const bool one = !at_once && c.name != std::string("WrittenOver");
-        if (one) EXPECT_LE(device->durable_writes(), writes + 1);
-        reopen();
-        std::optional<std::string> expected = at_once ? c.stored_at_once : c.stored;
-        if (!expected && !before.empty()) expected = before;
-        EXPECT_EQ(stored(), expected ? ObjectMap{{"id", *expected}} : ObjectMap{});
+  for (const auto &[exists, at_once] : {std::pair(0, 0), {0, 1}, {1, 0}, {1, 1}}) {
+    for (const auto &c : kCases) {
+      SCOPED_TRACE(std::string(c.name) + (exists ? ", exists" : "") + (at_once ? ", at once" : ""));
+      device->create_at_once(at_once);
+      device->remove_object({}, "id");
+      if (exists) device->put_object({}, "id", kBefore);
+      const uint64_t before = device->durable_writes();
+      ASSERT_EQ(create_object("id", c.initial, kWrite | TEE_DATA_FLAG_OVERWRITE, &object),
+                TEE_SUCCESS);
+      if (c.written) {
+        const auto len = static_cast<uint32_t>(c.written->size());
+        EXPECT_EQ(TEE_WriteObjectData(object, c.written->data(), len), TEE_SUCCESS);
       }
+      if (c.closed) TEE_CloseObject(object);
+      const uint64_t num_writes = at_once ? c.num_at_once : c.num_writes;
+      EXPECT_EQ(device->durable_writes() - before, num_writes);
+      reopen();
+      ObjectMap expected = {{"id", num_writes != 0 ? c.stored : kBefore}};
+      if (num_writes == 0 && !exists) expected.clear();
+      EXPECT_EQ(stored(), expected);
     }
   }
 }
