@@ -232,6 +232,21 @@ TEST_F(LogLeftBehind, APowerCutRaisesNoAlarm) {
   }
 }
 
+TEST_F(StateDirectory, NoFileInItBecomesAStandardStream) {
+  const auto streams = [&] {
+    for (int stream = 0; stream < 3; ++stream) ::close(stream);
+    const Device device(state);
+    int num_files = 0;
+    for (const char *stream : {"0", "1", "2"}) {
+      std::error_code error;
+      const fs::path file = fs::read_symlink(fs::path("/proc/self/fd") / stream, error);
+      num_files += file.parent_path() == state;
+    }
+    return num_files;
+  };
+  EXPECT_EQ(exit_code_of(spawn(streams)), 0);
+}
+
 TEST_F(StateDirectory, WhatCannotBeUsedIsRefused) {
   tools::write_file(folder.path / "file", "");
   EXPECT_EQ(Client(folder.path / "file").result, TEEC_ERROR_BAD_PARAMETERS);
