@@ -11,7 +11,19 @@
 /// opened them, which closes what it leaves open when it ends; TEE_HANDLE_NULL may be closed and
 /// freed. What the standard calls a programmer error (a handle
 /// that is not open, a call out of order, an attribute of another type) panics: one line on
-/// standard error, and the process aborts.
+/// standard error, and the process aborts. The other results are those that the standard gives each
+/// call, and TEE_ERROR_OUT_OF_MEMORY where the host has none; a persistent object that a call finds
+/// corrupt (TEE_ERROR_CORRUPT_OBJECT) has its handle closed.
+///
+/// What differs from the standard:
+///
+/// - RSA keys begin at 512 bits, not 256. Their size is a multiple of 8.
+/// - The nonce of AES-GCM has at most 128 bytes (TEE_ERROR_NOT_SUPPORTED).
+/// - Persistent objects hold data, not keys, and are not truncated, renamed or enumerated.
+/// - Uses of a key are not restricted: TEE_ObjectInfo has all of them.
+/// - Time limits of calls between trusted applications, the IV of a MAC and the parameters of
+///   asymmetric operations are ignored. A memory reference in such a call is handed on as it is,
+///   whosever the memory.
 #ifndef TEE_INTERNAL_API_H
 #define TEE_INTERNAL_API_H
 
@@ -247,7 +259,7 @@ void TEE_Free(void *buffer);
 /// Bytes of the longest object ID.
 #define TEE_OBJECT_ID_MAX_LEN 64u
 
-/// Object types. Keys of AES have 128, 192 or 256 bits, of HMAC 128 to 1024 (whole bytes), of RSA
+/// Object types. Keys of AES have 128, 192 or 256 bits, of HMAC 192 to 1024 (whole bytes), of RSA
 /// 512 to 4096 (whole bytes). TEE_TYPE_DATA is a persistent object without a key.
 /// @{
 #define TEE_TYPE_AES 0xA0000010u
@@ -304,13 +316,13 @@ void TEE_InitRefAttribute(TEE_Attribute *attr, uint32_t attributeID, const void 
                           TEE_LengthType length);
 
 /// Makes a random key of `keySize` bits in an object that has none. The one parameter is
-/// TEE_ATTR_RSA_PUBLIC_EXPONENT, of RSA (65537 without it). TEE_ERROR_BAD_PARAMETERS for a size or
-/// exponent that such keys cannot have.
+/// TEE_ATTR_RSA_PUBLIC_EXPONENT, of RSA (65537 without it). TEE_ERROR_BAD_PARAMETERS for an
+/// exponent that such keys cannot have; a size that they cannot have panics.
 TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_Attribute *params,
                            uint32_t paramCount);
 
 /// Opens a persistent object, positioned at its start. The ID is any bytes, of up to
-/// TEE_OBJECT_ID_MAX_LEN.
+/// TEE_OBJECT_ID_MAX_LEN, not in memory that the caller of a command shares.
 ///
 /// Returns TEE_ERROR_ITEM_NOT_FOUND, TEE_ERROR_ACCESS_CONFLICT when other handles and this one do
 /// not share what they do, or a code of the storage; `*object` is TEE_HANDLE_NULL then.
@@ -414,8 +426,8 @@ TEE_Result TEE_MACComputeFinal(TEE_OperationHandle operation, const void *messag
                                TEE_LengthType messageLen, void *mac, TEE_LengthType *macLen);
 
 /// Starts authenticated encryption with a tag of `tagLen` bits: 96, 104, 112, 120 or 128. The
-/// lengths of AAD and payload need not be known. TEE_ERROR_NOT_SUPPORTED for another tag or a nonce
-/// that is empty or longer than 128 bytes.
+/// lengths of AAD and payload need not be known. TEE_ERROR_NOT_SUPPORTED for another tag or a
+/// longer nonce than 128 bytes; an empty nonce, and an operation that is running, panic.
 TEE_Result TEE_AEInit(TEE_OperationHandle operation, const void *nonce, TEE_LengthType nonceLen,
                       uint32_t tagLen, uint32_t AADLen, uint32_t payloadLen);
 

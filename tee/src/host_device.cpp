@@ -21,7 +21,7 @@ TEE_Result HostDevice::open_session(const TEE_UUID &ta, const TEE_Identity &clie
   ++instance.num_clients;
   TEE_Result result;
   {
-    const Running running(instance, &fresh->client);
+    const Running running(instance, &fresh->client, &message);
     message.origin = TEE_ORIGIN_TRUSTED_APP;
     result =
         instance.program.entry_points.open_session(message.types, message.params, &fresh->context);
@@ -37,7 +37,7 @@ TEE_Result HostDevice::open_session(const TEE_UUID &ta, const TEE_Identity &clie
 TEE_Result HostDevice::invoke(Session &session, uint32_t command, Message &message) {
   const std::lock_guard guard(lock);
   if (session.instance->entered) return TEE_ERROR_BUSY;
-  const Running running(*session.instance, &session.client);
+  const Running running(*session.instance, &session.client, &message);
   message.origin = TEE_ORIGIN_TRUSTED_APP;
   return session.instance->program.entry_points.invoke_command(session.context, command,
                                                                message.types, message.params);

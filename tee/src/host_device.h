@@ -19,13 +19,6 @@
 
 namespace tee {
 
-/// Parameters on their way into a trusted application and back.
-struct Message {
-  uint32_t types = 0;
-  TEE_Param params[4] = {};
-  uint32_t origin = TEE_ORIGIN_TEE;  // where the result arose
-};
-
 class HostDevice {
  public:
   explicit HostDevice(std::unique_ptr<Storage> medium) : storage(std::move(medium)) {}

@@ -39,6 +39,10 @@ TEE_ObjectHandle open_handle(std::unique_ptr<__TEE_ObjectHandle> object);
 /// Takes the handle back and destroys the object.
 void close_handle(TEE_ObjectHandle handle);
 
+/// `result`, of a call with an open handle. The standard closes the handle of a persistent object
+/// that is corrupt.
+TEE_Result closed_if_corrupt(TEE_ObjectHandle handle, TEE_Result result);
+
 /// Whether keys of `type` may have `size` bits.
 bool key_size_supported(uint32_t type, uint32_t size);
 

@@ -44,7 +44,8 @@ const Algorithm *find_algorithm(uint32_t id) {
 bool supported(const Algorithm *algorithm, uint32_t mode, uint32_t max_key_size) {
   return algorithm != nullptr && mode <= TEE_MODE_DIGEST &&
          (algorithm->modes & mode_bit(mode)) != 0 &&
-         (algorithm->key_type == 0 || key_size_supported(algorithm->key_type, max_key_size));
+         (algorithm->key_type == 0 ? max_key_size == 0
+                                   : key_size_supported(algorithm->key_type, max_key_size));
 }
 
 // Gives the operation its context; false when there is no memory.

@@ -132,12 +132,12 @@ TEE_Result TEE_CipherDoFinal(TEE_OperationHandle operation, const void *srcData,
 TEE_Result TEE_AEInit(TEE_OperationHandle operation, const void *nonce, TEE_LengthType nonceLen,
                       uint32_t tagLen, uint32_t, uint32_t) {
   __TEE_OperationHandle &known = checked_keyed(operation, OperationClass::kAuthenticated, __func__);
+  if (known.active) panic(__func__, "operation is running");
+  if (nonceLen == 0) panic(__func__, "nonce is empty");
   if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_NOT_SUPPORTED, &code)) {
     return code;
   }
-  if (!is_tag_size(tagLen) || nonceLen == 0 || nonceLen > kMaxNonceLen) {
-    return TEE_ERROR_NOT_SUPPORTED;
-  }
+  if (!is_tag_size(tagLen) || nonceLen > kMaxNonceLen) return TEE_ERROR_NOT_SUPPORTED;
   if (!start_gcm(known.cipher.get(), nonce, nonceLen)) panic(__func__, "OpenSSL failed");
   known.tag_len = tagLen / 8;
   known.active = true;

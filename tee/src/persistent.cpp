@@ -41,9 +41,14 @@ void OpenData::store(Bytes data) {
 
 namespace {
 
-ObjectKey checked_key(const void *id, uint32_t id_len, const char *call) {
+void check_id(const void *id, uint32_t id_len, const char *call) {
   if (id_len > TEE_OBJECT_ID_MAX_LEN) panic(call, "object ID longer than 64 bytes");
   if (id == nullptr && id_len != 0) panic(call, "object ID is NULL");
+  current_instance();
+  if (Running::now()->shares(id, id_len)) panic(call, "object ID is in shared memory");
+}
+
+ObjectKey key_of(const void *id, uint32_t id_len) {
   return {current_instance().uuid, std::string(static_cast<const char *>(id), id_len)};
 }
 
@@ -182,11 +187,12 @@ TEE_Result TEE_OpenPersistentObject(uint32_t storageID, const void *objectID,
                                     TEE_LengthType objectIDLen, uint32_t flags,
                                     TEE_ObjectHandle *object) {
   *object = TEE_HANDLE_NULL;
-  const ObjectKey key = checked_key(objectID, objectIDLen, __func__);
+  check_id(objectID, objectIDLen, __func__);
   check_flags(flags, kAccessFlags | kShareFlags, __func__);
   if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
   if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
-  return storage_result_of([&] { return open_object(key, flags, object); });
+  return storage_result_of(
+      [&] { return open_object(key_of(objectID, objectIDLen), flags, object); });
 }
 
 // Objects with attributes are not kept here: no trusted application of ours stores keys that way.
@@ -195,7 +201,7 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
                                       TEE_ObjectHandle attributes, const void *initialData,
                                       TEE_LengthType initialDataLen, TEE_ObjectHandle *object) {
   *object = TEE_HANDLE_NULL;
-  const ObjectKey key = checked_key(objectID, objectIDLen, __func__);
+  check_id(objectID, objectIDLen, __func__);
   check_flags(flags, kAccessFlags | kShareFlags | TEE_DATA_FLAG_OVERWRITE, __func__);
   if (initialData == nullptr && initialDataLen != 0) panic(__func__, "initial data is NULL");
   if (attributes != TEE_HANDLE_NULL) checked_object(attributes, __func__);
@@ -203,7 +209,8 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
   if (storageID != TEE_STORAGE_PRIVATE) return TEE_ERROR_ITEM_NOT_FOUND;
   if (attributes != TEE_HANDLE_NULL) return TEE_ERROR_NOT_SUPPORTED;
   const ByteView data(static_cast<const uint8_t *>(initialData), initialDataLen);
-  return storage_result_of([&] { return create_object(key, flags, data, object); });
+  return storage_result_of(
+      [&] { return create_object(key_of(objectID, objectIDLen), flags, data, object); });
 }
 
 void TEE_CloseObject(TEE_ObjectHandle object) {
@@ -237,7 +244,7 @@ TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void *buffer, TEE_LengthT
   OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_READ, __func__);
   if (buffer == nullptr && size != 0) panic(__func__, "buffer is NULL");
   *count = 0;
-  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return closed_if_corrupt(object, code);
 
   const std::lock_guard guard(data.device.lock);
   const Bytes &stream = data.object->data;
@@ -253,9 +260,10 @@ TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void *buffer, TEE_LengthT
 TEE_Result TEE_WriteObjectData(TEE_ObjectHandle object, const void *buffer, TEE_LengthType size) {
   OpenData &data = checked_data(object, TEE_DATA_FLAG_ACCESS_WRITE, __func__);
   if (buffer == nullptr && size != 0) panic(__func__, "buffer is NULL");
-  if (TEE_Result code; storage_fault_due(__func__, &code)) return code;
+  if (TEE_Result code; storage_fault_due(__func__, &code)) return closed_if_corrupt(object, code);
   const ByteView bytes(static_cast<const uint8_t *>(buffer), size);
   const TEE_Result result = storage_result_of([&] { return write_data(data, bytes); });
   // The standard has no other code for a stream that cannot grow.
-  return result == TEE_ERROR_OUT_OF_MEMORY ? TEE_ERROR_STORAGE_NO_SPACE : result;
+  if (result == TEE_ERROR_OUT_OF_MEMORY) return TEE_ERROR_STORAGE_NO_SPACE;
+  return closed_if_corrupt(object, result);
 }

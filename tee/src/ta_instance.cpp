@@ -6,6 +6,8 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <functional>
+#include <iterator>
 
 #include "host_device.h"
 #include "object.h"
@@ -50,15 +52,30 @@ tee_heap_stats Instance::stats() const {
   };
 }
 
-Running::Running(Instance &instance, const TEE_Identity *client)
+Running::Running(Instance &instance, const TEE_Identity *client, const Message *message)
     : instance_(instance),
       client_(client),
+      message_(message),
       was_entered_(std::exchange(instance.entered, true)),
       outer_(std::exchange(t_running, this)) {}
 
 Running::~Running() {
   t_running = outer_;
   instance_.entered = was_entered_;
+}
+
+// What the trusted application may have changed in the parameters does not matter: a buffer that
+// it put there is its own, and the call that it makes with it no fault of the caller's.
+bool Running::shares(const void *data, size_t len) const {
+  if (message_ == nullptr) return false;
+  const auto *bytes = static_cast<const uint8_t *>(data);
+  for (unsigned i = 0; i < std::size(message_->params); ++i) {
+    if (TEE_PARAM_TYPE_GET(message_->types, i) < TEE_PARAM_TYPE_MEMREF_INPUT) continue;
+    const auto &memref = message_->params[i].memref;
+    const auto *shared = static_cast<const uint8_t *>(memref.buffer);
+    if (std::less()(bytes, shared + memref.size) && std::less()(shared, bytes + len)) return true;
+  }
+  return false;
 }
 
 const Running *Running::now() {

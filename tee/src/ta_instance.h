@@ -60,11 +60,19 @@ class Instance {
   bool entered = false;      // an entry point of it is on some stack
 };
 
-/// Makes the calling thread run as `instance` while it lives; `client` is who called, NULL where
-/// there is no client.
+/// Parameters on their way into a trusted application and back.
+struct Message {
+  uint32_t types = 0;
+  TEE_Param params[4] = {};
+  uint32_t origin = TEE_ORIGIN_TEE;  // where the result arose
+};
+
+/// Makes the calling thread run as `instance` while it lives; `client` is who called with what
+/// message, NULL where there is none.
 class Running {
  public:
-  explicit Running(Instance &instance, const TEE_Identity *client = nullptr);
+  explicit Running(Instance &instance, const TEE_Identity *client = nullptr,
+                   const Message *message = nullptr);
   ~Running();
   Running(const Running &) = delete;
   Running &operator=(const Running &) = delete;
@@ -75,9 +83,13 @@ class Running {
   Instance &instance() const { return instance_; }
   const TEE_Identity *client() const { return client_; }
 
+  /// True when bytes of `data` are the caller's, who may change them at any time.
+  bool shares(const void *data, size_t len) const;
+
  private:
   Instance &instance_;
   const TEE_Identity *client_;
+  const Message *message_;
   const bool was_entered_;
   const Running *const outer_;
 };

@@ -21,8 +21,10 @@ TEST_F(Crypto, DigestAndMacKnownAnswersAgainAndAgain) {
   const auto finish_digest = [&digest](uint8_t *out, uint32_t *len) {
     return TEE_DigestDoFinal(digest.get(), "c", 1, out, len);
   };
+  Bytes secret(20, 0x0b);
+  secret.resize(24);  // the shortest key here; HMAC itself fills up with zeros
   const Operation mac = make_operation(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256,
-                                       secret_key(TEE_TYPE_HMAC_SHA256, Bytes(20, 0x0b)));
+                                       secret_key(TEE_TYPE_HMAC_SHA256, secret));
   const auto finish_mac = [&mac](uint8_t *out, uint32_t *len) {
     return TEE_MACComputeFinal(mac.get(), "There", 5, out, len);
   };
@@ -129,6 +131,31 @@ TEST_F(Crypto, GcmKnownAnswerInPlaceUnderItsWholeTagOnly) {
 
 // ---- What an operation takes
 
+TEST_F(Crypto, AnOperationTakesItsModesAndSizesAlone) {
+  const struct {
+    uint32_t algorithm, mode, max_key_size;
+  } kUnsupported[] = {
+      {TEE_ALG_SHA256, TEE_MODE_DIGEST, 256},
+      {TEE_ALG_SHA256, TEE_MODE_MAC, 0},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 184},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 1032},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_SIGN, 256},
+      {TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 0},
+      {TEE_ALG_AES_GCM, TEE_MODE_MAC, 128},
+      {TEE_ALG_RSAES_PKCS1_V1_5, TEE_MODE_SIGN, 2048},
+      {TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_SIGN, 4104},
+      {0x50000003, TEE_MODE_DIGEST, 0},
+      {TEE_ALG_SHA256, 32, 0},
+  };
+  for (const auto &c : kUnsupported) {
+    SCOPED_TRACE(testing::Message() << std::hex << c.algorithm << " " << c.max_key_size);
+    TEE_OperationHandle operation;
+    EXPECT_EQ(TEE_AllocateOperation(&operation, c.algorithm, c.mode, c.max_key_size),
+              TEE_ERROR_NOT_SUPPORTED);
+    EXPECT_EQ(operation, nullptr);
+  }
+}
+
 TEST_F(Crypto, MisuseOfAnOperationPanics) {
   const Key aes = secret_key(TEE_TYPE_AES, Bytes(16));
   const Key rsa = make_key(TEE_TYPE_RSA_PUBLIC_KEY, 2048, rfc7515_public());
@@ -155,6 +182,29 @@ TEST_F(Crypto, MisuseOfAnOperationPanics) {
   TEE_CipherInit(cbc.get(), kCbcIv.data(), 16);
   EXPECT_DEATH(TEE_SetOperationKey(cbc.get(), aes.get()), "running");
   EXPECT_DEATH(TEE_CipherDoFinal(cbc.get(), "x", 1, out.data(), &len), "whole blocks");
+  EXPECT_EQ(TEE_CipherDoFinal(cbc.get(), nullptr, 0, nullptr, &len), TEE_SUCCESS);
+  EXPECT_DEATH(TEE_CipherUpdate(cbc.get(), "", 0, out.data(), &len), "not been started");
+
+  const Operation gcm = make_operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, aes);
+  EXPECT_DEATH(TEE_AEInit(gcm.get(), "", 0, 128, 0, 0), "nonce is empty");
+  EXPECT_EQ(TEE_AEInit(gcm.get(), out.data(), 12, 64, 0, 0), TEE_ERROR_NOT_SUPPORTED);
+  EXPECT_EQ(TEE_AEInit(gcm.get(), out.data(), 129, 128, 0, 0), TEE_ERROR_NOT_SUPPORTED);
+  EXPECT_EQ(TEE_AEInit(gcm.get(), out.data(), 1, 96, 0, 0), TEE_SUCCESS);
+  EXPECT_DEATH(TEE_AEInit(gcm.get(), out.data(), 12, 128, 0, 0), "running");
+  EXPECT_DEATH(TEE_AEDecryptFinal(gcm.get(), "", 0, out.data(), &len, out.data(), 12), "mode");
+  len = 1;
+  EXPECT_EQ(TEE_AEUpdate(gcm.get(), "x", 1, out.data(), &len), TEE_SUCCESS);
+  EXPECT_DEATH(TEE_AEUpdateAAD(gcm.get(), "late", 4), "OpenSSL");
+
+  const Operation verify =
+      make_operation(TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_VERIFY, 2048, rsa);
+  EXPECT_DEATH(
+      TEE_AsymmetricVerifyDigest(verify.get(), nullptr, 0, out.data(), 31, out.data(), 256),
+      "digest of a wrong length");
+  EXPECT_EQ(TEE_AsymmetricVerifyDigest(verify.get(), nullptr, 0, out.data(), 32, out.data(), 255),
+            TEE_ERROR_SIGNATURE_INVALID);
+  EXPECT_EQ(TEE_AsymmetricEncrypt(encrypt.get(), nullptr, 0, out.data(), 246, out.data(), &len),
+            TEE_ERROR_BAD_PARAMETERS);
 }
 
 }  // namespace

@@ -7,8 +7,11 @@ using Objects = Crypto;
 
 TEST_F(Objects, UnsupportedTypesAndSizes) {
   const std::pair<uint32_t, uint32_t> kUnsupported[] = {
-      {TEE_TYPE_AES, 160},         {TEE_TYPE_HMAC_SHA256, 120},  {TEE_TYPE_HMAC_SHA256, 129},
-      {TEE_TYPE_RSA_KEYPAIR, 504}, {TEE_TYPE_RSA_KEYPAIR, 4104}, {TEE_TYPE_DATA, 128},
+      {TEE_TYPE_AES, 160},         {TEE_TYPE_HMAC_SHA256, 184},
+      {TEE_TYPE_HMAC_SHA256, 196}, {TEE_TYPE_AES, 320},
+      {TEE_TYPE_AES, 0},           {TEE_TYPE_HMAC_SHA256, 1032},
+      {TEE_TYPE_RSA_KEYPAIR, 504}, {TEE_TYPE_RSA_KEYPAIR, 4104},
+      {TEE_TYPE_DATA, 0},
   };
   for (const auto &[type, size] : kUnsupported) EXPECT_EQ(blank_key(type, size), nullptr) << size;
 }
@@ -34,8 +37,11 @@ TEST_F(Objects, ValuesThatMakeNoKeyAreRefusedAndLeaveTheObjectBlank) {
     EXPECT_EQ(populate(key.get(), damaged), TEE_ERROR_BAD_PARAMETERS);
     EXPECT_EQ(populate(key.get(), sound), TEE_SUCCESS);  // of a key that has a value it panics
   }
-  const Key aes = blank_key(TEE_TYPE_AES, 256);
-  EXPECT_EQ(populate(aes.get(), {{TEE_ATTR_SECRET_VALUE, Bytes(17)}}), TEE_ERROR_BAD_PARAMETERS);
+  for (const auto &[type, len] : {std::pair(TEE_TYPE_AES, 17), {TEE_TYPE_HMAC_SHA256, 23}}) {
+    const Key key = blank_key(type, 256);
+    EXPECT_EQ(populate(key.get(), {{TEE_ATTR_SECRET_VALUE, Bytes(static_cast<size_t>(len))}}),
+              TEE_ERROR_BAD_PARAMETERS);
+  }
 }
 
 TEST_F(Objects, MisusePanics) {
@@ -60,6 +66,8 @@ TEST_F(Objects, MisusePanics) {
   EXPECT_DEATH(populate(blank.get(), twice), "twice");
   EXPECT_DEATH(populate(public_half.get(), rfc7515_private()), "another object type");
   EXPECT_DEATH(TEE_GenerateKey(blank.get(), 4096, nullptr, 0), "too big");
+  EXPECT_DEATH(TEE_GenerateKey(blank.get(), 2047, nullptr, 0), "no such key size");
+  EXPECT_DEATH(TEE_GenerateKey(public_half.get(), 2048, nullptr, 0), "public key");
   EXPECT_DEATH(TEE_GetObjectBufferAttribute(blank.get(), TEE_ATTR_RSA_MODULUS, nullptr, &len),
                "not initialized");
 }

@@ -139,6 +139,26 @@ TEST_F(Sessions, TheCalleeKnowsItsCallerAndSeesItsMemory) {
   EXPECT_EQ(client.invoke(0), TEEC_SUCCESS);
 }
 
+TEST_F(Sessions, AnObjectIdInSharedMemoryPanics) {
+  char shared[] = "0123456789";
+  TEEC_Operation operation{.paramTypes = TEEC_MEMREF_TEMP_INPUT};
+  operation.params[0].tmpref = {shared + 2, 4};
+  script<0>.invoke = [&](uint32_t, TEE_Param *) {
+    TEE_ObjectHandle object;
+    const auto open = [&](size_t at, uint32_t len) {
+      return TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, shared + at, len,
+                                      TEE_DATA_FLAG_ACCESS_READ, &object);
+    };
+    EXPECT_EQ(open(0, 2), TEE_ERROR_ITEM_NOT_FOUND);
+    EXPECT_EQ(open(6, 2), TEE_ERROR_ITEM_NOT_FOUND);
+    EXPECT_DEATH(open(0, 3), "shared memory");
+    EXPECT_DEATH(open(5, 3), "shared memory");
+    return TEE_SUCCESS;
+  };
+  ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
+  EXPECT_EQ(client.invoke(0, &operation), TEEC_SUCCESS);
+}
+
 // They would wait for each other.
 TEST_F(Sessions, CyclesAreRefused) {
   std::vector<TEE_Result> back;
