@@ -2,7 +2,8 @@
 /// The trace facility of the TEE: one log line per call, on standard error or in a test's sink.
 ///
 /// A line reads "LEVEL [0xTHREAD] PREFIX:FUNCTION:LINE: MESSAGE". The prefix and the highest level
-/// that appears come from the image header of the trusted application that calls.
+/// that appears come from the image header of the trusted application that calls. Control
+/// characters in a message, which may come from outside, are printed as "\xNN".
 #ifndef TEE_TRACE_H
 #define TEE_TRACE_H
 

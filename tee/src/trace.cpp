@@ -72,6 +72,22 @@ void print(const char *tag, const char *function, int line, const std::string &m
   [[maybe_unused]] const ssize_t written = ::write(STDERR_FILENO, text.data(), text.size());
 }
 
+// Texts come from outside, too: a line break would let one pass for another line, an escape
+// sequence speak to the terminal.
+std::string without_controls(const std::string &message) {
+  std::string text;
+  for (const char c : message) {
+    if (static_cast<unsigned char>(c) >= 0x20 && c != 0x7F) {
+      text += c;
+    } else {
+      char escaped[5];
+      std::snprintf(escaped, sizeof(escaped), "\\x%02x", static_cast<unsigned char>(c));
+      text += escaped;
+    }
+  }
+  return text;
+}
+
 void log(const char *function, int line, int level, std::string message) {
   {
     const std::lock_guard guard(g_sinks_lock);
@@ -80,7 +96,7 @@ void log(const char *function, int line, int level, std::string message) {
       return;
     }
   }
-  print(tag_of(level), function, line, message);
+  print(tag_of(level), function, line, without_controls(message));
 }
 
 }  // namespace
