@@ -17,12 +17,9 @@ struct ClientSession {
 
 constexpr TEE_Identity kNormalWorld = {TEE_LOGIN_PUBLIC, {}};
 
-TEE_Result initialize(const char *name, TEEC_Context &context) {
-  if (name == nullptr || *name == '\0') {
-    throw Error{TEE_ERROR_BAD_PARAMETERS, "the context name, a state directory, is missing"};
-  }
-  context.imp = new ClientContext{DeviceShare(open_device(name))};
-  return TEE_SUCCESS;
+// Throws unless the argument is what it must be.
+void expect(bool argument_is_good, const char *why) {
+  if (!argument_is_good) throw Error{TEE_ERROR_BAD_PARAMETERS, why};
 }
 
 TEE_Result open_session(const TEEC_Context &context, const TEEC_UUID &destination, Message &message,
@@ -34,13 +31,15 @@ TEE_Result open_session(const TEEC_Context &context, const TEEC_UUID &destinatio
   return result;
 }
 
-// Takes the parameters in, runs `call`, and hands them out whatever its result. A parameter that
-// cannot be taken in is the API's finding; whatever follows tells its own origin.
-template <class Call>
-TEE_Result exchange(TEEC_Operation *operation, uint32_t *origin, Call &&call) {
+// Takes the parameters in, runs `call`, and hands them out whatever its result. What `check`
+// throws, and a parameter that cannot be taken in, is the API's finding; what follows tells its own
+// origin.
+template <class Check, class Call>
+TEE_Result exchange(TEEC_Operation *operation, uint32_t *origin, Check &&check, Call &&call) {
   Message message;
   message.origin = TEE_ORIGIN_API;
   const TEE_Result result = client_result_of([&] {
+    check();
     take_params(operation, message);
     message.origin = TEE_ORIGIN_TEE;
     return call(message);
@@ -50,17 +49,13 @@ TEE_Result exchange(TEEC_Operation *operation, uint32_t *origin, Call &&call) {
   return result;
 }
 
-TEE_Result refuse(uint32_t *origin, TEE_Result code, const char *why) {
-  set_last_error(why);
-  if (origin != nullptr) *origin = TEE_ORIGIN_API;
-  return code;
-}
-
 constexpr uint32_t kDirections = TEEC_MEM_INPUT | TEEC_MEM_OUTPUT;
 
-bool valid_request(const TEEC_Context *context, const TEEC_SharedMemory *memory) {
-  return context != nullptr && context->imp != nullptr && memory != nullptr &&
-         (memory->flags & kDirections) != 0 && (memory->flags & ~kDirections) == 0;
+void check_request(const TEEC_Context *context, const TEEC_SharedMemory *memory) {
+  device_of(context);
+  expect(memory != nullptr, "shared memory is NULL");
+  expect((memory->flags & kDirections) != 0 && (memory->flags & ~kDirections) == 0,
+         "shared memory without a direction, or with other flags");
 }
 
 }  // namespace
@@ -70,9 +65,13 @@ bool valid_request(const TEEC_Context *context, const TEEC_SharedMemory *memory)
 using namespace tee;
 
 TEEC_Result TEEC_InitializeContext(const char *name, TEEC_Context *context) {
-  if (context == nullptr) return refuse(nullptr, TEEC_ERROR_BAD_PARAMETERS, "context is NULL");
-  context->imp = nullptr;
-  return client_result_of([&] { return initialize(name, *context); });
+  if (context != nullptr) context->imp = nullptr;
+  return client_result_of([&] {
+    expect(context != nullptr, "context is NULL");
+    expect(name != nullptr && *name != '\0', "the context name, a state directory, is missing");
+    context->imp = new ClientContext{DeviceShare(open_device(name))};
+    return TEE_SUCCESS;
+  });
 }
 
 void TEEC_FinalizeContext(TEEC_Context *context) {
@@ -86,14 +85,15 @@ TEEC_Result TEEC_OpenSession(TEEC_Context *context, TEEC_Session *session,
                              const void *connectionData, TEEC_Operation *operation,
                              uint32_t *returnOrigin) {
   if (session != nullptr) session->imp = nullptr;
-  if (context == nullptr || context->imp == nullptr || session == nullptr ||
-      destination == nullptr) {
-    return refuse(returnOrigin, TEEC_ERROR_BAD_PARAMETERS, "an argument is missing");
-  }
-  if (connectionMethod != TEEC_LOGIN_PUBLIC || connectionData != nullptr) {
-    return refuse(returnOrigin, TEEC_ERROR_NOT_SUPPORTED, "only public login is offered");
-  }
-  return exchange(operation, returnOrigin, [&](Message &message) {
+  const auto check = [&] {
+    device_of(context);
+    expect(session != nullptr, "session is NULL");
+    expect(destination != nullptr, "destination is NULL");
+    if (connectionMethod != TEEC_LOGIN_PUBLIC || connectionData != nullptr) {
+      throw Error{TEE_ERROR_NOT_SUPPORTED, "only public login is offered"};
+    }
+  };
+  return exchange(operation, returnOrigin, check, [&](Message &message) {
     return open_session(*context, *destination, message, *session);
   });
 }
@@ -107,11 +107,11 @@ void TEEC_CloseSession(TEEC_Session *session) {
 
 TEEC_Result TEEC_InvokeCommand(TEEC_Session *session, uint32_t commandID, TEEC_Operation *operation,
                                uint32_t *returnOrigin) {
-  if (session == nullptr || session->imp == nullptr) {
-    return refuse(returnOrigin, TEEC_ERROR_BAD_PARAMETERS, "session is not open");
-  }
-  const auto &open = *static_cast<const ClientSession *>(session->imp);
-  return exchange(operation, returnOrigin, [&](Message &message) {
+  const auto check = [&] {
+    expect(session != nullptr && session->imp != nullptr, "session is not open");
+  };
+  return exchange(operation, returnOrigin, check, [&](Message &message) {
+    const auto &open = *static_cast<const ClientSession *>(session->imp);
     return open.device->invoke(*open.session, commandID, message);
   });
 }
@@ -120,20 +120,21 @@ TEEC_Result TEEC_InvokeCommand(TEEC_Session *session, uint32_t commandID, TEEC_O
 void TEEC_RequestCancellation(TEEC_Operation *) {}
 
 TEEC_Result TEEC_RegisterSharedMemory(TEEC_Context *context, TEEC_SharedMemory *sharedMem) {
-  if (!valid_request(context, sharedMem) || sharedMem->buffer == nullptr) {
-    return refuse(nullptr, TEEC_ERROR_BAD_PARAMETERS, "not memory that can be shared");
-  }
-  sharedMem->imp = nullptr;
-  return TEEC_SUCCESS;
+  return client_result_of([&] {
+    check_request(context, sharedMem);
+    expect(sharedMem->buffer != nullptr, "shared memory without a buffer");
+    sharedMem->imp = nullptr;
+    return TEE_SUCCESS;
+  });
 }
 
 TEEC_Result TEEC_AllocateSharedMemory(TEEC_Context *context, TEEC_SharedMemory *sharedMem) {
-  if (!valid_request(context, sharedMem)) {
-    return refuse(nullptr, TEEC_ERROR_BAD_PARAMETERS, "not memory that can be shared");
-  }
-  sharedMem->buffer = std::calloc(1, sharedMem->size);
-  sharedMem->imp = sharedMem->buffer;
-  return sharedMem->buffer != nullptr ? TEEC_SUCCESS : TEEC_ERROR_OUT_OF_MEMORY;
+  return client_result_of([&] {
+    check_request(context, sharedMem);
+    sharedMem->imp = sharedMem->buffer = std::calloc(1, sharedMem->size);
+    if (sharedMem->buffer == nullptr) throw std::bad_alloc();
+    return TEE_SUCCESS;
+  });
 }
 
 void TEEC_ReleaseSharedMemory(TEEC_SharedMemory *sharedMem) {

@@ -4,7 +4,7 @@
 #include <openssl/core_names.h>
 #include <openssl/params.h>
 
-#include "instance.h"
+#include "running.h"
 
 namespace tee {
 

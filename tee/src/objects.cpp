@@ -5,9 +5,10 @@
 #include <algorithm>
 #include <iterator>
 
-#include "instance.h"
+#include "error.h"
 #include "object.h"
 #include "persistent.h"
+#include "running.h"
 
 __TEE_ObjectHandle::__TEE_ObjectHandle() = default;
 
@@ -123,21 +124,19 @@ std::vector<uint8_t> public_exponent_of(const TEE_Attribute *params, uint32_t pa
 
 TEE_Result generate_pair(__TEE_ObjectHandle &object, uint32_t size,
                          const std::vector<uint8_t> &public_exponent) {
-  object.rsa = generate_rsa_key(size, public_exponent);
-  if (object.rsa == nullptr) return TEE_ERROR_BAD_PARAMETERS;
-  object.attributes = export_rsa_key(*object.rsa);
+  SharedKey pair = generate_rsa_key(size, public_exponent);
+  if (pair == nullptr) return TEE_ERROR_BAD_PARAMETERS;
+  object.attributes = export_rsa_key(*pair);
+  object.rsa = std::move(pair);
   object.size = size;
   object.handle_flags |= TEE_HANDLE_FLAG_INITIALIZED;
   return TEE_SUCCESS;
 }
 
 TEE_Result generate_secret(__TEE_ObjectHandle &object, uint32_t size) {
-  std::vector<uint8_t> &secret = object.attributes[TEE_ATTR_SECRET_VALUE];
-  secret.resize(size / 8);
-  if (RAND_priv_bytes_ex(nullptr, secret.data(), secret.size(), 0) != 1) {
-    object.attributes.clear();
-    return TEE_ERROR_GENERIC;
-  }
+  std::vector<uint8_t> secret(size / 8);
+  if (RAND_priv_bytes_ex(nullptr, secret.data(), secret.size(), 0) != 1) return TEE_ERROR_GENERIC;
+  object.attributes[TEE_ATTR_SECRET_VALUE] = std::move(secret);
   return set_key(object) ? TEE_SUCCESS : TEE_ERROR_GENERIC;
 }
 
@@ -223,11 +222,13 @@ TEE_Result TEE_AllocateTransientObject(TEE_ObjectType objectType, uint32_t maxOb
   }
   if (!key_size_supported(objectType, maxObjectSize)) return TEE_ERROR_NOT_SUPPORTED;
 
-  auto blank = std::make_unique<__TEE_ObjectHandle>();
-  blank->type = objectType;
-  blank->max_size = maxObjectSize;
-  *object = open_handle(std::move(blank));
-  return TEE_SUCCESS;
+  return result_of([&] {
+    auto blank = std::make_unique<__TEE_ObjectHandle>();
+    blank->type = objectType;
+    blank->max_size = maxObjectSize;
+    *object = open_handle(std::move(blank));
+    return TEE_SUCCESS;
+  });
 }
 
 void TEE_FreeTransientObject(TEE_ObjectHandle object) {
@@ -252,11 +253,16 @@ TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attrib
   if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_BAD_PARAMETERS, &code)) {
     return code;
   }
-  take_attributes(blank, attrs, attrCount, __func__);
-  if (set_key(blank)) return TEE_SUCCESS;
-  cleanse(blank.attributes);
-  blank.attributes.clear();
-  return TEE_ERROR_BAD_PARAMETERS;
+  const char *const call = __func__;
+  const TEE_Result result = result_of([&] {
+    take_attributes(blank, attrs, attrCount, call);
+    return set_key(blank) ? TEE_SUCCESS : TEE_ERROR_BAD_PARAMETERS;
+  });
+  if (result != TEE_SUCCESS) {
+    cleanse(blank.attributes);
+    blank.attributes.clear();
+  }
+  return result;
 }
 
 TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_Attribute *params,
@@ -267,9 +273,12 @@ TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_
   if (blank.type == TEE_TYPE_RSA_PUBLIC_KEY) panic(__func__, "a public key is not generated");
   if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_GENERIC, &code)) return code;
 
-  if (blank.type == TEE_TYPE_RSA_KEYPAIR) {
-    return generate_pair(blank, keySize, public_exponent_of(params, paramCount, __func__));
-  }
-  if (paramCount != 0) panic(__func__, "parameter that this key type does not have");
-  return generate_secret(blank, keySize);
+  const char *const call = __func__;
+  return result_of([&] {
+    if (blank.type == TEE_TYPE_RSA_KEYPAIR) {
+      return generate_pair(blank, keySize, public_exponent_of(params, paramCount, call));
+    }
+    if (paramCount != 0) panic(call, "parameter that this key type does not have");
+    return generate_secret(blank, keySize);
+  });
 }

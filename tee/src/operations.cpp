@@ -4,10 +4,12 @@
 
 #include <algorithm>
 #include <iterator>
+#include <new>
 
-#include "instance.h"
+#include "error.h"
 #include "object.h"
 #include "operation.h"
+#include "running.h"
 
 namespace tee {
 
@@ -48,25 +50,32 @@ bool supported(const Algorithm *algorithm, uint32_t mode, uint32_t max_key_size)
                                    : key_size_supported(algorithm->key_type, max_key_size));
 }
 
-// Gives the operation its context; false when there is no memory.
-bool prepare(__TEE_OperationHandle &operation) {
+template <class T>
+T *allocated(T *context) {
+  if (context == nullptr) throw std::bad_alloc();
+  return context;
+}
+
+// Gives the operation its context.
+void prepare(__TEE_OperationHandle &operation) {
   switch (class_of(operation.algorithm)) {
     case OperationClass::kDigest:
-      operation.digest.reset(EVP_MD_CTX_new());
-      return operation.digest != nullptr &&
-             EVP_DigestInit_ex2(operation.digest.get(), algorithms().sha256, nullptr) == 1;
+      operation.digest.reset(allocated(EVP_MD_CTX_new()));
+      if (EVP_DigestInit_ex2(operation.digest.get(), algorithms().sha256, nullptr) != 1) {
+        throw std::bad_alloc();
+      }
+      break;
     case OperationClass::kMac:
-      operation.mac.reset(EVP_MAC_CTX_dup(algorithms().hmac_sha256));
-      return operation.mac != nullptr;
+      operation.mac.reset(allocated(EVP_MAC_CTX_dup(algorithms().hmac_sha256)));
+      break;
     case OperationClass::kCipher:
     case OperationClass::kAuthenticated:
-      operation.cipher.reset(EVP_CIPHER_CTX_new());
-      return operation.cipher != nullptr;
+      operation.cipher.reset(allocated(EVP_CIPHER_CTX_new()));
+      break;
     case OperationClass::kAsymmetricCipher:
     case OperationClass::kSignature:
-      return true;  // OpenSSL's context begins with the key
+      break;  // OpenSSL's context begins with the key
   }
-  return false;
 }
 
 // A key pair also does what its public half does.
@@ -179,14 +188,16 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle *operation, uint32_t algori
   }
   if (!supported(find_algorithm(algorithm), mode, maxKeySize)) return TEE_ERROR_NOT_SUPPORTED;
 
-  auto fresh = std::make_unique<__TEE_OperationHandle>();
-  fresh->algorithm = algorithm;
-  fresh->mode = mode;
-  fresh->max_key_size = maxKeySize;
-  if (!prepare(*fresh)) return TEE_ERROR_OUT_OF_MEMORY;
-  open_handles(current_instance()).operations.insert(fresh.get());
-  *operation = fresh.release();
-  return TEE_SUCCESS;
+  return result_of([&] {
+    auto fresh = std::make_unique<__TEE_OperationHandle>();
+    fresh->algorithm = algorithm;
+    fresh->mode = mode;
+    fresh->max_key_size = maxKeySize;
+    prepare(*fresh);
+    open_handles(current_instance()).operations.insert(fresh.get());
+    *operation = fresh.release();
+    return TEE_SUCCESS;
+  });
 }
 
 void TEE_FreeOperation(TEE_OperationHandle operation) {
@@ -204,13 +215,15 @@ TEE_Result TEE_SetOperationKey(TEE_OperationHandle operation, TEE_ObjectHandle k
   if (key != TEE_HANDLE_NULL) check_key(known, checked_object(key, __func__), __func__);
   if (TEE_Result code; fault_due(Fault::kCrypto, __func__, TEE_ERROR_GENERIC, &code)) return code;
 
-  const QuietErrors quiet;
-  if (known.has_key) {
-    known.has_key = false;
-    known.rsa.reset();
-    if (!prepare(known)) return TEE_ERROR_OUT_OF_MEMORY;
-  }
-  if (key == TEE_HANDLE_NULL) return TEE_SUCCESS;
-  known.has_key = set_key(known, *key);
-  return known.has_key ? TEE_SUCCESS : TEE_ERROR_GENERIC;
+  return result_of([&] {
+    const QuietErrors quiet;
+    if (known.has_key) {
+      known.has_key = false;
+      known.rsa.reset();
+      prepare(known);
+    }
+    if (key == TEE_HANDLE_NULL) return TEE_SUCCESS;
+    known.has_key = set_key(known, *key);
+    return known.has_key ? TEE_SUCCESS : TEE_ERROR_GENERIC;
+  });
 }

@@ -7,9 +7,9 @@
 #include <algorithm>
 #include <array>
 
-#include "instance.h"
 #include "operation.h"
 #include "rsa_key.h"
+#include "running.h"
 
 namespace tee {
 

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <vector>
 
-#include "instance.h"
 #include "operation.h"
+#include "running.h"
 
 namespace tee {
 

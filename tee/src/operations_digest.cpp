@@ -2,8 +2,8 @@
 // Digests and message authentication codes.
 #include <openssl/sha.h>
 
-#include "instance.h"
 #include "operation.h"
+#include "running.h"
 
 using namespace tee;
 

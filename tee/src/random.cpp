@@ -2,7 +2,7 @@
 #include <openssl/rand.h>
 #include <tee_internal_api.h>
 
-#include "instance.h"
+#include "running.h"
 
 void TEE_GenerateRandom(void *randomBuffer, TEE_LengthType randomBufferLen) {
   auto *bytes = static_cast<unsigned char *>(randomBuffer);

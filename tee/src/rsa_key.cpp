@@ -11,8 +11,8 @@
 #include <bit>
 #include <mutex>
 
-#include "instance.h"
 #include "rsa_completion.h"
+#include "running.h"
 
 namespace tee {
 

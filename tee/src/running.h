@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// What the rest of the host TEE knows of the trusted application that is running.
-#ifndef TEE_INSTANCE_H
-#define TEE_INSTANCE_H
+#ifndef TEE_RUNNING_H
+#define TEE_RUNNING_H
 
 #include <tee_internal_api.h>
 

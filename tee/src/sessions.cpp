@@ -47,12 +47,17 @@ TEE_Result open_ta_session(Instance &caller, const TEE_UUID &destination, Messag
                            TEE_TASessionHandle *handle) {
   const std::lock_guard guard(caller.device.lock);
   if (closes_cycle(caller.device, destination, caller)) return TEE_ERROR_BUSY;
+  caller.sessions.reserve(caller.sessions.size() + 1);
   const TEE_Identity identity = {TEE_LOGIN_TRUSTED_APP, caller.program.uuid};
   std::unique_ptr<Session> session;
   const TEE_Result result = caller.device.open_session(destination, identity, message, session);
   if (result != TEE_SUCCESS) return result;
-  *handle = session.get();
-  caller.sessions.emplace(*handle, std::move(session));
+  try {
+    *handle = caller.sessions.emplace(session.get(), std::move(session)).first->first;
+  } catch (...) {
+    caller.device.close_session(std::move(session));
+    throw;
+  }
   return TEE_SUCCESS;
 }
 

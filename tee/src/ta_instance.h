@@ -11,7 +11,7 @@
 #include <unordered_map>
 
 #include "heap.h"
-#include "instance.h"
+#include "running.h"
 #include "uuid.h"
 
 namespace tee {

@@ -1,9 +1,52 @@
 // SPDX-License-Identifier: BSD-2-Clause
+#include <new>
+#include <vector>
+
 #include "tee_support.h"
 
 using namespace tee::test;
 
+// ---- The host's memory
+
+static unsigned g_allocation_to_fail = 0;  // counted from the next one; 0: none
+static unsigned g_num_failed = 0;
+
+void *operator new(size_t size, const std::nothrow_t &) noexcept {
+  if (g_allocation_to_fail != 0 && --g_allocation_to_fail == 0) {
+    ++g_num_failed;
+    return nullptr;
+  }
+  return std::malloc(size != 0 ? size : 1);
+}
+void *operator new(size_t size) {
+  void *block = operator new(size, std::nothrow);
+  if (block == nullptr) throw std::bad_alloc();
+  return block;
+}
+void operator delete(void *block) noexcept {
+  std::free(block);
+}
+void operator delete(void *block, size_t) noexcept {
+  std::free(block);
+}
+
 namespace {
+
+// Makes the call with its first allocation failing, then with the second, until it needs no more.
+void expect_codes_without_memory(const std::function<TEE_Result()> &call) {
+  for (unsigned n = 1;; ++n) {
+    g_allocation_to_fail = n;
+    const TEE_Result result = call();
+    const bool was_hit = std::exchange(g_allocation_to_fail, 0u) == 0;
+    if (!was_hit) {
+      EXPECT_EQ(result, TEE_SUCCESS);
+      return;
+    }
+    EXPECT_TRUE(result == TEE_ERROR_OUT_OF_MEMORY || result == TEE_ERROR_STORAGE_NO_SPACE ||
+                result == TEE_ERROR_STORAGE_NOT_AVAILABLE)
+        << n << std::hex << " " << result;
+  }
+}
 
 bool allocates() {
   void *block = TEE_Malloc(1, TEE_MALLOC_FILL_ZERO);
@@ -32,19 +75,29 @@ TEST(Faults, HitTheNthCallOnceOrFromThereOn) {
   EXPECT_FALSE(device.fault_report().fired);
 }
 
-TEST(Faults, EachCallFailsInItsTurnAndCanBeMadeAgain) {
+struct Call {
+  Fault fault;
+  const char *name;
+  std::function<TEE_Result()> make;
+};
+
+// Calls of an instance, in an order in which each succeeds.
+class Calls : public testing::Test {
+ protected:
+  ~Calls() override {
+    TEE_FreeOperation(mac);
+    TEE_FreeTransientObject(key);
+    EXPECT_EQ(ta.stats().open_objects + ta.stats().open_operations, 0u);
+  }
+
   Device device;
-  const InsideTa ta(device);
-  TEE_ObjectHandle key, object;
-  TEE_OperationHandle mac;
-  char byte;
-  uint32_t count;
+  const InsideTa ta{device};
+  TEE_ObjectHandle key = nullptr, object = nullptr;
+  TEE_OperationHandle mac = nullptr;
+  char byte = 0;
+  uint32_t count = 0;
   const uint32_t access = TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE_META;
-  struct {
-    Fault fault;
-    const char *name;
-    std::function<TEE_Result()> make;
-  } const kCalls[] = {
+  const std::vector<Call> calls = {
       {Fault::kCrypto, "TEE_AllocateTransientObject",
        [&] { return TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, 256, &key); }},
       {Fault::kCrypto, "TEE_GenerateKey", [&] { return TEE_GenerateKey(key, 256, nullptr, 0); }},
@@ -65,17 +118,50 @@ TEST(Faults, EachCallFailsInItsTurnAndCanBeMadeAgain) {
       {Fault::kStorage, "TEE_CloseAndDeletePersistentObject1",
        [&] { return TEE_CloseAndDeletePersistentObject1(std::exchange(object, nullptr)); }},
   };
-  for (const auto &[fault, name, make] : kCalls) {
+};
+
+TEST_F(Calls, FailInTheirTurnAndCanBeMadeAgain) {
+  for (const auto &[fault, name, make] : calls) {
     SCOPED_TRACE(name);
     device.fail({}, fault, 1, false, TEE_ERROR_BUSY);
     EXPECT_EQ(make(), TEE_ERROR_BUSY);
     EXPECT_EQ(device.fault_report().call, name);
     EXPECT_EQ(make(), TEE_SUCCESS);
   }
-  TEE_FreeOperation(mac);
-  TEE_FreeTransientObject(key);
-  EXPECT_EQ(ta.stats().open_objects + ta.stats().open_operations, 0u);
   EXPECT_EQ(device.objects({})["id"], "x");
+}
+
+// No exception crosses a C function.
+TEST_F(Calls, SayWhenTheHostHasNoMemory) {
+  for (const auto &[fault, name, make] : calls) {
+    SCOPED_TRACE(name);
+    expect_codes_without_memory(make);
+  }
+  register_script<0>(device, kTaA);
+  register_script<1>(device, kTaB);
+  script<0>.invoke = [](uint32_t, TEE_Param *) {
+    expect_codes_without_memory([] {
+      const TEE_UUID other = inner(kTaB);
+      TEE_TASessionHandle session;
+      return TEE_OpenTASession(&other, 0, 0, nullptr, &session, nullptr);
+    });
+    return TEE_SUCCESS;
+  };
+  Client client(device.name());
+  expect_codes_without_memory([&] { return client.open(kTaA); });
+  EXPECT_EQ(client.invoke(0), TEEC_SUCCESS);
+  EXPECT_GT(g_num_failed, 20u);
+}
+
+TEST_F(Calls, CloseTheHandleOfACorruptObject) {
+  device.put_object({}, "id", "data");
+  for (const size_t i : {7u, 5u}) {  // a read and a write
+    ASSERT_EQ(open_object("id", TEE_DATA_FLAG_ACCESS_READ | TEE_DATA_FLAG_ACCESS_WRITE, &object),
+              TEE_SUCCESS);
+    device.fail({}, Fault::kStorage, 1, false, TEE_ERROR_CORRUPT_OBJECT);
+    EXPECT_EQ(calls[i].make(), TEE_ERROR_CORRUPT_OBJECT);
+    EXPECT_EQ(ta.stats().open_objects, 0u);
+  }
 }
 
 TEST(Faults, AShortReadGivesHalf) {
