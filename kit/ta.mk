@@ -24,6 +24,6 @@ generate = $(if $(filter clean,$(MAKECMDGOALS)),,$(shell \
   JSMN_INCLUDE_DIR='$(JSMN_INCLUDE_DIR)' $(root)/kit/generate $(generated) $1)$(if \
   $(filter-out 0,$(.SHELLSTATUS)),$(error the headers of $(CURDIR) cannot be generated)))
 
-ta-cxxflags := -std=c++20 -ffreestanding -nostdinc++ -fno-exceptions -fno-rtti \
+ta-cxxflags := -std=c++20 -ffreestanding -fbuiltin -nostdinc++ -fno-exceptions -fno-rtti \
   -fno-threadsafe-statics -fno-unwind-tables -fno-asynchronous-unwind-tables \
   -Os -ffunction-sections -fdata-sections -Wno-psabi -Wno-format
