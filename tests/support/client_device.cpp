@@ -11,9 +11,13 @@ uint32_t word_at(std::string_view bytes, size_t offset) {
   return value;
 }
 
+void ClientDevice::require_open() {
+  if (!session_) session_.emplace(door_, device::kAgentUuid);
+}
+
 bool ClientDevice::open(TEEC_Result *result) {
   try {
-    if (!session_) session_.emplace(door_, device::kAgentUuid);
+    require_open();
   } catch (const device::Error &error) {
     session_.reset();
     if (result != nullptr) *result = error.code();
@@ -33,7 +37,7 @@ Answer ClientDevice::invoke(uint32_t command, std::optional<std::string_view> in
                         .input = input ? device::Buffer(*input) : device::Buffer(),
                         .capacity = static_cast<uint32_t>(capacity),
                         .types = types});
-  return {reply.result, reply.size, std::string(reply.output.bytes())};
+  return {reply.result, reply.origin, reply.size, std::string(reply.output.bytes())};
 }
 
 Reply ClientDevice::send(uint32_t message_id, std::string_view text, size_t capacity) {

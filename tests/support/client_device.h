@@ -44,6 +44,7 @@ inline std::string frame(uint32_t message_id, std::string_view text) {
 /// What one raw invocation left behind.
 struct Answer {
   TEEC_Result result = 0;
+  device::Origin origin = device::Origin::kClientApi;
   size_t size = 0;     // as the TA left it
   std::string buffer;  // all of the output buffer, 0xA5 where nothing was written
 };
@@ -67,6 +68,8 @@ class ClientDevice {
 
   /// Opens the session if it is closed. False, with the code, when the instance is not created.
   bool open(TEEC_Result *result = nullptr);
+  /// The same, but throws the device::Error that says why.
+  void require_open();
   void close() { session_.reset(); }
   /// Ends the instance and starts a new one.
   bool restart();

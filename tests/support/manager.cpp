@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "support/manager.h"
 
+#include <algorithm>
 #include <cstdlib>
 #include <map>
 
@@ -35,6 +36,16 @@ const tsm::Identity &tsm_named(const std::string &tsmid) {
   static std::map<std::string, tsm::Identity> identities;
   if (!identities.contains(tsmid)) identities.emplace(tsmid, tsm::make_identity(tsmid, dev_ca()));
   return identities.at(tsmid);
+}
+
+testing::AssertionResult Outcome::passed() const {
+  if (response && response->status != "fail") return testing::AssertionSuccess();
+  const bool is_refused = response && response->error_code;
+  const device::Origin origin =
+      reply.result == TEEC_SUCCESS ? device::Origin::kStatusWord : reply.answer.origin;
+  return testing::AssertionFailure()
+         << device::Error(message, code(), origin, is_refused ? "error_code of the response" : "")
+                .what();
 }
 
 uint32_t Outcome::code() const {
@@ -87,7 +98,7 @@ static tsm::DeviceInfo info_of(device::Device &door) {
 
 Manager::Manager(ClientDevice &device, const tsm::Identity &tsm)
     : info(info_of(device.door())), device_(device), tsm_(&tsm) {
-  if (!device.open()) throw std::runtime_error("the agent does not start");
+  device.require_open();
 }
 
 Manager::Manager(ClientDevice &device, const Manager &other)
@@ -111,7 +122,7 @@ std::string Manager::request(MessageId id, RequestOptions options, const Edits &
 
   Json content = tsm::request_content(id, options, tsm().tsmid);
   if (edits.content) edits.content(content);
-  if (!content.is_null()) content = tsm::jwe_encrypt(info.tee_key, content.dump());
+  if (!content.is_null()) content = tsm::jwe_encrypt(info.tee_key, content.dump(), {edits.cipher});
   Json image;
   Json extra = Json::object();
   if (!tsm::image_member(id).empty()) {
@@ -132,8 +143,9 @@ std::string Manager::request(MessageId id, RequestOptions options, const Edits &
 }
 
 Outcome Manager::send(MessageId id, const std::string &text) {
-  Outcome outcome;
-  outcome.reply = device_.send(static_cast<uint32_t>(id), text);
+  Outcome outcome = {.message = tsm::message_of(id).command};
+  outcome.reply =
+      device_.send(static_cast<uint32_t>(id), text, std::max<size_t>(1 << 20, text.size()));
   if (outcome.reply.response.empty()) return outcome;
   outcome.response = tsm::open_response(outcome.reply.response, {info.tee_key, tsm().key, &dsi});
   if (outcome.response->dsi_text) {

@@ -3,6 +3,8 @@
 #ifndef SUPPORT_MANAGER_H
 #define SUPPORT_MANAGER_H
 
+#include <gtest/gtest.h>
+
 #include <functional>
 #include <optional>
 #include <string>
@@ -32,11 +34,13 @@ const tsm::Identity &tsm_named(const std::string &tsmid);
 
 /// What came of one exchange. The response was verified and decrypted.
 struct Outcome {
+  std::string_view message;  // its name on command lines
   Reply reply;
   std::optional<tsm::Response> response;
 
-  /// Two messages have no status: theirs is a response without one, or none.
-  bool passed() const { return response && response->status != "fail"; }
+  /// Two messages have no status: theirs is a response without one, or none. A test that expected
+  /// the other says what the device answered.
+  testing::AssertionResult passed() const;
   /// The code of a refused request: of its "reason", or the status word.
   uint32_t code() const;
 };
@@ -51,6 +55,7 @@ struct Edits {
   Edit content = {};   // before it is encrypted
   Edit tbs = {};       // before it is signed
   Edit envelope = {};  // afterwards
+  tsm::ContentCipher cipher = tsm::ContentCipher::kA128CbcHs256;
 };
 
 /// A TA image with a header: `payload_len` bytes that depend on `seed`.

@@ -164,10 +164,12 @@ std::string_view Buffer::bytes() const {
   return {reinterpret_cast<const char *>(bytes_.get()), size_};
 }
 
-Device::Device(const std::string &state_directory) {
-  const TEEC_Result result = TEEC_InitializeContext(state_directory.c_str(), &context_);
+Device::Device(const std::string &name) {
+  const TEEC_Result result =
+      TEEC_InitializeContext(name.empty() ? nullptr : name.c_str(), &context_);
   if (result != TEEC_SUCCESS) {
-    throw Error("cannot open device " + state_directory, result, Origin::kClientApi);
+    throw Error("cannot open device" + (name.empty() ? "" : " " + name), result,
+                Origin::kClientApi);
   }
 }
 

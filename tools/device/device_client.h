@@ -13,7 +13,10 @@
 #ifndef DEVICE_DEVICE_CLIENT_H
 #define DEVICE_DEVICE_CLIENT_H
 
+// The headers of some vendors know nothing of C++.
+extern "C" {
 #include <tee_client_api.h>
+}
 
 #include <cstdint>
 #include <memory>
@@ -74,7 +77,9 @@ class Buffer {
 /// A device that this process owns while the object lives.
 class Device {
  public:
-  explicit Device(const std::string &state_directory);
+  /// `name` is the host TEE's state directory, or what another Client API calls the TEE; without
+  /// one that gets NULL, the usual name.
+  explicit Device(const std::string &name);
   ~Device() { TEEC_FinalizeContext(&context_); }
   Device(const Device &) = delete;
   Device &operator=(const Device &) = delete;

@@ -151,7 +151,8 @@ const Command kObjectCommands[] = {
 };
 
 std::string footer(const std::string &notes, const std::string &example) {
-  return notes + "Example:\n  otrp-device --state ./device " + example + "\n";
+  const char *device = device::inspection() != nullptr ? "--state ./device " : "";
+  return notes + "Example:\n  otrp-device " + device + example + "\n";
 }
 
 void add_parameter(CLI::App *command, const Parameter &parameter, Arguments &arguments) {
@@ -187,6 +188,20 @@ void add_inspection(CLI::App *app, Arguments &arguments, const Command *&chosen)
   add_commands(objects, kObjectCommands, arguments, chosen);
 }
 
+/// The host TEE has devices in directories; any other is a device of its own.
+void add_device(CLI::App *app, Arguments &arguments) {
+  if (device::inspection() != nullptr) {
+    app->add_option("--state", arguments.state_directory, "State directory of the device")
+        ->required()
+        ->type_name("DIR")
+        ->envname("OTRP_STATE");
+  } else {
+    app->add_option("--context", arguments.state_directory,
+                    "Name of the TEE for its Client API (default: NULL)")
+        ->type_name("NAME");
+  }
+}
+
 void run(std::span<char *> words) {
   Arguments arguments;
   const Command *chosen = nullptr;
@@ -197,10 +212,7 @@ void run(std::span<char *> words) {
              "Exit: 0 success, 1 the device answered with a failure, 2 wrong usage.\n",
              "info > device.json"));
   app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
-  app.add_option("--state", arguments.state_directory, "State directory of the device")
-      ->required()
-      ->type_name("DIR")
-      ->envname("OTRP_STATE");
+  add_device(&app, arguments);
   add_commands(&app, kCommands, arguments, chosen);
   if (device::inspection() != nullptr) add_inspection(&app, arguments, chosen);
   if (tools::parse_command_line(app, words)) chosen->run(arguments);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // The command interface from outside, over the Client API alone: parameters, framing, buffers.
-#include "support/any_scene.h"
+#include "common/result_names.h"
+#include "port/any_scene.h"
 
 namespace otrp_test {
 namespace {
@@ -74,12 +75,18 @@ TEST_F(CommandInterface, WhatIsNoRequestIsAnsweredInTheStatusWordAtMost) {
   for (const auto &c : cases) {
     SCOPED_TRACE(c.name);
     const Answer answer = device.invoke(c.command, c.input, c.capacity, c.types);
-    EXPECT_EQ(answer.result, c.result);
+    EXPECT_EQ(tools::describe_result(answer.result), tools::describe_result(c.result));
     const std::string written = c.status != kUnwritten ? header(c.status) : "";
     EXPECT_EQ(answer.buffer, written + untouched(c.capacity - written.size()));
     const bool is_answered = c.command == 0 && c.result == TEEC_SUCCESS;
     EXPECT_EQ(answer.size, is_answered ? 8 : c.capacity);
   }
+}
+
+TEST_F(CommandInterface, TheDeviceIdIsTheOneThatTheTsmKnows) {
+  const Answer answer = device.invoke(2, std::nullopt, 256);
+  EXPECT_EQ(tools::describe_result(answer.result), tools::describe_result(TEEC_SUCCESS));
+  EXPECT_EQ(answer.buffer.substr(0, answer.size), scene.info.device_id);
 }
 
 TEST_F(CommandInterface, CapacityMustExceedTheResponseByOne) {

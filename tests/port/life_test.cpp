@@ -2,7 +2,7 @@
 // A device's life as its TSM sees it: all messages, over the Client API alone.
 #include <gmock/gmock.h>
 
-#include "support/any_scene.h"
+#include "port/any_scene.h"
 #include "tsm/dsi.h"
 
 namespace otrp_test {
@@ -18,14 +18,7 @@ class Life : public testing::Test {
     ASSERT_TRUE(scene.create_sd("sp1", "sd1").passed());
   }
 
-  // A device that lives on is left without SDs and TAs.
-  void TearDown() override {
-    const Json sds = scene.sd_list();
-    for (const Json &sd : sds) {
-      for (const Json &ta : sd["talist"]) scene.delete_ta(sd["name"], ta["taid"]);
-      EXPECT_TRUE(scene.delete_sd(sd["name"], "true").passed());
-    }
-  }
+  void TearDown() override { scene.leave_empty(); }
 
   std::string aik_of(const std::string &spid) {
     return tsm::find_aik(scene.dsi, spid).value().fingerprint();
@@ -35,9 +28,15 @@ class Life : public testing::Test {
     return scene.device.invoke(1, device::build_query(ta), 100).result;
   }
 
+  Json ta_info(const std::string &spid) {
+    const Outcome outcome = scene.get_ta_info(spid, ta1);
+    EXPECT_TRUE(outcome.passed());
+    return outcome.response ? outcome.response->members : Json::object();
+  }
+
   void expect_same_after_restart() {
     const std::string before = scene.dsi_text;
-    ASSERT_TRUE(scene.device.restart());
+    scene.restart();
     ASSERT_TRUE(scene.get_device_state().passed());
     EXPECT_EQ(scene.dsi_text, before);
   }
@@ -77,15 +76,14 @@ TEST_F(Life, UpdateSdRenewsTheAikOfAllSdsOfTheSp) {
 
 TEST_F(Life, ATaIsHandedOverAndRecordedUntilItIsDeleted) {
   EXPECT_EQ(query(ta1), kNotFound);
-  for (const std::string &image : {make_image(300000), make_image(1)}) {
+  for (const std::string &image : {make_image(1 << 20), make_image(1)}) {
     const bool is_update = query(ta1) == TEEC_SUCCESS;
     const Outcome outcome = is_update ? scene.update_ta("sp1", "sd1", ta1, image)
                                       : scene.install_ta("sp1", "sd1", ta1, image);
     ASSERT_TRUE(outcome.passed());
     EXPECT_EQ(outcome.reply.image, image);
     EXPECT_EQ(outcome.reply.answer.size, 12 + outcome.reply.response.size() + image.size());
-    EXPECT_EQ(scene.get_ta_info("sp1", ta1).response->members["ta_version"],
-              is_update ? "2.0" : "1.0");
+    EXPECT_EQ(ta_info("sp1")["ta_version"], is_update ? "2.0" : "1.0");
     expect_same_after_restart();
   }
   ASSERT_TRUE(scene.delete_ta("sd1", ta1).passed());
@@ -103,8 +101,33 @@ TEST_F(Life, GetTaInfoIsSignedWithTheAikOfTheSpInTheRequest) {
                            {"tsmid", "tsm1"},
                            {"ta_version", "1.0"},
                            {"signercert", "certificate of " + sp}};
-    EXPECT_EQ(scene.get_ta_info(sp, ta1).response->members.dump(), expected.dump());
+    EXPECT_EQ(ta_info(sp).dump(), expected.dump());
   }
+}
+
+TEST_F(Life, NamesFillObjectIdsToTheLastByte) {
+  // Of 64 bytes, the prefixes of both records take 8.
+  const std::string spid(56, 'p');
+  const std::string sdname(56, 's');
+  ASSERT_TRUE(scene.create_sd(spid, sdname).passed());
+  expect_same_after_restart();
+  EXPECT_THAT(scene.sd_names(), ElementsAre("sd1", sdname));
+  EXPECT_TRUE(tsm::find_aik(scene.dsi, spid));
+}
+
+TEST_F(Life, FiftySdsHaveRoom) {
+  for (int i = 2; i <= 50; ++i) {
+    ASSERT_TRUE(scene.create_sd("sp1", "sd" + std::to_string(i)).passed()) << i;
+  }
+  expect_same_after_restart();
+  EXPECT_EQ(scene.sd_names().size(), 50u);
+}
+
+TEST_F(Life, ContentsMayComeInGcm) {
+  const Outcome outcome = scene.run(MessageId::kCreateSd, usual(MessageId::kCreateSd),
+                                    {.cipher = tsm::ContentCipher::kA128Gcm});
+  ASSERT_TRUE(outcome.passed());
+  EXPECT_THAT(scene.sd_names(), ElementsAre("sd1", "sd4"));
 }
 
 TEST_F(Life, AnImageThatDoesNotFitIsReportedWithTheSizeItNeeds) {
