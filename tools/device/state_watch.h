@@ -32,7 +32,7 @@ class StateWatch {
 
   std::string directory_;
   Identity identity_{};
-  bool is_watched_;  // filled in with the one above
+  bool is_watched_;          // filled in with the one above
   mutable std::mutex lock_;  // of the next one
   mutable std::map<std::string, Identity> databases_;
 };
