@@ -74,9 +74,6 @@ static TEE_Result add_aik(const char *caller, const char *spid, const char *spce
   TRY(check_sp_record(caller, spid, spcert));
   box_ptr box;
   TRY(make_aik(caller, &box, pubkey, pubkey_len));
-  // An earlier attempt may have announced a key that was never stored.
-  TRY_LOG_AS(caller, delete_dsi_spl_item_with_spid(g_dsi, spid),
-             "delete_dsi_spl_item_with_spid error code: 0x%x");
   TRY(announce_aik(caller, spid, *pubkey, *pubkey_len));
   secret_text encoded_box;
   TRY(encode_aik(caller, box.get(), out(encoded_box)));

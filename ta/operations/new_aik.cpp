@@ -26,6 +26,8 @@ TEE_Result make_aik(const char *caller, box_ptr *box, uint8_t **pubkey, uint32_t
 
 TEE_Result announce_aik(const char *caller, const char *spid, const uint8_t *pubkey,
                         uint32_t pubkey_len) {
+  TRY_LOG_AS(caller, delete_dsi_spl_item_with_spid(g_dsi, spid),
+             "delete_dsi_spl_item_with_spid error code: 0x%x");
   TRY_LOG_AS(caller, dsi_add_sp_aik(g_dsi, spid, pubkey, pubkey_len, "RSA"),
              "dsi_add_sp_aik to sync dsi in mem fail error code: 0x%x");
   return TEE_SUCCESS;

@@ -18,7 +18,8 @@
 [[nodiscard]] TEE_Result make_aik(const char *caller, box_ptr *box, uint8_t **pubkey,
                                   uint32_t *pubkey_len);
 
-/// Adds the key to the in-memory DSI.
+/// Makes the key the SP's only one in the in-memory DSI, where a renewed key stands, or one that an
+/// earlier attempt announced and never stored.
 [[nodiscard]] TEE_Result announce_aik(const char *caller, const char *spid, const uint8_t *pubkey,
                                       uint32_t pubkey_len);
 

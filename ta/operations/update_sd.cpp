@@ -63,8 +63,6 @@ static TEE_Result renew_aik(const char *caller, const char *spid, const char *sp
 
   box_ptr box;
   TRY(make_aik(caller, &box, pubkey, pubkey_len));
-  TRY_LOG_AS(caller, delete_dsi_spl_item_with_spid(g_dsi, spid),
-             "delete_dsi_spl_item_with_spid error code: 0x%x");
   TRY(announce_aik(caller, spid, *pubkey, *pubkey_len));
   secret_text encoded_box;
   TRY(encode_aik(caller, box.get(), out(encoded_box)));

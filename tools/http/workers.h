@@ -30,13 +30,6 @@ class Workers {
     has_changed_.notify_one();
   }
 
-  /// Forgets the jobs that nobody has begun with.
-  void drop_waiting() {
-    std::deque<Job> dropped;
-    const std::lock_guard guard(lock_);
-    std::swap(dropped, jobs_);
-  }
-
   /// Returns when the jobs are done. Nothing can be submitted afterwards.
   void finish() {
     {
