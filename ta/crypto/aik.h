@@ -9,7 +9,7 @@
 #include "crypto/tlv_box.h"
 #include "platform.h"
 
-/// A box, not serialized yet, with a new 2048-bit key pair.
+/// Makes a key pair of kRsaKeyBits bits. The box is open: it can still be added to.
 [[nodiscard]] TEE_Result generate_aik(tlv_box **box);
 
 /// The SP's key box. OTRP_MISSING without a spid or when the record holds no key,
@@ -21,7 +21,7 @@
 /// a code of the storage, or OTRP_NO_MEMORY for a record or key that could not be taken apart.
 [[nodiscard]] TEE_Result find_aik(const char *spid, tlv_box **box, TEE_Result *doubt);
 
-/// The SP's AIK as a new key-pair object; codes as above.
+/// What the SP's box holds, ready for use by the platform; codes as above.
 [[nodiscard]] TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key);
 
 /// Its public half, encoded, in a new buffer; codes as above.

@@ -4,7 +4,8 @@
 /// The encoders make NUL-terminated texts, the standard one padded with "=", the URL one not. The
 /// decoders make bytes, without a NUL behind them but where it is said. They are lenient: a
 /// character outside their alphabet is skipped wherever it stands, padding included, and so is a
-/// last character alone; bits that are left over are dropped. The URL decoders know both alphabets.
+/// last character alone; bits that are left over are dropped. What the standard alphabet has in
+/// place of "-" and "_" a URL decoder takes as well.
 ///
 /// Encoding takes the same time for all bytes of a length.
 #ifndef BASE64_H

@@ -15,7 +15,7 @@ struct key_component {
   uint32_t attribute;
 };
 
-// In the order in which they are put into a box and given to the platform.
+// Boxes are filled, and the platform is given them, in this order.
 const key_component kComponents[] = {
     {kRsaModulus, TEE_ATTR_RSA_MODULUS},
     {kRsaPublicExponent, TEE_ATTR_RSA_PUBLIC_EXPONENT},
@@ -185,7 +185,7 @@ TEE_Result parse_key_tlv_box_to_encoded_pubkey(const tlv_box *box, uint8_t **enc
   CHECK(modulus && modulus_len != 0 && exponent && exponent_len != 0, OTRP_MISSING,
         "get_rsa_pubkey_from_tlv return NULL");
 
-  // Record values are at most 65535 bytes: the sum cannot wrap.
+  // A record says its length in 16 bits: the sum cannot wrap.
   const uint32_t len = 4 + modulus_len + 4 + exponent_len;
   uint8_t *bytes = allocate_bytes(len);
   CHECK(bytes != nullptr, OTRP_NO_MEMORY, "allocate data_buf out of mem");

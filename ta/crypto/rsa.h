@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// RSA keys as TLV boxes and as encoded public keys, and the RSA operations on key objects.
 ///
-/// A key box holds these records; values are the attribute's bytes, big-endian:
+/// A key box holds these records, numbers of a key in big-endian as the platform has them:
 ///
-///     0x10 key size in bits (4 bytes, little-endian)
+///     0x10 key size in bits (a word, little-endian)
 ///     0x11 modulus    0x12 public exponent    0x13 private exponent
 ///     0x14 first prime    0x15 second prime    0x16, 0x17 CRT exponents    0x18 CRT coefficient
 ///
@@ -43,7 +43,7 @@ void free_rsa_key_object(TEE_ObjectHandle key);
 /// A new box, not serialized yet, with the key pair's records.
 [[nodiscard]] TEE_Result serialize_rsa_key_to_tlv(TEE_ObjectHandle key, tlv_box **box);
 
-/// The key pair of a box as a new key object, or NULL.
+/// Makes a key object of what a box holds; NULL when that is no key pair.
 TEE_ObjectHandle deserialize_rsa_key_from_tlv(const tlv_box *box);
 
 /// New copies of modulus and exponent. TEE_ERROR_NO_DATA (logged) without a box or out-pointer,
@@ -63,7 +63,7 @@ TEE_ObjectHandle deserialize_rsa_key_from_tlv(const tlv_box *box);
 [[nodiscard]] TEE_Result rsa_decrypt(TEE_ObjectHandle key, const uint8_t *input, uint32_t input_len,
                                      uint8_t **output, uint32_t *output_len);
 
-/// RSASSA-PKCS1-v1_5 with SHA-256 (RFC 8017, 8.2) over the parts in array order.
+/// RSASSA-PKCS1-v1_5 with SHA-256 (RFC 8017, 8.2) of the parts as if they stood behind each other.
 /// `*signature_len` is the capacity of `signature`, then the signature's length.
 [[nodiscard]] TEE_Result sha_compute_signature(TEE_ObjectHandle key, const data_part *parts,
                                                uint32_t num_parts, uint8_t *signature,

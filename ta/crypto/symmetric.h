@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// AES-GCM, AES-CBC with PKCS#7 padding, HMAC-SHA256, digests and random bytes on byte buffers.
+/// What the platform does with operation objects, as calls on byte buffers: AES in GCM and in CBC
+/// (padded by PKCS#7), HMAC and digests of SHA-256, random bytes.
 ///
 /// A call is a whole operation from a key in bytes to new buffers, and leaves nothing behind in the
 /// platform. Codes: TEE_ERROR_BAD_PARAMETERS for a missing out-pointer, TEE_ERROR_OUT_OF_MEMORY,
@@ -19,10 +20,10 @@ constexpr uint32_t kSha256Len = 32;
 constexpr uint32_t T_LEN =
     16;  // tag of A128CBC-HS256: the first half of the HMAC (RFC 7518, 5.2.3)
 
-/// An AES key object holding `key`, or NULL (logged). The caller frees it.
+/// A key object of `key`, the caller's to free. NULL, and a line in the log, when it is no AES key.
 TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len);
 
-/// Ciphertext as long as the plaintext, and a 16-byte tag.
+/// The ciphertext, of the length of `plain`, and kGcmTagLen bytes of tag.
 [[nodiscard]] TEE_Result aes_gcm_encrypt(const uint8_t *key, uint32_t key_len, const uint8_t *iv,
                                          uint32_t iv_len, const uint8_t *aad, uint32_t aad_len,
                                          const uint8_t *plain, uint32_t plain_len, uint8_t **cipher,
@@ -74,7 +75,7 @@ TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len);
 [[nodiscard]] TEE_Result do_digest_with_sha(uint32_t algorithm, const void *data, uint32_t data_len,
                                             uint8_t *digest, uint32_t *digest_len);
 
-/// The digest over all parts, in array order.
+/// The digest of the parts as if they stood behind each other.
 [[nodiscard]] TEE_Result compute_string_array_digest_with_update(uint32_t algorithm,
                                                                  const data_part *parts,
                                                                  uint32_t num_parts,

@@ -4,11 +4,11 @@
 ///
 ///     type (2 bytes) | length of the value (2 bytes) | value
 ///
-/// Numbers are little-endian. A box has one record of a type at most. It is filled and then
-/// serialized, or parsed; after either it takes no more records. Boxes hold private keys: values
+/// Numbers are little-endian, and a type stands once. A box is filled and then serialized, or
+/// parsed; after either it takes no more records. Boxes hold private keys: values
 /// and buffers are wiped before they are freed.
 ///
-/// Results are 0 or a small negative number; a failure changes nothing.
+/// Results are 0 or one of the numbers below; a failure changes nothing.
 #ifndef TLV_BOX_H
 #define TLV_BOX_H
 
@@ -52,7 +52,7 @@ using box_ptr = owned<tlv_box *, tlv_box_destroy>;
 [[nodiscard]] int tlv_box_put_bytes(tlv_box *box, uint16_t type, const uint8_t *value,
                                     uint32_t len);
 
-/// The record that was put last comes first.
+/// Closes the box. Its records are written from the newest to the oldest.
 [[nodiscard]] int tlv_box_serialize(tlv_box *box);
 
 /// The box's own; NULL before it is serialized.
@@ -72,7 +72,7 @@ tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len);
 [[nodiscard]] int tlv_box_get_bytes(const tlv_box *box, uint16_t type, uint8_t *bytes,
                                     uint32_t *len);
 
-/// `*bytes` receives the box's own copy.
+/// The same without a copy: `*bytes` points into the box, and no longer than it lives.
 [[nodiscard]] int tlv_box_get_bytes_ptr(const tlv_box *box, uint16_t type, const uint8_t **bytes,
                                         uint32_t *len);
 

@@ -25,7 +25,7 @@
 [[nodiscard]] TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out,
                                           uint32_t *out_len);
 
-/// Copies the slice and a NUL to `destination` and returns a new slice of the copy, or NULL.
+/// Puts a slice, and a NUL, into memory that is shared, and says where in a new slice, or NULL.
 jsmn_string *borrow_share_memory(void *destination, const jsmn_string *slice);
 
 /// Wipes such a copy.

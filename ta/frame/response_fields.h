@@ -17,7 +17,7 @@ struct jsmn_object;
 /// "pass" and "content": the object of `content`, with the DSI as its "dsi" when `with_dsi` is
 /// set, encrypted for the TSM `tsmid`. `content` stays the caller's.
 ///
-/// A failure means that there can be no response: OTRP_MISSING without a response object,
+/// After a failure nothing can be sent: OTRP_MISSING without a response object,
 /// OTRP_NO_MEMORY, or the code of the key lookup.
 [[nodiscard]] TEE_Result finish_tbs_msg_status(const char *tsmid, TEE_Result result,
                                                JSON_Object *response, JSON_Value *content,

@@ -2,11 +2,10 @@
 /// Result codes of the agent, and the conventions that every function of it keeps.
 ///
 /// A function returns TEE_SUCCESS or a code that says what went wrong: one of those below or a
-/// code of the platform, passed through unchanged. It hands results out through out-parameters.
-/// After a failure it has handed out nothing: pointers are NULL and lengths 0. A buffer, text or
-/// JSON value that is handed out belongs to the caller. Buffers come from TEE_Malloc and go back
-/// with TEE_Free. Lengths are in bytes and leave out a terminating NUL. Whoever finds a failure
-/// logs it, once.
+/// code of the platform, as it came. Everything else that it yields goes where its caller points:
+/// something new there is the caller's to give back, to TEE_Free or to the owner of its type, and
+/// a call that fails leaves NULL and 0. Lengths are in bytes and leave out a terminating NUL.
+/// Whoever finds a failure logs it, once.
 #ifndef OTRP_RESULT_H
 #define OTRP_RESULT_H
 
@@ -36,7 +35,7 @@ constexpr TEE_Result OTRP_RESPONSE_FAILED = 0xDEAD000E;
 constexpr TEE_Result OTRP_CA_CHECK_FAILED = 0xDEAD0010;
 /// A TA record lacks a member.
 constexpr TEE_Result OTRP_TA_INFO_INCOMPLETE = 0xDEAD1001;
-/// No memory, or a value that cannot be built, decoded or parsed.
+/// No memory, or something that did not come out: a text, a document, a key.
 constexpr TEE_Result OTRP_NO_MEMORY = 0xDEAD1002;
 /// The stored SD list is not what it should be.
 constexpr TEE_Result OTRP_SD_LIST_BROKEN = 0xDEAD1003;

@@ -4,7 +4,7 @@
 #ifndef RECORD_NAMES_H
 #define RECORD_NAMES_H
 
-#define SD_LIST_ID "SD_LIST_ID"                 // the names of all SDs, in their order
+#define SD_LIST_ID "SD_LIST_ID"                 // which SDs there are, by name
 #define SD_INFO_PREFIX "SD_INFO_"               // an SD, by its name
 #define SP_INFO_PREFIX "SP_INFO_"               // an SP with its AIK, by its ID
 #define TA_INFO_PREFIX "TA_INFO_"               // a TA, by its ID

@@ -93,9 +93,9 @@ static TEE_Result find_or_add_aik(const char *caller, const char *spid, const ch
   return add_aik(caller, spid, spcert, pubkey, pubkey_len);
 }
 
-// Creates security domain `sdname` for SP `spid`; an SP without an AIK gets one.
+// The work of the message: the SD, and an AIK where `spid` has none.
 //
-// `spcert` is stored only with a new SP. `*pubkey` receives the encoded AIK public key.
+// `spcert` is stored only with a new SP. `*pubkey` receives the AIK's encoded public half.
 // OTRP_SD_EXISTS when the name is taken. Writes SP record, SD record, SD list, in this order;
 // earlier writes survive a failure.
 static TEE_Result create_sd(const char *spid, const char *sdname, const char *spcert,

@@ -10,7 +10,7 @@
 
 namespace {
 
-// Members that nobody sets are sent empty.
+// All of it is sent, also what a message has no use for.
 const char kContentTemplate[] =
     "{\"reason\":{},\"did\":\"\",\"sdname\":\"\",\"cert\":\"\",\"teespaik\":\"\","
     "\"teespaiktype\":\"\",\"dsi\":{}}";

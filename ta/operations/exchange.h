@@ -78,8 +78,8 @@ struct exchange {
 /// when the content is no object and the message does not say so.
 [[nodiscard]] TEE_Result decrypt_content(exchange *x, const JSON_Object **members);
 
-/// Puts the outcome into the response and hands it out as a text. TEE_SUCCESS when there is one,
-/// whether it says "pass" or "fail".
+/// Puts the outcome into the response and hands it out as a text. TEE_SUCCESS when there is a text,
+/// be the outcome good or bad.
 [[nodiscard]] TEE_Result close_response(exchange *x, TEE_Result result, char **response);
 
 /// A copy of the member `key` of the request, NULL when it has none.

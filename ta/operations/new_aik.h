@@ -14,7 +14,7 @@
 [[nodiscard]] TEE_Result read_public_half(const char *caller, const tlv_box *box, uint8_t **pubkey,
                                           uint32_t *pubkey_len);
 
-/// A fresh key pair and its encoded public key.
+/// Makes the key: a box that can still be serialized, and what the world may see of it.
 [[nodiscard]] TEE_Result make_aik(const char *caller, box_ptr *box, uint8_t **pubkey,
                                   uint32_t *pubkey_len);
 

@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// Brings an SD's entry in the in-memory DSI up to its stored record.
+/// Lets the DSI show an SD as it is stored now.
 #ifndef REFRESH_SD_H
 #define REFRESH_SD_H
 
 #include "failure.h"
 #include "state/dsi.h"
 
-/// Removes the entry and loads it again, so that it ends up last. A failure of the second step
-/// leaves the SD out of the DSI. Logs under the name of the operation `caller`.
+/// Takes the entry out and makes a new one, the last, from the record. When that cannot be made the
+/// DSI is without the SD until the next instance. Logs under the name of the operation `caller`.
 [[nodiscard]] inline TEE_Result refresh_sd_in_dsi(const char *caller, const char *sdname) {
   TRY_LOG_AS(caller, remove_g_dsi_sdl_item_by_sdname(sdname),
              "remove_g_dsi_sdl_item_by_sdname fail error code: 0x%x");

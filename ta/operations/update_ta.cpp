@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// UpdateTA: replaces the image and the version of an installed TA.
+// UpdateTA: a newer image of a TA that its security domain has already.
 #include "failure.h"
 #include "operations/install_ta.h"
 #include "operations/operations.h"

@@ -53,7 +53,7 @@ static uint32_t len_of(const char *text) {
 
 // ---- Authentication tag of A128CBC-HS256
 
-// AAD, IV, ciphertext and AL, the number of AAD bits as a 64-bit big-endian integer.
+// AAD, IV, ciphertext and AL, the length of the AAD in bits (8 bytes, big-endian).
 static TEE_Result make_mac_input(const char *caller, const uint8_t *aad, uint32_t aad_len,
                                  const uint8_t *cipher, uint32_t cipher_len, const uint8_t *iv,
                                  uint32_t iv_len, tee_ptr<uint8_t> *input, uint32_t *input_len) {

@@ -174,8 +174,8 @@ TEE_Result verify_decode_by_name(request_context *context) {
   const tee_ptr<char> tsmid(jsmn_string_dup(parts.tsmid->data, parts.tsmid->len));
   CHECK(tsmid, OTRP_NO_MEMORY, "tsmid_copy is null no memory");
 
-  // A TSM's first GetDeviceState is verified with a key that it delivers itself: the chain has to
-  // be admitted first, which each of its keys earns by the CA-TSM key's signature alone.
+  // The key to this signature may come in this very message: the chain has to be admitted first,
+  // which each of its keys earns by the CA's signature alone.
   if (strcmp(context->request_name, kGetDeviceStateRequest) == 0) {
     TRY(admit_key_chain(__func__, parts.payload.get()));
   }

@@ -45,8 +45,8 @@
 char *construct_json_signature(const char *name, const char *payload, const char *protect,
                                JSON_Value *header, TEE_ObjectHandle key);
 
-/// The encode stage: writes the envelope of `response` to `destination`, without a terminator.
-/// `*len` is the capacity, which must exceed the envelope's length, and then that length.
+/// Puts `response` into a signed envelope at `destination`, where no NUL follows it. `*len` is the
+/// capacity, which must exceed the envelope's length, and then that length.
 [[nodiscard]] TEE_Result sign_encode_by_name_with_key(const char *response, const char *name,
                                                       uint8_t *destination, uint32_t *len,
                                                       TEE_ObjectHandle key);

@@ -29,7 +29,7 @@ struct jsmn_object;
 /// something is not there; OTRP_NO_MEMORY when something does not decode; a storage code.
 [[nodiscard]] TEE_Result handle_tsm_key_chain(const char *payload);
 
-/// Checks one entry of "tsm_list" against the CA-TSM key.
+/// Whether the CA has signed this entry of a chain; codes as above.
 [[nodiscard]] TEE_Result verify_tsm_pub_key(const JSON_Object *entry);
 
 [[nodiscard]] TEE_Result save_tsm_pub_key_to_persistent_object(const char *tsmid,
@@ -39,8 +39,9 @@ struct jsmn_object;
 /// record without data gives TEE_SUCCESS and no key.
 [[nodiscard]] TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key);
 
-/// Checks that the CA has approved this image for this device and transaction: "signature2" of the
-/// message, over tid, rid, device ID, taid and tsmid. `tbs` is the to-be-signed request object.
+/// Checks that the CA has approved this image for this device and transaction: it has signed the
+/// texts tid, rid, device ID, taid and tsmid, one behind the other, as "signature2" of `request`.
+/// `tbs` has the first two.
 [[nodiscard]] TEE_Result verify_tsm_installta_updateta_signature(const jsmn_object *tbs,
                                                                  const char *tsmid,
                                                                  const char *taid,
@@ -48,12 +49,12 @@ struct jsmn_object;
 
 // ---- The steps
 
-/// Modulus and exponent of an encoded key, in new buffers. OTRP_NO_MEMORY when it ends too early.
+/// Takes an encoded key apart, into new buffers. OTRP_NO_MEMORY when it ends too early.
 [[nodiscard]] TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_len,
                                                     uint8_t **n, uint32_t *n_len, uint8_t **e,
                                                     uint32_t *e_len);
 
-/// New RSA public-key objects, or NULL: the CA-TSM key, and one from modulus and exponent.
+/// Key objects, or NULL: of the key that the build decided on, and of any other.
 TEE_ObjectHandle convert_ca_tsm_to_pubkey();
 TEE_ObjectHandle convert_tsm_n_e_to_pubkey(const uint8_t *n, uint32_t n_len, const uint8_t *e,
                                            uint32_t e_len);

@@ -329,7 +329,7 @@ static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
   }
 }
 
-// The digest covers the base64 characters, not the document's text.
+// What a TSM hashes is what it got: the document in base64.
 static TEE_Result digest_dsi(const char *caller, uint8_t *digest, uint32_t digest_len) {
   const json_text text(dsi_serialize_to_json());
   CHECK_AS(caller, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");

@@ -3,13 +3,13 @@
 /// AIK of every SP. It is not stored: it is rebuilt from the records when the instance starts and
 /// then edited in step with them.
 ///
-/// At rest it is three compact JSON texts (`dsi_json_str_t`). Every operation parses them into a
-/// working form (`dsi_t`), edits that and converts it back; a change counts only once the
-/// conversion back has succeeded, and a failed one leaves the DSI as it was. Entries are
+/// At rest it is three compact JSON texts (`dsi_json_str_t`), which take less of the heap than
+/// trees. An edit is made on trees of its own (`dsi_t`) and comes into force when their new texts
+/// are there, all of them; until then the DSI is what it was. Entries are
 ///
 ///     SD:   {"name", "spid", "talist"}          AIK:   {"spaik", "spaiktype", "spid"}
 ///
-/// with at most one AIK entry for an SP. Removing an entry moves the last one into its place.
+/// with at most one AIK entry for an SP. Where an entry is removed, the list's last one goes.
 #ifndef DSI_H
 #define DSI_H
 
@@ -104,7 +104,7 @@ JSON_Value *construct_dsi();
 /// OTRP_MISSING when no entry has that name.
 [[nodiscard]] TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname);
 
-/// Succeeds also when no entry has that name.
+/// The same, but there need not be one.
 [[nodiscard]] TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname);
 
 #endif

@@ -11,8 +11,8 @@
 /// NULL argument, a limit; it changes nothing and is not logged. An edit needs no memory but for
 /// the value that it adds. All memory is wiped before it is freed.
 ///
-/// Limits: a parsed value lies at most 19 containers deep; an object holds at most 960 members, an
-/// array at most 122880 elements. No function needs stack that grows with a document.
+/// Limits: 19 containers around a parsed value, 960 members in an object, 122880 elements in an
+/// array. No function needs stack that grows with a document.
 #ifndef JSON_H
 #define JSON_H
 
@@ -40,7 +40,7 @@ void json_value_free(JSON_Value *value);
 
 using json_ptr = owned<JSON_Value *, json_value_free>;
 
-// ---- Views: NULL when the value is of another type or not there
+// ---- Views: NULL for what is not there, or is something else
 
 JSON_Object *json_value_get_object(const JSON_Value *value);
 JSON_Array *json_value_get_array(const JSON_Value *value);

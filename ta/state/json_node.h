@@ -16,7 +16,7 @@
 
 #include "state/json.h"
 
-constexpr uint32_t kMaxDepth = 19;  // containers that a parsed value may lie in
+constexpr uint32_t kMaxDepth = 19;  // containers around a parsed value
 constexpr uint32_t kMaxMembers = 960;
 constexpr uint32_t kMaxElements = 122880;
 

@@ -3,7 +3,7 @@
 ///
 /// An object's data stream is
 ///
-///     length N (4 bytes, little-endian) | N bytes of payload | leftovers of a longer payload
+///     N (a word, little-endian) | N bytes of payload | what is left of a longer one
 ///
 /// A save writes over what is there and cuts nothing off, so N alone says where the payload ends.
 /// This is the one place that knows the platform's storage; nothing stays open behind a call.
@@ -25,8 +25,8 @@
                                                         const char *id, uint32_t id_len,
                                                         bool overwrite);
 
-/// The payload in a new buffer, with a NUL behind it that is not counted. `*len` is less than the
-/// stored length when the object is shorter than it says. An object without a whole length prefix
+/// The payload in a new buffer, with a NUL behind it that is not counted. `*len` is what was really
+/// there, when the object ends before its payload should. An object without a whole length prefix
 /// is no failure: `*data` is NULL then, and `*len` the number of its bytes, 0 for an empty object.
 [[nodiscard]] TEE_Result allocate_and_load_data_from_persistent_object(const char *id,
                                                                        uint32_t id_len,
@@ -37,7 +37,7 @@
 /// be none of that ID.
 [[nodiscard]] TEE_Result delete_persistent_object(const char *id, uint32_t id_len);
 
-/// `*id` receives a new text, prefix followed by name; NULL when either is NULL or memory ran out.
+/// Joins the two to a new text, NULL when one of them is missing or memory ran out.
 void concat_pobj_name(const char *prefix, const char *name, char **id);
 
 /// The record `prefix` + `name` as a new JSON value.

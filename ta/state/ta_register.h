@@ -5,7 +5,7 @@
 ///
 ///     count (4 bytes, little-endian) | count rows of: taid (32 characters) | digest (32 bytes)
 ///
-/// New rows go to the end; a deletion closes the gap.
+/// The rows stand in the order in which they came, without holes.
 #ifndef TA_REGISTER_H
 #define TA_REGISTER_H
 

@@ -42,14 +42,14 @@ jsmn_object *jsmn_copy_object(const jsmn_object *object);
 /// has NULL `data`, an empty string has not. NULL: no memory.
 jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key);
 
-/// A new object over the value behind `key`; NULL unless that is an object.
+/// The same for an object; NULL when the value is something else.
 jsmn_object *jsmn_object_get_object(const jsmn_object *object, const char *key);
 
 /// Both accept NULL.
 void jsmn_free_string(jsmn_string *slice);
 void jsmn_free_object(jsmn_object *object);
 
-/// A new NUL-terminated copy of `len` characters; NULL when `data` is, or memory ran out.
+/// The characters as a text of the caller's own; NULL for NULL, or for want of memory.
 char *jsmn_string_dup(const char *data, uint32_t len);
 
 using slice_ptr = owned<jsmn_string *, jsmn_free_string>;

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The protocol's JWE objects: the content key RSA1_5-wrapped in the one recipient, while the
-/// protected header says "dir".
+/// The protocol's JWE objects: the one recipient gets the content key by RSA1_5, for all that the
+/// protected header names "dir".
 ///
 ///     {"protect", "recipients": [{"header": {"alg"}, "encrypted_key"}], "iv", "ciphertext", "tag"}
 #ifndef TSM_JWE_H
