@@ -14,24 +14,12 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+const exchange_form kForm = {
     .process = "createsd_process",
     .tbs_request = "CreateSDTBSRequest",
     .tbs_response = "CreateSDTBSResponse",
-    .null_input = "createsd_process input is NULL",
-    .needs_tbs = false,
-    .no_root = "json error response_value %p response_object %p content_resp_value %p\n",
-    .no_root_object = "json error response_value %p response_object %p content_resp_value %p\n",
-    .no_content = "json error response_value %p response_object %p content_resp_value %p\n",
-    .no_content_object = "content_resp_object is null %p\n",
-    .no_response_object = "json error CreateSDTBSResponse %p\n",
-    .no_request = "request_object is null",
-    .ids_failed = nullptr,
-    .no_dsihash = nullptr,
-    .dsihash_failed = nullptr,
-    .content_unreadable = nullptr,
-    .content_no_object = nullptr,
-    .not_serialized = "parse response_json to json string get NULL",
+    .rules = {.needs_content = true},
+    .texts = kPointerTexts,
 };
 
 }  // namespace
@@ -136,7 +124,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   const JSON_Object *content = nullptr;
   TRY(decrypt_content(x, &content));
   x->tsmid = json_object_get_string(content, "tsmid");
-  CHECK_AS(kTexts.process, validate_did(json_object_get_string(content, "did")) == TEE_SUCCESS,
+  CHECK_AS(kForm.process, validate_did(json_object_get_string(content, "did")) == TEE_SUCCESS,
            OTRP_DSI_MISMATCH, "validate did fails");
 
   const char *sdname = json_object_get_string(content, "sdname");
@@ -144,15 +132,15 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   uint32_t pubkey_len = 0;
   TRY(create_sd(json_object_get_string(content, "spid"), sdname,
                 json_object_get_string(content, "spcert"), x->tsmid, out(pubkey), &pubkey_len));
-  CHECK_AS(kTexts.process, pubkey, OTRP_NO_MEMORY, "create sd fail, can not create aik");
+  CHECK_AS(kForm.process, pubkey, OTRP_NO_MEMORY, "create sd fail, can not create aik");
   if (json_object_set_string(x->content, "sdname", sdname) != JSONSuccess) return OTRP_NO_MEMORY;
-  return set_teespaik(kTexts.process, x->content, pubkey.get(), pubkey_len);
+  return set_teespaik(kForm.process, x->content, pubkey.get(), pubkey_len);
 }
 
 TEE_Result createsd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
                             const jsmn_object *) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs);
   return close_response(&x, result, response);
 }

@@ -14,24 +14,12 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+const exchange_form kForm = {
     .process = "deletesd_process",
     .tbs_request = "DeleteSDTBSRequest",
     .tbs_response = "DeleteSDTBSResponse",
-    .null_input = "deletesd_process input is NULL",
-    .needs_tbs = true,
-    .no_root = "json error response_value %p response_object %p\n",
-    .no_root_object = "json error response_value %p response_object %p\n",
-    .no_content = nullptr,
-    .no_content_object = nullptr,
-    .no_response_object = "json error DeleteSDTBSResponse %p\n",
-    .no_request = "request_object is null",
-    .ids_failed = nullptr,
-    .no_dsihash = nullptr,
-    .dsihash_failed = nullptr,
-    .content_unreadable = nullptr,
-    .content_no_object = nullptr,
-    .not_serialized = "parse response_json to json string get NULL",
+    .rules = {.needs_payload = true},
+    .texts = kPointerTexts,
 };
 
 }  // namespace
@@ -146,8 +134,8 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
 
 TEE_Result deletesd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
                             const jsmn_object *) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs);
   return close_response(&x, result, response);
 }

@@ -15,24 +15,12 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+const exchange_form kForm = {
     .process = "deleteta_process",
     .tbs_request = "DeleteTATBSRequest",
     .tbs_response = "DeleteTATBSResponse",
-    .null_input = "deleteta_process input is NULL",
-    .needs_tbs = true,
-    .no_root = "json error response_value %p response_object %p\n",
-    .no_root_object = "json error response_value %p response_object %p\n",
-    .no_content = nullptr,
-    .no_content_object = nullptr,
-    .no_response_object = "json error DeleteTATBSResponse %p\n",
-    .no_request = "request_object is null",
-    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
-    .no_dsihash = nullptr,
-    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
-    .content_unreadable = nullptr,
-    .content_no_object = nullptr,
-    .not_serialized = "parse response_json to json string get NULL",
+    .rules = {.needs_payload = true, .names_step = true},
+    .texts = kPointerTexts,
 };
 
 }  // namespace
@@ -81,23 +69,23 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   TRY(decrypt_content(x, &content));
   x->tsmid = json_object_get_string(content, "tsmid");
   const char *taid = json_object_get_string(content, "taid");
-  TRY_LOG_AS(kTexts.process, delete_ta(x->tsmid, json_object_get_string(content, "sdname"), taid),
+  TRY_LOG_AS(kForm.process, delete_ta(x->tsmid, json_object_get_string(content, "sdname"), taid),
              "delete_ta error code 0x%x");
 
   TRY(add_ids(x));
   const JSON_Status set = json_object_set_string(x->response, "taid", taid);
-  CHECK_AS(kTexts.process, set == JSONSuccess, OTRP_NO_MEMORY,
+  CHECK_AS(kForm.process, set == JSONSuccess, OTRP_NO_MEMORY,
            "json_object_set_string DeleteTATBSResponse taid error code: 0x%x",
            static_cast<unsigned>(set));
-  TRY_LOG_AS(kTexts.process, save_ta_register_info(taid, nullptr, kUnregisterTa),
+  TRY_LOG_AS(kForm.process, save_ta_register_info(taid, nullptr, kUnregisterTa),
              "save_ta_register_info fail error code: 0x%x");
   return TEE_SUCCESS;
 }
 
 TEE_Result deleteta_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
                             const jsmn_object *) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs);
   return close_response(&x, result, response);
 }

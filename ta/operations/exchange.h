@@ -5,8 +5,8 @@
 ///     the message's work   with the steps below, in its own order
 ///     close_response()     the outcome, whatever it was, as a response text
 ///
-/// The steps are alike; their texts and some of their codes are not. Each message states its own
-/// in an `exchange_texts`.
+/// The steps are alike; what they insist on and what they say of a failure is not. Each message
+/// states its own in an `exchange_form`.
 #ifndef EXCHANGE_H
 #define EXCHANGE_H
 
@@ -15,36 +15,71 @@
 #include "state/json.h"
 #include "state/token_reader.h"
 
-/// What a message calls things and says of failures. A NULL text: this message says nothing there.
+/// What a message insists on. A rule that is off leaves it to a later step to find out.
+struct exchange_rules {
+  /// A payload that is no JSON object is like a NULL input: there is no response.
+  bool needs_payload = false;
+  /// Without memory for the response's content the message ends at once, not when it is filled.
+  bool needs_content = false;
+  /// Without memory for looking "dsihash" up: OTRP_BAD_REQUEST. Off: OTRP_NO_MEMORY.
+  bool needs_dsihash = false;
+  /// A "content" that is no JSON: OTRP_NO_MEMORY. Off: OTRP_BAD_REQUEST, from the decryption.
+  bool needs_jwe = false;
+  /// A decrypted content that is no object: OTRP_NO_MEMORY. Off: all of its members are missing.
+  bool needs_members = false;
+  /// A refusal for the IDs or the hash gets a line of the message's own, besides the step's.
+  bool names_step = false;
+};
+
+constexpr exchange_rules kAllRules = {true, true, true, true, true, true};
+
+/// What a message says where messages differ. The rules decide which lines there are, not these: a
+/// text that no rule asks for is never said. None is a format.
 struct exchange_texts {
+  /// For root and content; NULL: one line for both, which shows the pointers to what there is.
+  const char *no_root = nullptr;
+  const char *no_content = nullptr;
+  /// NULL: a line with the object's name and the pointer.
+  const char *no_response = nullptr;
+  const char *no_request = nullptr;
+  const char *no_dsihash = nullptr;
+  const char *no_jwe = nullptr;
+  const char *no_members = nullptr;
+  const char *not_serialized = nullptr;
+};
+
+/// The two dialects: one shows pointers, the other names what was about to be done.
+/// @{
+constexpr exchange_texts kPointerTexts = {
+    .no_request = "request_object is null",
+    .not_serialized = "parse response_json to json string get NULL",
+};
+constexpr exchange_texts kStepTexts = {
+    .no_root = "init response_root_value fail",
+    .no_content = "init content_resp_value fail",
+    .no_response = "init TBSResponse object fail",
+    .no_request = "init TBSRequest_object from TBSRequest_value fail",
+    .no_dsihash = "get dsihash null",
+    .no_jwe = "get enc_content from TBSRequest_object null",
+    .no_members = "get content_object null",
+    .not_serialized = "parse response json to string out of mem",
+};
+/// @}
+
+/// A message's row: what it calls things, what it insists on, what it says.
+struct exchange_form {
   const char *process;       // name of the process function, under which all lines appear
   const char *tbs_request;   // member of the payload that holds the request
   const char *tbs_response;  // member of the response that holds all of it
-  const char *null_input;
-  bool needs_tbs;  // a payload that is no JSON object is a NULL input
-
-  // Of open_response(). Each may use the pointers root value, root object, content value.
-  const char *no_root;
-  const char *no_root_object;
-  const char *no_content;         // NULL: noticed only when the content is needed
-  const char *no_content_object;  // likewise
-  const char *no_response_object;
-
-  const char *no_request;
-  const char *ids_failed;
-  const char *no_dsihash;  // NULL: a header that cannot be made counts as no hash
-  const char *dsihash_failed;
-  const char *content_unreadable;  // NULL: left to the decryption, which says so
-  const char *content_no_object;   // NULL: the members of such a content are all missing
-
-  const char *not_serialized;
+  exchange_rules rules;
+  exchange_texts texts;
 };
 
 /// One message on its way through its handler.
 struct exchange {
-  exchange(const exchange_texts &say, const char *sender) : texts(&say), tsmid(sender) {}
+  exchange(const exchange_form &message, const char *sender) : form(&message), tsmid(sender) {}
 
-  const exchange_texts *texts;
+  const exchange_form *form;
   const char *tsmid;  // for whom the response's content is encrypted: the sender, at first
 
   json_ptr root;                    // the response
@@ -58,7 +93,7 @@ struct exchange {
 
 /// Checks the arguments of a process function and clears `*response`. OTRP_MISSING means that the
 /// process function returns that.
-[[nodiscard]] TEE_Result check_input(const exchange_texts &texts, const jsmn_object *tbs,
+[[nodiscard]] TEE_Result check_input(const exchange_form &form, const jsmn_object *tbs,
                                      char **response);
 
 /// Makes the response's objects. After a failure there will be no response: close_response()
@@ -75,7 +110,7 @@ struct exchange {
 [[nodiscard]] TEE_Result check_dsihash(const exchange &x);
 
 /// Decrypts the request's "content" with the TEE key. `*members` stays the exchange's; it is NULL
-/// when the content is no object and the message does not say so.
+/// when the content is no object and the message does not insist on one.
 [[nodiscard]] TEE_Result decrypt_content(exchange *x, const JSON_Object **members);
 
 /// Puts the outcome into the response and hands it out as a text. TEE_SUCCESS when there is a text,

@@ -19,24 +19,22 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+constexpr exchange_texts kTexts = [] {
+  exchange_texts own = kStepTexts;
+  own.no_response = nullptr;
+  own.no_request = "json_value_get_object InstallTATBSRequest_object is null";
+  own.no_dsihash = "jsmn_object_get_string dsihash is null";
+  own.no_jwe = "json_object_get_value enc_content is null";
+  own.no_members = "json_value_get_object content_object is null";
+  return own;
+}();
+
+const exchange_form kForm = {
     .process = "installta_process",
     .tbs_request = "InstallTATBSRequest",
     .tbs_response = "InstallTATBSResponse",
-    .null_input = "installta_process input is NULL",
-    .needs_tbs = true,
-    .no_root = "init response_root_value fail",
-    .no_root_object = "init response_root_object from response_root_value fail",
-    .no_content = "init content_resp_value fail",
-    .no_content_object = nullptr,
-    .no_response_object = "json error InstallTATBSResponse %p\n",
-    .no_request = "json_value_get_object InstallTATBSRequest_object is null",
-    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
-    .no_dsihash = "jsmn_object_get_string dsihash is null",
-    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
-    .content_unreadable = "json_object_get_value enc_content is null",
-    .content_no_object = "json_value_get_object content_object is null",
-    .not_serialized = "parse response json to string out of mem",
+    .rules = kAllRules,
+    .texts = kTexts,
 };
 
 constexpr uint32_t kImageKeyLen = 32;  // the last 16 bytes are the AES key
@@ -111,7 +109,7 @@ TEE_Result hand_over_image(exchange *x, const char *taid, ta_register_operation 
   image->data = plain->release();
   if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
   const uint8_t *with_header = image->len >= kTaImageHeaderLen ? image->data : nullptr;
-  TRY_LOG_AS(x->texts->process, save_ta_register_info(taid, with_header, operation_code),
+  TRY_LOG_AS(x->form->process, save_ta_register_info(taid, with_header, operation_code),
              "save_ta_register_info fail error code: 0x%x");
   return TEE_SUCCESS;
 }
@@ -172,7 +170,7 @@ static TEE_Result install_ta(const char *sdname, const char *spid, const char *t
 
 static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
                             ta_image *image) {
-  const char *name = kTexts.process;
+  const char *name = kForm.process;
   TRY(open_response(x));
   TRY(open_request(x, tbs));
   TRY(add_ids(x));
@@ -204,8 +202,8 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
 
 TEE_Result installta_process(const char *tsmid, const jsmn_object *tbs, char **response,
                              ta_image *image, const jsmn_object *request) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs, request, image);
   return close_with_image(&x, result, response, image);
 }

@@ -13,24 +13,12 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+const exchange_form kForm = {
     .process = "updatesd_process",
     .tbs_request = "UpdateSDTBSRequest",
     .tbs_response = "UpdateSDTBSResponse",
-    .null_input = "updatesd_process input is NULL",
-    .needs_tbs = true,
-    .no_root = "init response_root_value fail",
-    .no_root_object = "init response_root_object from response_root_value fail",
-    .no_content = "init content_resp_value fail",
-    .no_content_object = "content_resp_object is null %p\n",
-    .no_response_object = "init TBSResponse object fail",
-    .no_request = "init TBSRequest_object from TBSRequest_value fail",
-    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
-    .no_dsihash = "get dsihash null",
-    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
-    .content_unreadable = "get enc_content from TBSRequest_object null",
-    .content_no_object = "get content_object null",
-    .not_serialized = "parse response json to string out of mem",
+    .rules = kAllRules,
+    .texts = kStepTexts,
 };
 
 }  // namespace
@@ -105,25 +93,25 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   const char *spid = json_object_get_string(content, "spid");
   const char *sdname = json_object_get_string(content, "sdname");
   const JSON_Object *changes = json_object_get_object(content, "changes");
-  CHECK_AS(kTexts.process,
+  CHECK_AS(kForm.process,
            x->tsmid != nullptr && spid != nullptr && sdname != nullptr && changes != nullptr,
            OTRP_BAD_REQUEST, "update sd request content some field is NULL");
   TRY(add_ids(x));
 
   tee_ptr<uint8_t> pubkey;
   uint32_t pubkey_len = 0;
-  TRY_LOG_AS(kTexts.process, update_sd(sdname, spid, x->tsmid, changes, out(pubkey), &pubkey_len),
+  TRY_LOG_AS(kForm.process, update_sd(sdname, spid, x->tsmid, changes, out(pubkey), &pubkey_len),
              "update_sd error code 0x%x");
   if (!pubkey) return TEE_SUCCESS;
-  TRY(set_teespaik(kTexts.process, x->content, pubkey.get(), pubkey_len));
+  TRY(set_teespaik(kForm.process, x->content, pubkey.get(), pubkey_len));
   const bool set = json_object_set_string(x->content, "teespaiktype", "RSA") == JSONSuccess;
   return set ? TEE_SUCCESS : OTRP_NO_MEMORY;
 }
 
 TEE_Result updatesd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
                             const jsmn_object *) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs);
   return close_response(&x, result, response);
 }

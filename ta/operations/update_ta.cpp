@@ -10,24 +10,12 @@
 
 namespace {
 
-const exchange_texts kTexts = {
+const exchange_form kForm = {
     .process = "updateta_process",
     .tbs_request = "UpdateTATBSRequest",
     .tbs_response = "UpdateTATBSResponse",
-    .null_input = "updateta_process input is NULL",
-    .needs_tbs = true,
-    .no_root = "init response_root_value fail",
-    .no_root_object = "init response_root_object from response_root_value fail",
-    .no_content = "init content_resp_value fail",
-    .no_content_object = nullptr,
-    .no_response_object = "init TBSResponse object fail",
-    .no_request = "init TBSRequest_object from TBSRequest_value fail",
-    .ids_failed = "add_ver_rid_tid fail error code: 0x%x",
-    .no_dsihash = "get dsihash null",
-    .dsihash_failed = "validate_dsihash fail error code: 0x%x",
-    .content_unreadable = "get enc_content from TBSRequest_object null",
-    .content_no_object = "get content_object null",
-    .not_serialized = "parse response json to string out of mem",
+    .rules = kAllRules,
+    .texts = kStepTexts,
 };
 
 }  // namespace
@@ -53,7 +41,7 @@ static TEE_Result update_ta(const char *sdname, const char *spid, const char *ta
 
 static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
                             ta_image *image) {
-  const char *name = kTexts.process;
+  const char *name = kForm.process;
   TRY(open_response(x));
   TRY(open_request(x, tbs));
   TRY(check_dsihash(*x));
@@ -83,8 +71,8 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
 
 TEE_Result updateta_process(const char *tsmid, const jsmn_object *tbs, char **response,
                             ta_image *image, const jsmn_object *request) {
-  TRY(check_input(kTexts, tbs, response));
-  exchange x(kTexts, tsmid);
+  TRY(check_input(kForm, tbs, response));
+  exchange x(kForm, tsmid);
   const TEE_Result result = carry_out(&x, tbs, request, image);
   return close_with_image(&x, result, response, image);
 }
