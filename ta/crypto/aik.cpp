@@ -10,7 +10,10 @@
 #include "state/object_store.h"
 
 TEE_Result generate_aik(tlv_box **box) {
-  CHECK(box != nullptr, TEE_SUCCESS, "generate_aik input is null");
+  if (box == nullptr) {
+    trace_error(__func__, __LINE__, "generate_aik input is null");
+    return TEE_SUCCESS;
+  }
   *box = nullptr;
 
   key_object key;

@@ -116,8 +116,7 @@ TEE_Result gettainfo_sign_encode(const char *response, uint8_t *destination, uin
   CHECK(spid != nullptr, OTRP_MISSING, "gettainfo_sign_encode cannot found spid in tbs_json");
 
   key_object aik;
-  const TEE_Result found = get_aik_key_handle(spid, out(aik));
-  CHECK(found == TEE_SUCCESS && aik, found, "get_aik_key_handle error code: 0x%x", found);
+  TRY_LOG(get_aik_key_handle(spid, out(aik)), "get_aik_key_handle error code: 0x%x");
   const json_text text(json_serialize_to_string(tbs.get()));
   CHECK(text, OTRP_NO_MEMORY, "tbs_json to json string fail");
   *len = capacity;

@@ -252,8 +252,10 @@ TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key) {
   secret_bytes text;
   const TEE_Result loaded = allocate_and_load_data_from_persistent_object(
       id.get(), static_cast<uint32_t>(strlen(id.get())), &text.data, &text.len);
-  CHECK(loaded == TEE_SUCCESS && text.data != nullptr && text.len != 0, loaded,
-        "read tsm info from persistent object Fail");
+  if (loaded != TEE_SUCCESS || text.data == nullptr || text.len == 0) {
+    trace_error(__func__, __LINE__, "read tsm info from persistent object Fail");
+    return loaded;  // an empty record is no failure
+  }
   secret_bytes encoded;
   encoded.len =
       base64urlDecodeStringRemoveEndZero(reinterpret_cast<const char *>(text.data), &encoded.data);

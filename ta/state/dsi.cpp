@@ -194,16 +194,21 @@ TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Obje
 // An SP has one entry, however many SDs it has.
 static TEE_Result dsi_init_sp(dsi_t *dsi, const char *spid) {
   const TEE_Result judged = judge_sp_exist(dsi->spl, spid);
-  CHECK(judged != TEE_SUCCESS, TEE_SUCCESS, "judge_sp_exist %s", "exist");
-  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist %s", "execution error");
+  if (judged == TEE_SUCCESS) {
+    trace_error(__func__, __LINE__, "judge_sp_exist exist");
+    return TEE_SUCCESS;
+  }
+  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist execution error");
 
   tee_ptr<uint8_t> key;
   uint32_t key_len = 0;
   const TEE_Result result = read_public_aik(spid, out(key), &key_len);
-  CHECK(result != OTRP_SP_NOT_FOUND, TEE_SUCCESS,
-        "init sp_info fail, return success to let tsm to updatesd to create new aik");
-  CHECK(result == TEE_SUCCESS && key && key_len != 0, result,
-        "read_public_aik fail error code 0x%x", result);
+  if (result == OTRP_SP_NOT_FOUND) {
+    trace_error(__func__, __LINE__,
+                "init sp_info fail, return success to let tsm to updatesd to create new aik");
+    return TEE_SUCCESS;
+  }
+  CHECK(result == TEE_SUCCESS, result, "read_public_aik fail error code 0x%x", result);
   return append_aik_entry(__func__, dsi->spl, spid, key.get(), key_len, "RSA");
 }
 

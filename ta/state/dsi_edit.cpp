@@ -41,8 +41,11 @@ TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *
   dsi_ptr working;
   TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
   const TEE_Result judged = judge_sp_exist(working->spl, spid);
-  CHECK(judged != TEE_SUCCESS, TEE_SUCCESS, "judge_sp_exist %s", "exist");
-  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist %s", "execution error");
+  if (judged == TEE_SUCCESS) {
+    trace_error(__func__, __LINE__, "judge_sp_exist exist");
+    return TEE_SUCCESS;
+  }
+  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist execution error");
   TRY(append_aik_entry(__func__, working->spl, spid, key, key_len, spaiktype));
   return close_dsi(__func__, working.get(), dsi);
 }

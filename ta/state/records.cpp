@@ -130,7 +130,10 @@ static TEE_Result fill_template(const char *caller, const char *record,
   *value = nullptr;
   json_ptr document(json_parse_string(record));
   JSON_Object *into = json_value_get_object(document.get());
-  CHECK_AS(caller, into != nullptr, TEE_SUCCESS, "json_parse_string error");
+  if (into == nullptr) {
+    trace_error(caller, __LINE__, "json_parse_string error");
+    return TEE_SUCCESS;
+  }
   for (const text_member &member : members) {
     const JSON_Status set = json_object_set_string(into, member.key, member.value);
     if (set != JSONSuccess) return static_cast<TEE_Result>(set);
