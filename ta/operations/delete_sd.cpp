@@ -26,8 +26,7 @@ const exchange_form kForm = {
 
 static TEE_Result load_json(const char *id, JSON_Value **value) {
   secret_bytes data;
-  TRY(allocate_and_load_data_from_persistent_object(id, static_cast<uint32_t>(strlen(id)),
-                                                    &data.data, &data.len));
+  TRY(load_payload(id, &data));
   if (data.data != nullptr) *value = json_parse_string(reinterpret_cast<const char *>(data.data));
   return TEE_SUCCESS;
 }

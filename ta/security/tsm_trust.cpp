@@ -250,8 +250,7 @@ TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key) {
   concat_pobj_name(TSM_INFO_PREFIX, tsmid, out(id));
   CHECK(id, OTRP_MISSING, "malloc for tsm_info_name Fail");
   secret_bytes text;
-  const TEE_Result loaded = allocate_and_load_data_from_persistent_object(
-      id.get(), static_cast<uint32_t>(strlen(id.get())), &text.data, &text.len);
+  const TEE_Result loaded = load_payload(id.get(), &text);
   if (loaded != TEE_SUCCESS || text.data == nullptr || text.len == 0) {
     trace_error(__func__, __LINE__, "read tsm info from persistent object Fail");
     return loaded;  // an empty record is no failure

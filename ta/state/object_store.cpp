@@ -96,6 +96,35 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
   return TEE_SUCCESS;
 }
 
+TEE_Result load_payload(const char *id, secret_bytes *payload) {
+  return allocate_and_load_data_from_persistent_object(id, static_cast<uint32_t>(strlen(id)),
+                                                       &payload->data, &payload->len);
+}
+
+// `payload->data` stays NULL when the record is missing or empty.
+static TEE_Result load_if_there(const char *id, secret_bytes *payload, const char *as) {
+  const TEE_Result result = load_payload(id, payload);
+  if (result == TEE_SUCCESS && payload->data != nullptr && payload->len != 0) return TEE_SUCCESS;
+  trace_error(as, __LINE__, "read persistent object error, error code: %x", result);
+  const bool cut_short = payload->data == nullptr && payload->len != 0;
+  payload->reset();
+  if (result == TEE_SUCCESS && cut_short) return TEE_ERROR_BAD_FORMAT;
+  return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
+}
+
+TEE_Result load_or_create(const char *id, const data_part &initial, const char *not_created,
+                          secret_bytes *payload, const char *as) {
+  TRY(load_if_there(id, payload, as));
+  if (payload->data != nullptr) return TEE_SUCCESS;
+  trace_error(as, __LINE__, "no persistent object named %s, creating it", id);
+  const TEE_Result saved = save_data_to_persistent_object(initial.data, initial.len, id,
+                                                          static_cast<uint32_t>(strlen(id)), true);
+  CHECK_AS(as, saved == TEE_SUCCESS || not_created == nullptr, saved, "%s", not_created);
+  TRY(saved);
+  TRY(load_if_there(id, payload, as));
+  return payload->data != nullptr ? TEE_SUCCESS : TEE_ERROR_ITEM_NOT_FOUND;
+}
+
 TEE_Result delete_persistent_object(const char *id, uint32_t id_len) {
   // An open call with such an ID would make the platform panic.
   CHECK(id_len <= TEE_OBJECT_ID_MAX_LEN, TEE_ERROR_BAD_PARAMETERS,
@@ -133,9 +162,8 @@ static TEE_Result read_json(const char *caller, const char *prefix, const char *
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
   CHECK_AS(caller, id, OTRP_NO_MEMORY, "No memory for sd_pobj_name");
-  const auto id_len = static_cast<uint32_t>(strlen(id.get()));
   secret_bytes data;
-  TRY(allocate_and_load_data_from_persistent_object(id.get(), id_len, &data.data, &data.len));
+  TRY(load_payload(id.get(), &data));
   if (data.len == 0) return TEE_ERROR_ITEM_NOT_FOUND;
   if (data.data != nullptr) *value = json_parse_string(reinterpret_cast<char *>(data.data));
   return *value != nullptr ? TEE_SUCCESS : OTRP_NO_MEMORY;

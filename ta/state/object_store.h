@@ -13,6 +13,8 @@
 
 #include <stdint.h>
 
+#include "data_part.h"
+#include "ownership.h"
 #include "platform.h"
 #include "state/json.h"
 
@@ -32,6 +34,17 @@
                                                                        uint32_t id_len,
                                                                        uint8_t **data,
                                                                        uint32_t *len);
+
+/// The same for an ID that is a text.
+[[nodiscard]] TEE_Result load_payload(const char *id, secret_bytes *payload);
+
+/// The same for a record that everyone expects: one that is missing or empty is created first, with
+/// the payload `initial`; `not_created`, unless it is NULL, is what is said when that fails. Any
+/// other failure leaves the record alone, since creating it would lose what is in it. So does
+/// TEE_ERROR_BAD_FORMAT, for one without a whole length prefix.
+[[nodiscard]] TEE_Result load_or_create(const char *id, const data_part &initial,
+                                        const char *not_created, secret_bytes *payload,
+                                        const char *as = __builtin_FUNCTION());
 
 /// TEE_ERROR_ITEM_NOT_FOUND when there is no such object, TEE_ERROR_BAD_PARAMETERS when there can
 /// be none of that ID.

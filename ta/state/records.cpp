@@ -41,35 +41,13 @@ bool can_be_stored(const char *text) {
 
 // ---- SD list
 
-// `*data` stays NULL when the list is missing or empty.
-static TEE_Result load_sd_list(const char *caller, secret_bytes *data) {
-  const TEE_Result result = allocate_and_load_data_from_persistent_object(
-      SD_LIST_ID, text_len(SD_LIST_ID), &data->data, &data->len);
-  if (result == TEE_SUCCESS && data->len != 0 && data->data != nullptr) return TEE_SUCCESS;
-  trace_error(caller, __LINE__, "read persistent object error, error code: %x", result);
-  const bool cut_short = data->data == nullptr && data->len != 0;
-  data->reset();
-  // Only a list that is not there may get its default: any other failure would lose every SD.
-  if (result == TEE_SUCCESS && cut_short) return TEE_ERROR_BAD_FORMAT;
-  return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
-}
-
-static TEE_Result load_or_create_sd_list(const char *caller, secret_bytes *data) {
-  TRY(load_sd_list(caller, data));
-  if (data->data != nullptr) return TEE_SUCCESS;
-  trace_error(caller, __LINE__, "no persistent object named %s, creating it", SD_LIST_ID);
-  TRY(save_text(kDefaultSdList, SD_LIST_ID));
-  TRY(load_sd_list(caller, data));
-  return data->data != nullptr ? TEE_SUCCESS : TEE_ERROR_ITEM_NOT_FOUND;
-}
-
 TEE_Result get_sd_list_json_array(JSON_Array **array, JSON_Object **object, JSON_Value **value) {
   *array = nullptr;
   *object = nullptr;
   *value = nullptr;
 
   secret_bytes data;
-  TRY(load_or_create_sd_list(__func__, &data));
+  TRY(load_or_create(SD_LIST_ID, text_part(kDefaultSdList), nullptr, &data));
   json_ptr document(json_parse_string(reinterpret_cast<const char *>(data.data)));
   CHECK(document, OTRP_SD_LIST_BROKEN, "json_parse_string null pointer, %p",
         static_cast<void *>(document.get()));

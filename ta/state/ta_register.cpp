@@ -43,33 +43,10 @@ static uint8_t *read_ta_bin_ta_hash(const uint8_t *ta_image) {
 
 // ---- The stored table
 
-// `payload->data` stays NULL when the table is missing or empty.
-static TEE_Result load_payload(const char *caller, secret_bytes *payload) {
-  const TEE_Result result = allocate_and_load_data_from_persistent_object(
-      TA_REGISTER_ID, kRegisterIdLen, &payload->data, &payload->len);
-  if (result == TEE_SUCCESS && payload->data != nullptr && payload->len != 0) return TEE_SUCCESS;
-  trace_error(caller, __LINE__, "read persistent object error, error code: %x", result);
-  const bool cut_short = payload->data == nullptr && payload->len != 0;
-  payload->reset();
-  // Only a table that is not there may be created: any other failure would lose every row.
-  if (result == TEE_SUCCESS && cut_short) return TEE_ERROR_BAD_FORMAT;
-  return result == TEE_ERROR_ITEM_NOT_FOUND ? TEE_SUCCESS : result;
-}
-
-static TEE_Result load_or_create_payload(const char *caller, secret_bytes *payload) {
-  TRY(load_payload(caller, payload));
-  if (payload->data != nullptr) return TEE_SUCCESS;
-  trace_error(caller, __LINE__, "no persistent object named %s, creating it", TA_REGISTER_ID);
-  const uint8_t no_rows[kCountLen] = {};
-  const TEE_Result saved =
-      save_data_to_persistent_object(no_rows, kCountLen, TA_REGISTER_ID, kRegisterIdLen, true);
-  CHECK_AS(caller, saved == TEE_SUCCESS, saved, "can not init ta_register_info %s", TA_REGISTER_ID);
-  TRY(load_payload(caller, payload));
-  return payload->data != nullptr ? TEE_SUCCESS : TEE_ERROR_ITEM_NOT_FOUND;
-}
-
 static TEE_Result load_table(const char *caller, table *rows) {
-  TRY(load_or_create_payload(caller, &rows->payload));
+  const uint8_t no_rows[kCountLen] = {};
+  TRY(load_or_create(TA_REGISTER_ID, {no_rows, kCountLen},
+                     "can not init ta_register_info " TA_REGISTER_ID, &rows->payload, caller));
   const uint32_t len = rows->payload.len;
   const uint32_t num_rows = len < kCountLen ? UINT32_MAX : get_u32(rows->payload.data);
   CHECK_AS(caller, len >= kCountLen && num_rows <= (len - kCountLen) / kRowLen,
