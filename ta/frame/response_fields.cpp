@@ -32,13 +32,6 @@ TEE_Result add_ver_rid_tid(JSON_Object *response, const jsmn_object *tbs) {
 
 // ---- status
 
-// Hands `value` over to `into`.
-static JSON_Status set_owned(JSON_Object *into, const char *key, json_ptr *value) {
-  const JSON_Status set = json_object_set_value(into, key, value->get());
-  if (set == JSONSuccess) (void)value->release();
-  return set;
-}
-
 static TEE_Result set_failed(const char *caller, TEE_Result result, JSON_Object *response) {
   json_ptr reason(json_parse_string(kReasonTemplate));
   CHECK_AS(caller, reason, OTRP_NO_MEMORY, "construct reason json object but get null");
@@ -48,7 +41,7 @@ static TEE_Result set_failed(const char *caller, TEE_Result result, JSON_Object 
   JSON_Status set = json_object_set_number(members, "error_code", static_cast<double>(result));
   CHECK_AS(caller, set == JSONSuccess, OTRP_NO_MEMORY, "json_object_set_value fail error code: %d",
            set);
-  set = set_owned(response, "reason", &reason);
+  set = json_object_take(response, "reason", &reason);
   CHECK_AS(caller, set == JSONSuccess, OTRP_NO_MEMORY,
            "json_object_set_value reason fail error code: %d", set);
   set = json_object_set_string(response, "status", "fail");
@@ -63,7 +56,7 @@ static TEE_Result add_dsi(const char *caller, JSON_Object *content) {
   json_ptr dsi(
       json_value_deep_copy(json_object_get_value(json_value_get_object(document.get()), "dsi")));
   CHECK_AS(caller, dsi, OTRP_NO_MEMORY, "deep copy dsi.dsi fail out of mem");
-  const JSON_Status set = set_owned(content, "dsi", &dsi);
+  const JSON_Status set = json_object_take(content, "dsi", &dsi);
   CHECK_AS(caller, set == JSONSuccess, OTRP_NO_MEMORY,
            "json_object_set_value dsi fail error code: %d", set);
   return TEE_SUCCESS;
@@ -83,7 +76,7 @@ static TEE_Result set_passed(const char *caller, const char *tsmid, JSON_Object 
   TRY_LOG_AS(caller, get_tsm_pubkey_by_tsmid(tsmid, out(key)),
              "convert_ca_to_pubkey error code: 0x%x");
   json_ptr encrypted(encrypt_json(key.get(), content, JWE_HEADER_A128CBC_HS256));
-  set = encrypted ? set_owned(response, "content", &encrypted) : JSONFailure;
+  set = json_object_take(response, "content", &encrypted);
   CHECK_AS(caller, set == JSONSuccess, OTRP_NO_MEMORY,
            "json_object_set_value content fail error code: %d", set);
   return TEE_SUCCESS;

@@ -22,12 +22,6 @@ tee_ptr<char> copy_member(const jsmn_object *from, const char *key) {
   return tee_ptr<char>(slice ? jsmn_string_dup(slice->data, slice->len) : nullptr);
 }
 
-JSON_Status set_owned_value(JSON_Object *into, const char *key, json_ptr *value) {
-  const JSON_Status set = json_object_set_value(into, key, value->get());
-  if (set == JSONSuccess) (void)value->release();
-  return set;
-}
-
 // ---- Opening
 
 TEE_Result check_input(const exchange_form &form, const jsmn_object *tbs, char **response) {
@@ -62,7 +56,7 @@ TEE_Result open_response(exchange *x) {
   TRY(check_objects(*x, root));
 
   json_ptr response(json_value_init_object());
-  if (response && set_owned_value(root, form.tbs_response, &response) == JSONSuccess) {
+  if (json_object_take(root, form.tbs_response, &response) == JSONSuccess) {
     x->response = json_object_get_object(root, form.tbs_response);
   }
   if (x->response != nullptr) return TEE_SUCCESS;

@@ -120,7 +120,4 @@ struct exchange {
 /// A copy of the member `key` of the request, NULL when it has none.
 tee_ptr<char> copy_member(const jsmn_object *from, const char *key);
 
-/// Hands `value` over to `into`.
-[[nodiscard]] JSON_Status set_owned_value(JSON_Object *into, const char *key, json_ptr *value);
-
 #endif

@@ -17,7 +17,7 @@ static TEE_Result add_edsi(const char *tsmid, JSON_Object *response) {
         "convert_ca_to_pubkey error code: 0x%x", found);
   json_ptr jwe(dsi ? encrypt_json(key.get(), dsi.get(), JWE_HEADER_A128CBC_HS256) : nullptr);
   CHECK(jwe, OTRP_RESPONSE_FAILED, "encrypt_json error");
-  return static_cast<TEE_Result>(set_owned_value(response, "edsi", &jwe));
+  return static_cast<TEE_Result>(json_object_take(response, "edsi", &jwe));
 }
 
 TEE_Result getdevstat_process(const char *tsmid, const jsmn_object *tbs, char **response,

@@ -89,7 +89,7 @@ TEE_Result gettainfo_process(const char *, const jsmn_object *tbs, char **respon
   JSON_Object *root_object = json_value_get_object(root.get());
   json_ptr inner(json_value_init_object());
   JSON_Object *information = nullptr;
-  if (root && inner && set_owned_value(root_object, "TAInformationTBS", &inner) == JSONSuccess) {
+  if (json_object_take(root_object, "TAInformationTBS", &inner) == JSONSuccess) {
     information = json_object_get_object(root_object, "TAInformationTBS");
   }
 

@@ -135,9 +135,8 @@ static TEE_Result add_ta_to_ta_list(const JSON_Value *sd_info, const char *sdnam
   JSON_Object *members = json_value_get_object(item.get());
   const bool appended = json_object_set_string(members, "taid", taid) == JSONSuccess &&
                         json_object_set_string(members, "taname", taid) == JSONSuccess &&
-                        json_array_append_value(talist, item.get()) == JSONSuccess;
+                        json_array_take(talist, &item) == JSONSuccess;
   CHECK(appended, OTRP_NO_MEMORY, "json_array_append_string talist fail");
-  (void)item.release();
   return save_sd_info_with_json_value(sdname, sd_info);
 }
 

@@ -242,9 +242,7 @@ static bool set_header(JSON_Object *header, uint32_t mode) {
 bool add_signature_header(JSON_Object *envelope, uint32_t mode) {
   json_ptr header(json_value_init_object());
   if (!header || !set_header(json_value_get_object(header.get()), mode)) return false;
-  if (json_object_set_value(envelope, "header", header.get()) != JSONSuccess) return false;
-  (void)header.release();
-  return true;
+  return json_object_take(envelope, "header", &header) == JSONSuccess;
 }
 
 static jsmn_string slice_of(const char *text) {
@@ -300,14 +298,9 @@ char *construct_json_signature(const char *name, const char *payload, const char
       add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
   if (!complete) return nullptr;
   payload_text.reset();
-  if (own_header) {
-    if (json_object_set_value(members, "header", header) != JSONSuccess) return nullptr;
-    (void)own_header.release();
-  }
-  CHECK(
-      json_object_set_value(json_value_get_object(root.get()), name, envelope.get()) == JSONSuccess,
-      nullptr, "set signature_json to response json Fail");
-  (void)envelope.release();
+  if (own_header && json_object_take(members, "header", &own_header) != JSONSuccess) return nullptr;
+  CHECK(json_object_take(json_value_get_object(root.get()), name, &envelope) == JSONSuccess,
+        nullptr, "set signature_json to response json Fail");
   char *text = json_serialize_to_string(root.get());
   CHECK(text != nullptr, nullptr, "response to json string get NULL");
   return text;

@@ -157,22 +157,18 @@ TEE_Result append_aik_entry(const char *caller, JSON_Value *spl, const char *spi
   CHECK_AS(caller, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
            "json_value_get_object teeaiklist_item_object fail");
 
-  const bool filled =
-      json_object_set_string(members, "spaik", spaik.get()) == JSONSuccess &&
-      json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
-      json_object_set_string(members, "spid", spid) == JSONSuccess &&
-      json_array_append_value(json_value_get_array(spl), entry.get()) == JSONSuccess;
+  const bool filled = json_object_set_string(members, "spaik", spaik.get()) == JSONSuccess &&
+                      json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
+                      json_object_set_string(members, "spid", spid) == JSONSuccess &&
+                      json_array_take(json_value_get_array(spl), &entry) == JSONSuccess;
   CHECK_AS(caller, filled, TEE_ERROR_OUT_OF_MEMORY, "set dsi->spl fail");
-  (void)entry.release();  // the list owns it now
   return TEE_SUCCESS;
 }
 
 static bool copy_text_member(JSON_Object *entry, const JSON_Object *record, const char *key) {
   if (json_object_get_string(record, key) == nullptr) return true;
   json_ptr copy(json_value_deep_copy(json_object_get_value(record, key)));
-  if (!copy || json_object_set_value(entry, key, copy.get()) != JSONSuccess) return false;
-  (void)copy.release();
-  return true;
+  return json_object_take(entry, key, &copy) == JSONSuccess;
 }
 
 TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Object *record) {
@@ -184,10 +180,9 @@ TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Obje
   if (has_talist) {
     talist.reset(json_value_deep_copy(json_object_get_value(record, "talist")));
   }
-  CHECK_AS(caller, talist && json_object_set_value(entry, "talist", talist.get()) == JSONSuccess,
+  CHECK_AS(caller, json_object_take(entry, "talist", &talist) == JSONSuccess,
            TEE_ERROR_OUT_OF_MEMORY,
            "json_value_deep_copy talist from sd object fail, no mem for copy");
-  (void)talist.release();
   return TEE_SUCCESS;
 }
 
@@ -224,11 +219,8 @@ static TEE_Result dsi_init_sd_by_name(dsi_t *dsi, const char *sdname) {
 
   TRY(dsi_init_sp(dsi, spid));
   TRY(fill_sd_entry(__func__, json_value_get_object(entry.get()), members));
-  if (json_array_append_value(json_value_get_array(dsi->sdl), entry.get()) != JSONSuccess) {
-    return TEE_ERROR_OUT_OF_MEMORY;
-  }
-  (void)entry.release();
-  return TEE_SUCCESS;
+  const JSON_Status added = json_array_take(json_value_get_array(dsi->sdl), &entry);
+  return added == JSONSuccess ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
 }
 
 static TEE_Result dsi_init_from_pobj(dsi_t *dsi) {
@@ -268,10 +260,7 @@ static TEE_Result set_copy(const char *caller, JSON_Object *into, const char *ke
                            const JSON_Value *list, const char *no_memory) {
   json_ptr copy(json_value_deep_copy(list));
   CHECK_AS(caller, copy, TEE_ERROR_OUT_OF_MEMORY, "%s", no_memory);
-  const JSON_Status set = json_object_set_value(into, key, copy.get());
-  if (set != JSONSuccess) return static_cast<TEE_Result>(set);
-  (void)copy.release();
-  return TEE_SUCCESS;
+  return static_cast<TEE_Result>(json_object_take(into, key, &copy));
 }
 
 static TEE_Result fill_sdlist_info(JSON_Object *tee, const JSON_Value *sdl) {

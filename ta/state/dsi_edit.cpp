@@ -87,10 +87,7 @@ static TEE_Result load_sd(const char *caller, dsi_json_str_t *dsi, const char *s
   CHECK_AS(caller, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
            sdname != nullptr ? sdname : "(null)");
   TRY(fill_sd_entry(caller, members, json_value_get_object(record.get())));
-  const JSON_Status appended =
-      json_array_append_value(json_value_get_array(working->sdl), entry.get());
-  if (appended != JSONSuccess) return static_cast<TEE_Result>(appended);
-  (void)entry.release();
+  TRY(static_cast<TEE_Result>(json_array_take(json_value_get_array(working->sdl), &entry)));
   return close_dsi(caller, working.get(), dsi);
 }
 

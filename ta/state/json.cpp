@@ -375,6 +375,18 @@ JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
   return JSONSuccess;
 }
 
+JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value) {
+  const JSON_Status set = json_object_set_value(object, name, value->get());
+  if (set == JSONSuccess) (void)value->release();
+  return set;
+}
+
+JSON_Status json_array_take(JSON_Array *array, json_ptr *value) {
+  const JSON_Status appended = json_array_append_value(array, value->get());
+  if (appended == JSONSuccess) (void)value->release();
+  return appended;
+}
+
 JSON_Status json_array_remove(JSON_Array *array, size_t index) {
   if (index >= json_array_get_count(array)) return JSONFailure;
   const auto at = static_cast<uint32_t>(index);
