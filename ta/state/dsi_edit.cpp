@@ -8,8 +8,14 @@
 #include "state/dsi.h"
 #include "state/object_store.h"
 
-static TEE_Result close_dsi(const char *caller, const dsi_t *working, dsi_json_str_t *dsi) {
-  TRY_LOG_AS(caller, dsi_2_dsi_json_str(working, dsi), "dsi_2_dsi_json_str error code: 0x%x");
+// Has `change` edit the working form of `dsi`, and puts it back unless that fails.
+template <class Change>
+static TEE_Result edit_dsi(const char *as, dsi_json_str_t *dsi, TEE_Result no_memory,
+                           const Change &change) {
+  dsi_ptr working;
+  TRY(open_dsi(as, dsi, no_memory, &working));
+  TRY(change(working.get()));
+  TRY_LOG_AS(as, dsi_2_dsi_json_str(working.get(), dsi), "dsi_2_dsi_json_str error code: 0x%x");
   return TEE_SUCCESS;
 }
 
@@ -33,31 +39,38 @@ static TEE_Result find_entry(const JSON_Array *entries, const char *key, const c
 
 // ---- AIK entries
 
-TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,
+static TEE_Result add_aik(const char *as, JSON_Value *spl, const char *spid, const uint8_t *key,
                           uint32_t key_len, const char *spaiktype) {
-  CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
-        TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
-
-  dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
-  const TEE_Result judged = judge_sp_exist(working->spl, spid);
+  const TEE_Result judged = judge_sp_exist(spl, spid);
   if (judged == TEE_SUCCESS) {
-    trace_error(__func__, __LINE__, "judge_sp_exist exist");
+    trace_error(as, __LINE__, "judge_sp_exist exist");
     return TEE_SUCCESS;
   }
-  CHECK(judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist execution error");
-  TRY(append_aik_entry(__func__, working->spl, spid, key, key_len, spaiktype));
-  return close_dsi(__func__, working.get(), dsi);
+  CHECK_AS(as, judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist execution error");
+  return append_aik_entry(as, spl, spid, key, key_len, spaiktype);
 }
 
-TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
-  dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
-  JSON_Array *entries = json_value_get_array(working->spl);
+TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,
+                          uint32_t key_len, const char *spaiktype) {
+  const char *as = __func__;
+  CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
+        TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
+  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY, [=](dsi_t *working) {
+    return add_aik(as, working->spl, spid, key, key_len, spaiktype);
+  });
+}
+
+static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
+  JSON_Array *entries = json_value_get_array(spl);
   size_t index = 0;
   TRY(find_entry(entries, "spid", spid, &index));
   (void)json_array_remove(entries, index);  // no entry of that index, nothing removed
-  return close_dsi(__func__, working.get(), dsi);
+  return TEE_SUCCESS;
+}
+
+TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
+  return edit_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY,
+                  [=](dsi_t *working) { return remove_aik(working->spl, spid); });
 }
 
 // ---- SD entries
@@ -74,21 +87,20 @@ TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, ui
   return TEE_SUCCESS;
 }
 
-static TEE_Result load_sd(const char *caller, dsi_json_str_t *dsi, const char *sdname) {
-  json_ptr entry(json_value_init_object());
-  CHECK_AS(caller, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
-  JSON_Object *members = json_value_get_object(entry.get());
-  CHECK_AS(caller, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
-           "Bad get item object sdl_item_object\n");
-  dsi_ptr working;
-  TRY(open_dsi(caller, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
-
+// Fills `entry` from the SD's record and appends it.
+static TEE_Result add_sd(const char *as, JSON_Value *sdl, const char *sdname, json_ptr *entry) {
   const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
-  CHECK_AS(caller, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
+  CHECK_AS(as, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
            sdname != nullptr ? sdname : "(null)");
-  TRY(fill_sd_entry(caller, members, json_value_get_object(record.get())));
-  TRY(static_cast<TEE_Result>(json_array_take(json_value_get_array(working->sdl), &entry)));
-  return close_dsi(caller, working.get(), dsi);
+  TRY(fill_sd_entry(as, json_value_get_object(entry->get()), json_value_get_object(record.get())));
+  return static_cast<TEE_Result>(json_array_take(json_value_get_array(sdl), entry));
+}
+
+static TEE_Result load_sd(const char *as, dsi_json_str_t *dsi, const char *sdname) {
+  json_ptr entry(json_value_init_object());
+  CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
+  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY,
+                  [&](dsi_t *working) { return add_sd(as, working->sdl, sdname, &entry); });
 }
 
 TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
@@ -102,35 +114,42 @@ TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname) {
   return TEE_SUCCESS;
 }
 
-TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
-  dsi_ptr working;
-  TRY(open_dsi(__func__, g_dsi, OTRP_NO_MEMORY, &working));
-  JSON_Array *entries = json_value_get_array(working->sdl);
+static TEE_Result remove_sd(const char *as, JSON_Value *sdl, const char *sdname) {
+  JSON_Array *entries = json_value_get_array(sdl);
   size_t index = 0;
   TRY(find_entry(entries, "name", sdname, &index));
-  CHECK(index < json_array_get_count(entries), OTRP_MISSING, "delete dsi sd with name fail");
-  if (json_array_remove(entries, index) != JSONSuccess) return OTRP_NO_MEMORY;
-  return close_dsi(__func__, working.get(), g_dsi);
+  CHECK_AS(as, index < json_array_get_count(entries), OTRP_MISSING, "delete dsi sd with name fail");
+  return json_array_remove(entries, index) == JSONSuccess ? TEE_SUCCESS : OTRP_NO_MEMORY;
 }
 
-TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
-  dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
-  JSON_Array *entries = json_value_get_array(working->sdl);
-  CHECK(entries != nullptr, TEE_ERROR_BAD_FORMAT, "get array from dsi->sdl is NULL");
+TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
+  const char *as = __func__;
+  return edit_dsi(as, g_dsi, OTRP_NO_MEMORY,
+                  [=](dsi_t *working) { return remove_sd(as, working->sdl, sdname); });
+}
 
+// Stricter about the entries on the way, and content when none has the name.
+static TEE_Result remove_sd_if_there(const char *as, JSON_Value *sdl, const char *sdname) {
+  JSON_Array *entries = json_value_get_array(sdl);
+  CHECK_AS(as, entries != nullptr, TEE_ERROR_BAD_FORMAT, "get array from dsi->sdl is NULL");
   const size_t num_entries = json_array_get_count(entries);
   for (size_t i = 0; i < num_entries; ++i) {
     const JSON_Object *entry = json_array_get_object(entries, i);
-    CHECK(entry != nullptr, OTRP_RESPONSE_FAILED, "json_array_get_object idx %u error",
-          static_cast<unsigned>(i));
+    CHECK_AS(as, entry != nullptr, OTRP_RESPONSE_FAILED, "json_array_get_object idx %u error",
+             static_cast<unsigned>(i));
     const char *name = json_object_get_string(entry, "name");
-    CHECK(name != nullptr, OTRP_RESPONSE_FAILED, "json_object_get_string from sdl item is null");
-    if (sdname != nullptr && strcmp(name, sdname) == 0) {
-      CHECK(json_array_remove(entries, i) == JSONSuccess, OTRP_RESPONSE_FAILED,
-            "json array remove object fail");
-      break;
-    }
+    CHECK_AS(as, name != nullptr, OTRP_RESPONSE_FAILED,
+             "json_object_get_string from sdl item is null");
+    if (sdname == nullptr || strcmp(name, sdname) != 0) continue;
+    CHECK_AS(as, json_array_remove(entries, i) == JSONSuccess, OTRP_RESPONSE_FAILED,
+             "json array remove object fail");
+    return TEE_SUCCESS;
   }
-  return close_dsi(__func__, working.get(), dsi);
+  return TEE_SUCCESS;
+}
+
+TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
+  const char *as = __func__;
+  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY,
+                  [=](dsi_t *working) { return remove_sd_if_there(as, working->sdl, sdname); });
 }
