@@ -53,10 +53,10 @@ TEE_Result get_aik_tlv_box_by_spid(const char *spid, tlv_box **box) {
 }
 
 // The first steps of both readers below, with the same texts.
-static TEE_Result load_box(const char *caller, const char *spid, box_ptr *box) {
-  TRY_LOG_AS(caller, get_aik_tlv_box_by_spid(spid, out(*box)),
+static TEE_Result load_box(const char *spid, box_ptr *box, const char *as = __builtin_FUNCTION()) {
+  TRY_LOG_AS(as, get_aik_tlv_box_by_spid(spid, out(*box)),
              "get_aik_tlv_box_by_spid error code: 0x%x");
-  CHECK_AS(caller, *box, OTRP_MISSING, "get_aik_tlv_box_by_spid return NULL");
+  CHECK_AS(as, *box, OTRP_MISSING, "get_aik_tlv_box_by_spid return NULL");
   return TEE_SUCCESS;
 }
 
@@ -66,7 +66,7 @@ TEE_Result get_aik_key_handle(const char *spid, TEE_ObjectHandle *key) {
         "get_aik_key_handle params is null");
 
   box_ptr box;
-  TRY(load_box(__func__, spid, &box));
+  TRY(load_box(spid, &box));
   *key = deserialize_rsa_key_from_tlv(box.get());
   CHECK(*key != TEE_HANDLE_NULL, OTRP_NO_MEMORY, "deserialize_rsa_key_from_tlv get NULL");
   return TEE_SUCCESS;
@@ -79,7 +79,7 @@ TEE_Result read_public_aik(const char *spid, uint8_t **encoded, uint32_t *encode
         OTRP_MISSING, "read_public_aik input is NULL");
 
   box_ptr box;
-  TRY(load_box(__func__, spid, &box));
+  TRY(load_box(spid, &box));
   TRY_LOG(parse_key_tlv_box_to_encoded_pubkey(box.get(), encoded, encoded_len),
           "parse_key_tlv_box_to_encoded_pubkey error code: 0x%x");
   CHECK(*encoded != nullptr && *encoded_len != 0, OTRP_MISSING,

@@ -268,13 +268,13 @@ void decoder<Also>::take_scattered() {
 }
 
 template <const alphabet &Also>
-static uint32_t decode(const char *caller, const char *text, uint32_t len, uint32_t spare,
-                       uint8_t **bytes) {
+static uint32_t decode(const char *text, uint32_t len, uint32_t spare, uint8_t **bytes,
+                       const char *as = __builtin_FUNCTION()) {
   if (text == nullptr) return 0;
   // floor(3 len / 4) + 3 len mod 4, without the product.
   const uint32_t rest = 3 * (len % 4);
   *bytes = allocate_bytes(len / 4 * 3 + rest / 4 + rest % 4 + spare);
-  CHECK_AS(caller, *bytes != nullptr, 0, "decode base64 but not memory");
+  CHECK_AS(as, *bytes != nullptr, 0, "decode base64 but not memory");
   decoder<Also> in = {text, text + len, *bytes};
   in.take_blocks();
   in.take_last_block();
@@ -287,19 +287,19 @@ static uint32_t text_len(const char *text) {
 }
 
 uint32_t base64DecodeStringRemoveEndZero(const char *text, uint8_t **bytes) {
-  return decode<kStandard>(__func__, text, text_len(text), 0, bytes);
+  return decode<kStandard>(text, text_len(text), 0, bytes);
 }
 
 uint32_t base64urlDecodeStringRemoveEndZero(const char *text, uint8_t **bytes) {
-  return decode<kUrl>(__func__, text, text_len(text), 0, bytes);
+  return decode<kUrl>(text, text_len(text), 0, bytes);
 }
 
 uint32_t base64urlDecodeStringRemoveEndZeroV2(const char *text, uint32_t len, uint8_t **bytes) {
-  return decode<kUrl>(__func__, text, len, 0, bytes);
+  return decode<kUrl>(text, len, 0, bytes);
 }
 
 uint32_t base64urlDecodeStringAddEndZeroV2(const char *text, uint32_t len, uint8_t **bytes) {
-  return decode<kUrl>(__func__, text, len, 1, bytes);
+  return decode<kUrl>(text, len, 1, bytes);
 }
 
 uint32_t base64urlDecodePiece(char *text, uint32_t *len, bool is_last, uint8_t *to) {

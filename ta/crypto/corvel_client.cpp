@@ -40,22 +40,22 @@ TEE_Result open_corvel_session(TEE_TASessionHandle *session) {
   return TEE_SUCCESS;
 }
 
-static TEE_Result call_corvel(const char *caller, uint32_t command, uint32_t types,
-                              TEE_Param params[4]) {
+static TEE_Result call_corvel(uint32_t command, uint32_t types, TEE_Param params[4],
+                              const char *as = __builtin_FUNCTION()) {
   corvel_session session;
-  TRY_LOG_AS(caller, open_corvel_session(out(session)),
-             "Failed to open corvel session with 0x%x\n");
+  TRY_LOG_AS(as, open_corvel_session(out(session)), "Failed to open corvel session with 0x%x\n");
   uint32_t origin = 0;
   const TEE_Result result =
       TEE_InvokeTACommand(session.get(), TEE_TIMEOUT_INFINITE, command, types, params, &origin);
-  CHECK_AS(caller, result == TEE_SUCCESS, result,
-           "Failed to invoke command with 0x%x errorOrigin %u\n", result, origin);
+  CHECK_AS(as, result == TEE_SUCCESS, result, "Failed to invoke command with 0x%x errorOrigin %u\n",
+           result, origin);
   return TEE_SUCCESS;
 }
 
 // The key service is not this TA: a length that it reports is believed only within the capacity.
-static TEE_Result accept_length(const char *caller, uint32_t reported, uint32_t *len) {
-  CHECK_AS(caller, reported <= *len, TEE_ERROR_EXCESS_DATA,
+static TEE_Result accept_length(uint32_t reported, uint32_t *len,
+                                const char *as = __builtin_FUNCTION()) {
+  CHECK_AS(as, reported <= *len, TEE_ERROR_EXCESS_DATA,
            "key service reports %u bytes in a buffer of %u", reported, *len);
   *len = reported;
   return TEE_SUCCESS;
@@ -68,11 +68,11 @@ TEE_Result corvel_get_device_id(void *buffer, uint32_t *len) {
   params[0].memref.size = sizeof kEkLabel;
   params[1].memref.buffer = buffer;
   params[1].memref.size = *len;
-  TRY(call_corvel(__func__, kGetDeviceId,
+  TRY(call_corvel(kGetDeviceId,
                   TEE_PARAM_TYPES(TEE_PARAM_TYPE_MEMREF_INPUT, TEE_PARAM_TYPE_MEMREF_OUTPUT,
                                   TEE_PARAM_TYPE_VALUE_OUTPUT, TEE_PARAM_TYPE_NONE),
                   params));
-  return accept_length(__func__, params[2].value.a, len);
+  return accept_length(params[2].value.a, len);
 }
 
 TEE_Result corvel_get_tee_key(void *buffer, uint32_t *len) {
@@ -80,11 +80,11 @@ TEE_Result corvel_get_tee_key(void *buffer, uint32_t *len) {
   TEE_Param params[4] = {};
   params[0].memref.buffer = buffer;
   params[0].memref.size = *len;
-  TRY(call_corvel(__func__, kGetTeeKey,
+  TRY(call_corvel(kGetTeeKey,
                   TEE_PARAM_TYPES(TEE_PARAM_TYPE_MEMREF_OUTPUT, TEE_PARAM_TYPE_VALUE_OUTPUT,
                                   TEE_PARAM_TYPE_NONE, TEE_PARAM_TYPE_NONE),
                   params));
-  return accept_length(__func__, params[1].value.a, len);
+  return accept_length(params[1].value.a, len);
 }
 
 TEE_Result corvel_get_sp_ek_id(char **id) {
@@ -96,7 +96,7 @@ TEE_Result corvel_get_sp_ek_id(char **id) {
   params[0].memref.size = kSpEkIdLen;
   params[2].memref.buffer = kSpEkIdLabel;
   params[2].memref.size = sizeof kSpEkIdLabel;
-  TRY(call_corvel(__func__, kGetSpEkId,
+  TRY(call_corvel(kGetSpEkId,
                   TEE_PARAM_TYPES(TEE_PARAM_TYPE_MEMREF_OUTPUT, TEE_PARAM_TYPE_VALUE_OUTPUT,
                                   TEE_PARAM_TYPE_MEMREF_INPUT, TEE_PARAM_TYPE_NONE),
                   params));
@@ -123,23 +123,23 @@ constexpr uint32_t kNumKeyParts = sizeof(kKeyParts) / sizeof(kKeyParts[0]);
 
 }  // namespace
 
-static TEE_Result copy_key_part(const char *caller, const tlv_box *box, uint32_t type,
-                                secret_bytes *value) {
+static TEE_Result copy_key_part(const tlv_box *box, uint32_t type, secret_bytes *value,
+                                const char *as = __builtin_FUNCTION()) {
   const auto record = static_cast<uint16_t>(type);
   const uint8_t *bytes = nullptr;
   uint32_t capacity = 0;
-  CHECK_AS(caller, tlv_box_get_bytes_ptr(box, record, &bytes, &capacity) == 0,
-           TEE_ERROR_BAD_PARAMETERS, "Get length error for %x\n", type);
-  // A component longer than the key would make the platform panic.
-  CHECK_AS(caller, capacity <= kRsaKeyBits / 8, TEE_ERROR_BAD_PARAMETERS,
+  CHECK_AS(as, tlv_box_get_bytes_ptr(box, record, &bytes, &capacity) == 0, TEE_ERROR_BAD_PARAMETERS,
            "Get length error for %x\n", type);
+  // A component longer than the key would make the platform panic.
+  CHECK_AS(as, capacity <= kRsaKeyBits / 8, TEE_ERROR_BAD_PARAMETERS, "Get length error for %x\n",
+           type);
   value->data = allocate_bytes(capacity);
-  CHECK_AS(caller, value->data != nullptr, TEE_ERROR_OUT_OF_MEMORY,
-           "Fail to allocate memory for %x\n", type);
+  CHECK_AS(as, value->data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "Fail to allocate memory for %x\n",
+           type);
   value->len = capacity;
   uint32_t len = capacity;
   const int copied = tlv_box_get_bytes(box, record, value->data, &len);
-  CHECK_AS(caller, copied == 0 && len == capacity, TEE_ERROR_SHORT_BUFFER,
+  CHECK_AS(as, copied == 0 && len == capacity, TEE_ERROR_SHORT_BUFFER,
            "Fail to init attribute for %x, rc=%x, length(%d) capacity(%d)\n", type,
            static_cast<uint32_t>(copied), static_cast<int>(len), static_cast<int>(capacity));
   return TEE_SUCCESS;
@@ -151,7 +151,7 @@ static TEE_Result init_key_param_with_tag(const secret_bytes &key_box,
   const box_ptr box(tlv_box_parse(key_box.data, key_box.len));
   if (!box) return TEE_ERROR_OUT_OF_MEMORY;
   for (uint32_t i = 0; i < kNumKeyParts; ++i) {
-    TRY(copy_key_part(__func__, box.get(), kKeyParts[i].type, &values[i]));
+    TRY(copy_key_part(box.get(), kKeyParts[i].type, &values[i]));
     TEE_InitRefAttribute(&attributes[i], kKeyParts[i].attribute, values[i].data, values[i].len);
   }
   return TEE_SUCCESS;

@@ -19,27 +19,29 @@ TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len) {
 }
 
 // The operation keeps a copy of the key, so the key object need not outlive this stage.
-static TEE_Result start_aes(const char *caller, uint32_t algorithm, TEE_OperationMode mode,
-                            const uint8_t *key, uint32_t key_len, operation *aes) {
-  TRY_LOG_AS(caller, TEE_AllocateOperation(out(*aes), algorithm, mode, key_len * 8),
+static TEE_Result start_aes(uint32_t algorithm, TEE_OperationMode mode, const uint8_t *key,
+                            uint32_t key_len, operation *aes,
+                            const char *as = __builtin_FUNCTION()) {
+  TRY_LOG_AS(as, TEE_AllocateOperation(out(*aes), algorithm, mode, key_len * 8),
              "TEE_AllocateOperation fail for aes 0x%x\n");
   const key_object key_holder(allocate_aes_key(key, key_len));
   if (!key_holder) return TEE_ERROR_GENERIC;
-  TRY_LOG_AS(caller, TEE_SetOperationKey(aes->get(), key_holder.get()),
+  TRY_LOG_AS(as, TEE_SetOperationKey(aes->get(), key_holder.get()),
              "set operation key error, 0x%x\n");
   return TEE_SUCCESS;
 }
 
 // ---- AES-GCM
 
-static TEE_Result start_gcm(const char *caller, TEE_OperationMode mode, const uint8_t *key,
-                            uint32_t key_len, const uint8_t *iv, uint32_t iv_len,
-                            const uint8_t *aad, uint32_t aad_len, operation *aes) {
-  TRY(start_aes(caller, TEE_ALG_AES_GCM, mode, key, key_len, aes));
+static TEE_Result start_gcm(TEE_OperationMode mode, const uint8_t *key, uint32_t key_len,
+                            const uint8_t *iv, uint32_t iv_len, const uint8_t *aad,
+                            uint32_t aad_len, operation *aes,
+                            const char *as = __builtin_FUNCTION()) {
+  TRY(start_aes(TEE_ALG_AES_GCM, mode, key, key_len, aes, as));
   // The sender chose the nonce; TEE_AEInit panics on an empty one.
-  CHECK_AS(caller, iv_len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
+  CHECK_AS(as, iv_len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
            TEE_ERROR_NOT_SUPPORTED);
-  TRY_LOG_AS(caller, TEE_AEInit(aes->get(), iv, iv_len, kGcmTagLen * 8, 0, 0),
+  TRY_LOG_AS(as, TEE_AEInit(aes->get(), iv, iv_len, kGcmTagLen * 8, 0, 0),
              "aes TEE_AEInit error 0x%x\n");
   TEE_AEUpdateAAD(aes->get(), aad, aad_len);
   return TEE_SUCCESS;
@@ -60,7 +62,7 @@ TEE_Result aes_gcm_encrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   *tag_len = 0;
 
   operation aes;
-  TRY(start_gcm(__func__, TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
+  TRY(start_gcm(TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
 
   tee_ptr<uint8_t> data(allocate_bytes(plain_len));
   CHECK(data, TEE_ERROR_OUT_OF_MEMORY, "No memory for data buf\n");
@@ -94,7 +96,7 @@ TEE_Result aes_gcm_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   *plain_len = 0;
 
   operation aes;
-  TRY(start_gcm(__func__, TEE_MODE_DECRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
+  TRY(start_gcm(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
 
   secret_bytes data;
   if (cipher_len < UINT32_MAX) data.data = allocate_bytes(cipher_len + 1);
@@ -118,24 +120,26 @@ TEE_Result aes_gcm_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
 
 // ---- AES-CBC
 
-static TEE_Result start_cbc(const char *caller, TEE_OperationMode mode, const uint8_t *key,
-                            uint32_t key_len, const uint8_t *iv, uint32_t iv_len, operation *aes) {
-  TRY(start_aes(caller, TEE_ALG_AES_CBC_NOPAD, mode, key, key_len, aes));
+static TEE_Result start_cbc(TEE_OperationMode mode, const uint8_t *key, uint32_t key_len,
+                            const uint8_t *iv, uint32_t iv_len, operation *aes,
+                            const char *as = __builtin_FUNCTION()) {
+  TRY(start_aes(TEE_ALG_AES_CBC_NOPAD, mode, key, key_len, aes, as));
   // The sender chose the IV; TEE_CipherInit panics on a length that is not a block's.
-  CHECK_AS(caller, iv_len == kAesBlockLen, TEE_ERROR_BAD_PARAMETERS, "aes update error 0x%x\n",
+  CHECK_AS(as, iv_len == kAesBlockLen, TEE_ERROR_BAD_PARAMETERS, "aes update error 0x%x\n",
            TEE_ERROR_BAD_PARAMETERS);
   TEE_CipherInit(aes->get(), iv, iv_len);
   return TEE_SUCCESS;
 }
 
 // The whole input in one update and a final step; `*produced` is the capacity of `output` first.
-static TEE_Result run_cbc(const char *caller, TEE_OperationHandle aes, const uint8_t *input,
-                          uint32_t input_len, uint8_t *output, uint32_t *produced) {
+static TEE_Result run_cbc(TEE_OperationHandle aes, const uint8_t *input, uint32_t input_len,
+                          uint8_t *output, uint32_t *produced,
+                          const char *as = __builtin_FUNCTION()) {
   tee_length updated = *produced;
-  TRY_LOG_AS(caller, TEE_CipherUpdate(aes, input, input_len, output, &updated),
+  TRY_LOG_AS(as, TEE_CipherUpdate(aes, input, input_len, output, &updated),
              "aes update error 0x%x\n");
   tee_length rest = *produced - updated;
-  TRY_LOG_AS(caller, TEE_CipherDoFinal(aes, nullptr, 0, output + updated, &rest),
+  TRY_LOG_AS(as, TEE_CipherDoFinal(aes, nullptr, 0, output + updated, &rest),
              "aes final error 0x%x\n");
   *produced = static_cast<uint32_t>(updated + rest);
   return TEE_SUCCESS;
@@ -163,9 +167,9 @@ TEE_Result aes_cbc_encrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   memset(padded.data + plain_len, static_cast<int>(pad), pad);
 
   operation aes;
-  TRY(start_cbc(__func__, TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, &aes));
   uint32_t produced = plain_len + kAesBlockLen;
-  TRY(run_cbc(__func__, aes.get(), padded.data, padded.len, data.get(), &produced));
+  TRY(run_cbc(aes.get(), padded.data, padded.len, data.get(), &produced));
 
   *cipher = data.release();
   *cipher_len = produced;
@@ -188,12 +192,12 @@ TEE_Result aes_cbc_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   data.len = cipher_len + kAesBlockLen;
 
   operation aes;
-  TRY(start_cbc(__func__, TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
   // A part of a block would make the final step panic.
   CHECK(cipher_len % kAesBlockLen == 0, TEE_ERROR_BAD_FORMAT, "aes final error 0x%x\n",
         TEE_ERROR_BAD_FORMAT);
   uint32_t produced = data.len;
-  TRY(run_cbc(__func__, aes.get(), cipher, cipher_len, data.data, &produced));
+  TRY(run_cbc(aes.get(), cipher, cipher_len, data.data, &produced));
   uint32_t unpadded = 0;
   TRY_LOG(remove_pkcs_pading_length(data.data, produced, &unpadded),
           "remove_pkcs_pading_length error 0x%x\n");
@@ -216,7 +220,7 @@ TEE_Result aes_cbc_decrypt_with_update_block(const uint8_t *key, uint32_t key_le
   data.len = buffer_len;
 
   operation aes;
-  TRY(start_cbc(__func__, TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
   CHECK(buffer_len % kAesBlockLen == 0, TEE_ERROR_BAD_FORMAT, "aes update error 0x%x, length: %d\n",
         TEE_ERROR_BAD_FORMAT, static_cast<int>(buffer_len % kAesBlockLen));
   for (uint32_t offset = 0; offset < buffer_len; offset += kAesBlockLen) {
@@ -270,25 +274,25 @@ static TEE_Result populate_hmac_key(TEE_ObjectHandle object, const uint8_t *key,
 }
 
 // `mac` holds kHmacSha256Len bytes. `final_text` is what the caller says of a failed last step.
-static TEE_Result hmac_sha256(const char *caller, const char *final_text, const uint8_t *data,
-                              uint32_t data_len, const uint8_t *key, uint32_t key_len, uint8_t *mac,
-                              uint32_t *mac_len) {
+static TEE_Result hmac_sha256(const char *final_text, const uint8_t *data, uint32_t data_len,
+                              const uint8_t *key, uint32_t key_len, uint8_t *mac, uint32_t *mac_len,
+                              const char *as = __builtin_FUNCTION()) {
   const uint32_t bits = 8 * (key_len < kMinHmacKeyLen ? kMinHmacKeyLen : key_len);
   key_object key_holder;
-  TRY_LOG_AS(caller, TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, bits, out(key_holder)),
+  TRY_LOG_AS(as, TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, bits, out(key_holder)),
              "Failed in TEE_AllocateTransientObject 0x%x\n");
-  TRY_LOG_AS(caller, populate_hmac_key(key_holder.get(), key, key_len),
+  TRY_LOG_AS(as, populate_hmac_key(key_holder.get(), key, key_len),
              "Failed in TEE_PopulateTransientObject 0x%x\n");
 
   operation hmac;
-  TRY_LOG_AS(caller, TEE_AllocateOperation(out(hmac), TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, bits),
+  TRY_LOG_AS(as, TEE_AllocateOperation(out(hmac), TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, bits),
              "Failed in TEE_AllocateOperation 0x%x\n");
-  TRY_LOG_AS(caller, TEE_SetOperationKey(hmac.get(), key_holder.get()),
+  TRY_LOG_AS(as, TEE_SetOperationKey(hmac.get(), key_holder.get()),
              "Failed in TEE_SetOperationKey 0x%x\n");
   TEE_MACInit(hmac.get(), nullptr, 0);
   TEE_MACUpdate(hmac.get(), data, data_len);
   tee_length produced = kHmacSha256Len;
-  TRY_LOG_AS(caller, TEE_MACComputeFinal(hmac.get(), nullptr, 0, mac, &produced), final_text);
+  TRY_LOG_AS(as, TEE_MACComputeFinal(hmac.get(), nullptr, 0, mac, &produced), final_text);
   *mac_len = static_cast<uint32_t>(produced);
   return TEE_SUCCESS;
 }
@@ -301,7 +305,7 @@ TEE_Result Compute_HmacSha256(const uint8_t *data, uint32_t data_len, const uint
   tee_ptr<uint8_t> buffer(allocate_bytes(kHmacSha256Len));
   if (!buffer) return TEE_ERROR_OUT_OF_MEMORY;
   uint32_t produced = 0;
-  TRY(hmac_sha256(__func__, "Failed in TEE_MACCompareFinal 0x%x\n", data, data_len, key, key_len,
+  TRY(hmac_sha256("Failed in TEE_MACCompareFinal 0x%x\n", data, data_len, key, key_len,
                   buffer.get(), &produced));
   CHECK(produced >= T_LEN, TEE_ERROR_BAD_STATE, "mac_len %u is not larger than T_LEN %u", produced,
         T_LEN);
@@ -318,7 +322,7 @@ TEE_Result Verify_HmacSha256(const uint8_t *data, uint32_t data_len, const uint8
   CHECK(real_mac.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for real_mac");
   real_mac.len = kHmacSha256Len;
   uint32_t produced = 0;
-  TRY(hmac_sha256(__func__, "Failed in TEE_MACComputeFinal 0x%x\n", data, data_len, key, key_len,
+  TRY(hmac_sha256("Failed in TEE_MACComputeFinal 0x%x\n", data, data_len, key, key_len,
                   real_mac.data, &produced));
   CHECK(mac_len <= produced && equal_in_constant_time(real_mac.data, mac, mac_len),
         TEE_ERROR_MAC_INVALID, "MAC unmatch");

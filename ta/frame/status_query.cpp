@@ -14,17 +14,18 @@ constexpr uint32_t kHeaderLen = kWordLen + kWordLen;
 }  // namespace
 
 // Looks the TA of a query text up; TEE_SUCCESS when it is recorded.
-static TEE_Result find_ta(const char *caller, const uint8_t *query, uint32_t query_len) {
+static TEE_Result find_ta(const uint8_t *query, uint32_t query_len,
+                          const char *as = __builtin_FUNCTION()) {
   tee_ptr<char> text(reinterpret_cast<char *>(allocate_bytes(query_len + 1)));
   if (text) memcpy(text.get(), query, query_len);
   const json_ptr params(text ? json_parse_string(text.get()) : nullptr);
-  CHECK_AS(caller, params, TEE_ERROR_OUT_OF_MEMORY,
+  CHECK_AS(as, params, TEE_ERROR_OUT_OF_MEMORY,
            "parse input_params to json get NULL, out of memory or input_params format error %s",
            text ? text.get() : "");
   json_ptr ta_info;
   const TEE_Result result = get_ta_info_persistent_object_to_json_value(
       json_object_get_string(json_value_get_object(params.get()), "taid"), out(ta_info));
-  CHECK_AS(caller, result == TEE_SUCCESS, result,
+  CHECK_AS(as, result == TEE_SUCCESS, result,
            "get_ta_info_persistent_object_to_json_value get ta_info error");
   return TEE_SUCCESS;
 }
@@ -54,7 +55,7 @@ TEE_Result os_query_otrp(const void *in, uint32_t in_len, void *out, uint32_t *o
     FAIL(TEE_ERROR_SHORT_BUFFER, "output buffer is too small\n");
   }
 
-  const TEE_Result result = find_ta(__func__, query, len);
+  const TEE_Result result = find_ta(query, len);
   const bool complete = set_answer(json_value_get_object(answer.get()), result == TEE_SUCCESS);
   const json_text text(complete ? json_serialize_to_string(answer.get()) : nullptr);
   CHECK(text, TEE_ERROR_OUT_OF_MEMORY, "json_serialize_to_string response_json_str is NULL");

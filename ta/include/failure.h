@@ -25,22 +25,28 @@
 #define TRY_LOG(call, text) TRY_LOG_AS(__func__, call, text)
 
 /// FAIL, CHECK and TRY_LOG for a stage that logs under the name of the operation it was split from.
+/// That is its last parameter:
+///
+///     static TEE_Result stage(int input, const char *as = __builtin_FUNCTION());
+///
+/// The operation leaves it out, and it is the operation's name; a stage that calls another hands
+/// its own `as` on.
 /// @{
-#define FAIL_AS(name, code, ...)              \
-  do {                                        \
-    trace_error(name, __LINE__, __VA_ARGS__); \
-    return (code);                            \
+#define FAIL_AS(as, code, ...)              \
+  do {                                      \
+    trace_error(as, __LINE__, __VA_ARGS__); \
+    return (code);                          \
   } while (0)
 
-#define CHECK_AS(name, cond, code, ...)            \
-  do {                                             \
-    if (!(cond)) FAIL_AS(name, code, __VA_ARGS__); \
+#define CHECK_AS(as, cond, code, ...)            \
+  do {                                           \
+    if (!(cond)) FAIL_AS(as, code, __VA_ARGS__); \
   } while (0)
 
-#define TRY_LOG_AS(name, call, text)                    \
-  do {                                                  \
-    const TEE_Result r_ = (call);                       \
-    if (r_ != TEE_SUCCESS) FAIL_AS(name, r_, text, r_); \
+#define TRY_LOG_AS(as, call, text)                    \
+  do {                                                \
+    const TEE_Result r_ = (call);                     \
+    if (r_ != TEE_SUCCESS) FAIL_AS(as, r_, text, r_); \
   } while (0)
 /// @}
 

@@ -33,52 +33,52 @@ static TEE_Result validate_did(const char *did) {
 
 // What the records could not give back, or the next instance could not start with, must not get
 // into them. Missing texts are found by the functions that need them.
-static TEE_Result check_texts(const char *caller, const char *spid, const char *sdname,
-                              const char *tsmid) {
-  CHECK_AS(caller, spid == nullptr || spid[0] != 0, OTRP_MISSING, "create sd fail, spid is empty");
-  CHECK_AS(caller, can_be_stored(spid) && can_be_stored(sdname) && can_be_stored(tsmid),
-           OTRP_NO_MEMORY, "create sd fail, a text cannot be stored");
+static TEE_Result check_texts(const char *spid, const char *sdname, const char *tsmid,
+                              const char *as = __builtin_FUNCTION()) {
+  CHECK_AS(as, spid == nullptr || spid[0] != 0, OTRP_MISSING, "create sd fail, spid is empty");
+  CHECK_AS(as, can_be_stored(spid) && can_be_stored(sdname) && can_be_stored(tsmid), OTRP_NO_MEMORY,
+           "create sd fail, a text cannot be stored");
   return TEE_SUCCESS;
 }
 
 // The DSI is told of a new AIK before it is saved: a save that cannot succeed is found out first.
-static TEE_Result check_sp_record(const char *caller, const char *spid, const char *spcert) {
+static TEE_Result check_sp_record(const char *spid, const char *spcert,
+                                  const char *as = __builtin_FUNCTION()) {
   if (spid == nullptr) return TEE_SUCCESS;  // nothing is announced for no SP
-  CHECK_AS(caller, sizeof(SP_INFO_PREFIX) - 1 + strlen(spid) <= TEE_OBJECT_ID_MAX_LEN,
+  CHECK_AS(as, sizeof(SP_INFO_PREFIX) - 1 + strlen(spid) <= TEE_OBJECT_ID_MAX_LEN,
            TEE_ERROR_BAD_PARAMETERS, "save_sp_info fail error code: 0x%x",
            TEE_ERROR_BAD_PARAMETERS);
-  CHECK_AS(caller, can_be_stored(spcert), OTRP_NO_MEMORY,
-           "create sd fail, a text cannot be stored");
+  CHECK_AS(as, can_be_stored(spcert), OTRP_NO_MEMORY, "create sd fail, a text cannot be stored");
   json_ptr record;
   JSON_Object *object = nullptr;
-  TRY_LOG_AS(caller, init_sp_info(spid, spcert, "", &object, out(record)),
+  TRY_LOG_AS(as, init_sp_info(spid, spcert, "", &object, out(record)),
              "save_sp_info fail error code: 0x%x");
   return TEE_SUCCESS;
 }
 
 // Gives the SP an AIK: in the DSI first, then in a new record.
-static TEE_Result add_aik(const char *caller, const char *spid, const char *spcert,
-                          uint8_t **pubkey, uint32_t *pubkey_len) {
-  TRY(check_sp_record(caller, spid, spcert));
+static TEE_Result add_aik(const char *spid, const char *spcert, uint8_t **pubkey,
+                          uint32_t *pubkey_len, const char *as = __builtin_FUNCTION()) {
+  TRY(check_sp_record(spid, spcert, as));
   box_ptr box;
-  TRY(make_aik(caller, &box, pubkey, pubkey_len));
-  TRY(announce_aik(caller, spid, *pubkey, *pubkey_len));
+  TRY(make_aik(&box, pubkey, pubkey_len, as));
+  TRY(announce_aik(spid, *pubkey, *pubkey_len, as));
   secret_text encoded_box;
-  TRY(encode_aik(caller, box.get(), out(encoded_box)));
-  TRY_LOG_AS(caller, save_sp_info(spid, spcert, encoded_box.get()),
+  TRY(encode_aik(box.get(), out(encoded_box), as));
+  TRY_LOG_AS(as, save_sp_info(spid, spcert, encoded_box.get()),
              "save_sp_info fail error code: 0x%x");
   return TEE_SUCCESS;
 }
 
-static TEE_Result find_or_add_aik(const char *caller, const char *spid, const char *spcert,
-                                  uint8_t **pubkey, uint32_t *pubkey_len) {
+static TEE_Result find_or_add_aik(const char *spid, const char *spcert, uint8_t **pubkey,
+                                  uint32_t *pubkey_len, const char *as = __builtin_FUNCTION()) {
   box_ptr box;
   TEE_Result doubt = TEE_SUCCESS;
   const TEE_Result found = find_aik(spid, out(box), &doubt);
-  if (found == TEE_SUCCESS) return read_public_half(caller, box.get(), pubkey, pubkey_len);
+  if (found == TEE_SUCCESS) return read_public_half(box.get(), pubkey, pubkey_len, as);
   // An AIK that is there but could not be read now must not be replaced.
-  CHECK_AS(caller, doubt == TEE_SUCCESS, doubt, "create sd fail, the aik could not be read");
-  return add_aik(caller, spid, spcert, pubkey, pubkey_len);
+  CHECK_AS(as, doubt == TEE_SUCCESS, doubt, "create sd fail, the aik could not be read");
+  return add_aik(spid, spcert, pubkey, pubkey_len, as);
 }
 
 // The work of the message: the SD, and an AIK where `spid` has none.
@@ -100,12 +100,12 @@ static TEE_Result create_sd(const char *spid, const char *sdname, const char *sp
   TRY_LOG(check_sd_item_exist_in_sd_list(names, sdname, &listed),
           "check_sd_item_exist_in_sd_list fail error code 0x%x");
   CHECK(listed == 0, OTRP_SD_EXISTS, "create sd fail, cause already exist");
-  TRY(check_texts(__func__, spid, sdname, tsmid));
+  TRY(check_texts(spid, sdname, tsmid));
 
   // State changes from here on: SP, SD, list last, so that the list never names a missing SD.
   tee_ptr<uint8_t> key;
   uint32_t key_len = 0;
-  TRY(find_or_add_aik(__func__, spid, spcert, out(key), &key_len));
+  TRY(find_or_add_aik(spid, spcert, out(key), &key_len));
   TRY_LOG(save_sd_info(spid, tsmid, sdname), "save_sd_info error code 0x%x");
   TRY_LOG(add_sd_item_to_sd_list(sdname, names), "add_sd_item_to_sd_list error code 0x%x");
   CHECK(save_sd_list(sd_list.get()) == TEE_SUCCESS, OTRP_NO_MEMORY, "save_sd_list error");
@@ -134,7 +134,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
                 json_object_get_string(content, "spcert"), x->tsmid, out(pubkey), &pubkey_len));
   CHECK_AS(kForm.process, pubkey, OTRP_NO_MEMORY, "create sd fail, can not create aik");
   if (json_object_set_string(x->content, "sdname", sdname) != JSONSuccess) return OTRP_NO_MEMORY;
-  return set_teespaik(kForm.process, x->content, pubkey.get(), pubkey_len);
+  return set_teespaik(x->content, pubkey.get(), pubkey_len, kForm.process);
 }
 
 TEE_Result createsd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,

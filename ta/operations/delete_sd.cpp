@@ -31,21 +31,21 @@ static TEE_Result load_json(const char *id, JSON_Value **value) {
   return TEE_SUCCESS;
 }
 
-static TEE_Result load_sd_list(const char *caller, json_ptr *sd_list) {
+static TEE_Result load_sd_list(json_ptr *sd_list, const char *as = __builtin_FUNCTION()) {
   TRY(load_json(SD_LIST_ID, out(*sd_list)));
-  CHECK_AS(caller, json_value_get_object(sd_list->get()) != nullptr, OTRP_RESPONSE_FAILED,
+  CHECK_AS(as, json_value_get_object(sd_list->get()) != nullptr, OTRP_RESPONSE_FAILED,
            "parse sd list error");
   return TEE_SUCCESS;
 }
 
-static TEE_Result load_sd_info(const char *caller, const char *sdname, tee_ptr<char> *id,
-                               json_ptr *sd_info) {
+static TEE_Result load_sd_info(const char *sdname, tee_ptr<char> *id, json_ptr *sd_info,
+                               const char *as = __builtin_FUNCTION()) {
   concat_pobj_name(SD_INFO_PREFIX, sdname, out(*id));
-  CHECK_AS(caller, *id, OTRP_NO_MEMORY, "no memory for sd_pid");
+  CHECK_AS(as, *id, OTRP_NO_MEMORY, "no memory for sd_pid");
   TRY(load_json(id->get(), out(*sd_info)));
-  CHECK_AS(caller, *sd_info, OTRP_RESPONSE_FAILED, "parse json error sd");
+  CHECK_AS(as, *sd_info, OTRP_RESPONSE_FAILED, "parse json error sd");
   if (json_value_get_object(sd_info->get()) == nullptr) {
-    trace_error(caller, __LINE__, "json_value_get_object sd error");
+    trace_error(as, __LINE__, "json_value_get_object sd error");
   }
   return TEE_SUCCESS;
 }
@@ -90,11 +90,11 @@ static TEE_Result check_dsi_sdl_if_spid_not_exist_delete(const char *spid) {
 // with its last SD, the SP out of the DSI, and deletes the SP record, in this order.
 static TEE_Result delete_sd(const char *tsmid, const char *sdname, bool deleteta) {
   json_ptr sd_list;
-  TRY(load_sd_list(__func__, &sd_list));
+  TRY(load_sd_list(&sd_list));
   TRY(delete_sd_from_list(json_value_get_object(sd_list.get()), sdname));
   tee_ptr<char> id;
   json_ptr sd_info;
-  TRY(load_sd_info(__func__, sdname, &id, &sd_info));
+  TRY(load_sd_info(sdname, &id, &sd_info));
   // The list is saved only now, so that a request from another TSM changes nothing.
   TRY(validate_tsm(sd_info.get(), tsmid));
   TRY(save_sd_list(sd_list.get()));

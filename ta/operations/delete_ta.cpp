@@ -58,7 +58,7 @@ static TEE_Result delete_ta(const char *tsmid, const char *sdname, const char *t
   TRY_LOG(save_sd_info_with_json_value(sdname, sd_info.get()),
           "save_sd_info_with_json_value error code 0x%x");
   TRY_LOG(delete_ta_persistent_object(taid), "delete_ta_persistent_object error code 0x%x");
-  return refresh_sd_in_dsi(__func__, sdname);
+  return refresh_sd_in_dsi(sdname);
 }
 
 static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {

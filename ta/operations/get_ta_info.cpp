@@ -32,34 +32,35 @@ static const char *text_of(const json_ptr &record, const char *key) {
   return json_object_get_string(json_value_get_object(record.get()), key);
 }
 
-static TEE_Result read_request(const char *caller, const jsmn_object *tbs, tee_ptr<char> *spid,
-                               tee_ptr<char> *taid) {
+static TEE_Result read_request(const jsmn_object *tbs, tee_ptr<char> *spid, tee_ptr<char> *taid,
+                               const char *as = __builtin_FUNCTION()) {
   const token_object_ptr request(jsmn_object_get_object(tbs, "GetTAInfoRequest"));
-  CHECK_AS(caller, request, OTRP_BAD_REQUEST, "GetTAInfoRequest is null");
+  CHECK_AS(as, request, OTRP_BAD_REQUEST, "GetTAInfoRequest is null");
   const slice_ptr spid_slice(jsmn_object_get_string(request.get(), "spid"));
   const slice_ptr taid_slice(jsmn_object_get_string(request.get(), "taid"));
-  CHECK_AS(caller, spid_slice && taid_slice, OTRP_BAD_REQUEST, "spid taid input is NULL");
+  CHECK_AS(as, spid_slice && taid_slice, OTRP_BAD_REQUEST, "spid taid input is NULL");
   spid->reset(jsmn_string_dup(spid_slice->data, spid_slice->len));
   taid->reset(jsmn_string_dup(taid_slice->data, taid_slice->len));
-  CHECK_AS(caller, *spid && *taid, OTRP_NO_MEMORY, "spid_copy taid_copy input is NULL");
+  CHECK_AS(as, *spid && *taid, OTRP_NO_MEMORY, "spid_copy taid_copy input is NULL");
   return TEE_SUCCESS;
 }
 
-static TEE_Result read_records(const char *caller, records *from, ta_facts *facts) {
+static TEE_Result read_records(records *from, ta_facts *facts,
+                               const char *as = __builtin_FUNCTION()) {
   TRY_LOG_AS(
-      caller, get_ta_info_persistent_object_to_json_value(facts->taid, out(from->ta_info)),
+      as, get_ta_info_persistent_object_to_json_value(facts->taid, out(from->ta_info)),
       "get_ta_info_persistent_object_to_json_value get ta_info from po fail error code: 0x%x");
   const char *sdid = text_of(from->ta_info, "sdid");
-  CHECK_AS(caller, sdid != nullptr, OTRP_TA_INFO_INCOMPLETE, "read ta_info get sdid is NULL");
+  CHECK_AS(as, sdid != nullptr, OTRP_TA_INFO_INCOMPLETE, "read ta_info get sdid is NULL");
   facts->ta_version = text_of(from->ta_info, "ta_version");
-  CHECK_AS(caller, facts->ta_version != nullptr, OTRP_TA_INFO_INCOMPLETE,
+  CHECK_AS(as, facts->ta_version != nullptr, OTRP_TA_INFO_INCOMPLETE,
            "read ta_info get ta_version is NULL");
   TRY_LOG_AS(
-      caller, get_sd_info_persistent_object_to_json_value(sdid, out(from->sd_info)),
+      as, get_sd_info_persistent_object_to_json_value(sdid, out(from->sd_info)),
       "get_sd_info_persistent_object_to_json_value get sd_info from po fail error code: 0x%x");
   facts->tsmid = text_of(from->sd_info, "tsmid");
   TRY_LOG_AS(
-      caller, get_sp_info_persistent_object_to_json_value(facts->spid, out(from->sp_info)),
+      as, get_sp_info_persistent_object_to_json_value(facts->spid, out(from->sp_info)),
       "get_sp_info_persistent_object_to_json_value get sp_info from po fail error code: 0x%x");
   facts->spcert = text_of(from->sp_info, "spcert");
   return TEE_SUCCESS;
@@ -95,10 +96,10 @@ TEE_Result gettainfo_process(const char *, const jsmn_object *tbs, char **respon
 
   tee_ptr<char> spid;
   tee_ptr<char> taid;
-  TRY(read_request(__func__, tbs, &spid, &taid));
+  TRY(read_request(tbs, &spid, &taid));
   ta_facts facts = {.taid = taid.get(), .spid = spid.get()};
   records stored;
-  TRY(read_records(__func__, &stored, &facts));
+  TRY(read_records(&stored, &facts));
   CHECK(information != nullptr, OTRP_NO_MEMORY, "init TAInformationTBS fail");
   if (!set_facts(information, facts)) return OTRP_NO_MEMORY;
   *response = json_serialize_to_string(root.get());

@@ -43,26 +43,27 @@ constexpr uint32_t kImageKeyLen = 32;  // the last 16 bytes are the AES key
 
 // ---- The image
 
-static TEE_Result decode_member(const char *caller, const jsmn_object *from, const char *key,
-                                const char *missing, const char *undecodable, secret_bytes *bytes) {
+static TEE_Result decode_member(const jsmn_object *from, const char *key, const char *missing,
+                                const char *undecodable, secret_bytes *bytes,
+                                const char *as = __builtin_FUNCTION()) {
   const slice_ptr slice(jsmn_object_get_string(from, key));
-  CHECK_AS(caller, slice, OTRP_NO_MEMORY, "%s", missing);
+  CHECK_AS(as, slice, OTRP_NO_MEMORY, "%s", missing);
   bytes->len = base64urlDecodeStringRemoveEndZeroV2(slice->data, slice->len, &bytes->data);
-  CHECK_AS(caller, bytes->len != 0, OTRP_TA_DECRYPT_FAILED, "%s", undecodable);
+  CHECK_AS(as, bytes->len != 0, OTRP_TA_DECRYPT_FAILED, "%s", undecodable);
   return TEE_SUCCESS;
 }
 
-static TEE_Result unwrap_image_key(const char *caller, const char *spid,
-                                   const jsmn_object *encrypted_ta, secret_bytes *image_key) {
+static TEE_Result unwrap_image_key(const char *spid, const jsmn_object *encrypted_ta,
+                                   secret_bytes *image_key, const char *as = __builtin_FUNCTION()) {
   secret_bytes wrapped;
-  TRY(decode_member(caller, encrypted_ta, "key", "get encrypted_key_encoded is null",
-                    "encrypted_key decode base64url error get null", &wrapped));
+  TRY(decode_member(encrypted_ta, "key", "get encrypted_key_encoded is null",
+                    "encrypted_key decode base64url error get null", &wrapped, as));
   key_object aik;
   TEE_Result result = get_aik_key_handle(spid, out(aik));
-  CHECK_AS(caller, result == TEE_SUCCESS && aik, OTRP_TA_DECRYPT_FAILED,
+  CHECK_AS(as, result == TEE_SUCCESS && aik, OTRP_TA_DECRYPT_FAILED,
            "get_aik_key_handle error code: 0x%x", result);
   result = rsa_decrypt(aik.get(), wrapped.data, wrapped.len, &image_key->data, &image_key->len);
-  CHECK_AS(caller, result == TEE_SUCCESS && image_key->len >= kImageKeyLen, OTRP_TA_DECRYPT_FAILED,
+  CHECK_AS(as, result == TEE_SUCCESS && image_key->len >= kImageKeyLen, OTRP_TA_DECRYPT_FAILED,
            "rsa_decrypt error code: 0x%x", result);
   return TEE_SUCCESS;
 }
@@ -76,12 +77,12 @@ TEE_Result verify_encrypted_ta(const char *field, const char *spid, const jsmn_o
   *digest = nullptr;
 
   secret_bytes image_key;
-  TRY(unwrap_image_key(__func__, spid, encrypted_ta, &image_key));
+  TRY(unwrap_image_key(spid, encrypted_ta, &image_key));
   secret_bytes iv;
-  TRY(decode_member(__func__, encrypted_ta, "iv", "get iv_encoded is null",
+  TRY(decode_member(encrypted_ta, "iv", "get iv_encoded is null",
                     "iv decode base64url error get null", &iv));
   secret_bytes cipher;
-  TRY(decode_member(__func__, encrypted_ta, field, "get ciphertadata_encoded is null",
+  TRY(decode_member(encrypted_ta, field, "get ciphertadata_encoded is null",
                     "ciphertadata decode base64url error get null", &cipher));
   secret_bytes plain;
   const uint32_t cipher_len = cipher.len;
@@ -162,38 +163,37 @@ static TEE_Result install_ta(const char *sdname, const char *spid, const char *t
           "add_ta_to_ta_list fail error code: 0x%x");
   TRY_LOG(save_ta_info_to_persistent_object(spid, sdname, taid, ta_version, false),
           "save_ta_info_to_persistent_object fail error code: 0x%x");
-  return refresh_sd_in_dsi(__func__, sdname);
+  return refresh_sd_in_dsi(sdname);
 }
 
 // ---- The message
 
 static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
                             ta_image *image) {
-  const char *name = kForm.process;
+  const char *as = kForm.process;
   TRY(open_response(x));
   TRY(open_request(x, tbs));
   TRY(add_ids(x));
   TRY(check_dsihash(*x));
   const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
-  CHECK_AS(name, encrypted_ta, OTRP_NO_MEMORY,
-           "jsmn_object_get_object encrypted_ta_object is null");
+  CHECK_AS(as, encrypted_ta, OTRP_NO_MEMORY, "jsmn_object_get_object encrypted_ta_object is null");
   const JSON_Object *content = nullptr;
   TRY(decrypt_content(x, &content));
   const char *spid = json_object_get_string(content, "spid");
   const char *taid = json_object_get_string(content, "taid");
   const char *sdname = json_object_get_string(content, "sdname");
-  CHECK_AS(name, taid != nullptr, OTRP_MISSING, "install_ta fail input is null");
+  CHECK_AS(as, taid != nullptr, OTRP_MISSING, "install_ta fail input is null");
   const TEE_Result verified =
       verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request);
-  CHECK_AS(name, verified == TEE_SUCCESS, verified, "Failed to verify install TA request\n");
+  CHECK_AS(as, verified == TEE_SUCCESS, verified, "Failed to verify install TA request\n");
 
   secret_bytes plain;
   tee_ptr<uint8_t> digest;
-  TRY_LOG_AS(name,
+  TRY_LOG_AS(as,
              verify_encrypted_ta("ciphertadata", spid, encrypted_ta.get(), &plain.data, &plain.len,
                                  out(digest)),
              "verify_encrypted_ta error code: 0x%x");
-  TRY_LOG_AS(name, install_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
+  TRY_LOG_AS(as, install_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "install_ta error code 0x%x");
 
   return hand_over_image(x, taid, kRegisterTa, &plain, image);

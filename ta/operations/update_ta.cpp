@@ -41,7 +41,7 @@ static TEE_Result update_ta(const char *sdname, const char *spid, const char *ta
 
 static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
                             ta_image *image) {
-  const char *name = kForm.process;
+  const char *as = kForm.process;
   TRY(open_response(x));
   TRY(open_request(x, tbs));
   TRY(check_dsihash(*x));
@@ -50,20 +50,19 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   const char *spid = json_object_get_string(content, "spid");
   const char *taid = json_object_get_string(content, "taid");
   const char *sdname = json_object_get_string(content, "sdname");
-  CHECK_AS(name, taid != nullptr, OTRP_MISSING, "update ta fail input is null");
+  CHECK_AS(as, taid != nullptr, OTRP_MISSING, "update ta fail input is null");
   TRY(verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request));
 
   const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
-  CHECK_AS(name, encrypted_ta, OTRP_NO_MEMORY,
-           "jsmn_object_get_object encrypted_ta_object is null");
+  CHECK_AS(as, encrypted_ta, OTRP_NO_MEMORY, "jsmn_object_get_object encrypted_ta_object is null");
   secret_bytes plain;
   tee_ptr<uint8_t> digest;
-  TRY_LOG_AS(name,
+  TRY_LOG_AS(as,
              verify_encrypted_ta("ciphernewtadata", spid, encrypted_ta.get(), &plain.data,
                                  &plain.len, out(digest)),
              "verify_encrypted_ta error code: 0x%x");
   TRY(add_ids(x));
-  TRY_LOG_AS(name, update_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
+  TRY_LOG_AS(as, update_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "update_ta error code 0x%x");
 
   return hand_over_image(x, taid, kUpdateTa, &plain, image);

@@ -54,12 +54,13 @@ static uint32_t len_of(const char *text) {
 // ---- Authentication tag of A128CBC-HS256
 
 // AAD, IV, ciphertext and AL, the length of the AAD in bits (8 bytes, big-endian).
-static TEE_Result make_mac_input(const char *caller, const uint8_t *aad, uint32_t aad_len,
-                                 const uint8_t *cipher, uint32_t cipher_len, const uint8_t *iv,
-                                 uint32_t iv_len, tee_ptr<uint8_t> *input, uint32_t *input_len) {
+static TEE_Result make_mac_input(const uint8_t *aad, uint32_t aad_len, const uint8_t *cipher,
+                                 uint32_t cipher_len, const uint8_t *iv, uint32_t iv_len,
+                                 tee_ptr<uint8_t> *input, uint32_t *input_len,
+                                 const char *as = __builtin_FUNCTION()) {
   const uint64_t len = uint64_t{aad_len} + iv_len + cipher_len + kAlLen;
   if (len <= UINT32_MAX) input->reset(allocate_bytes(static_cast<uint32_t>(len)));
-  CHECK_AS(caller, *input, TEE_ERROR_OUT_OF_MEMORY, "no memory for hmac_input");
+  CHECK_AS(as, *input, TEE_ERROR_OUT_OF_MEMORY, "no memory for hmac_input");
 
   uint8_t *at = input->get();
   memcpy(at, aad, aad_len);
@@ -83,7 +84,7 @@ TEE_Result compute_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint
   if (cek_len < kCbcMacKeyLen) return TEE_ERROR_BAD_PARAMETERS;
   tee_ptr<uint8_t> input;
   uint32_t input_len = 0;
-  TRY(make_mac_input(__func__, aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
+  TRY(make_mac_input(aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
   return Compute_HmacSha256(input.get(), input_len, cek, kCbcMacKeyLen, tag, tag_len);
 }
 
@@ -94,16 +95,16 @@ TEE_Result verify_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint8
   if (cek_len < kCbcMacKeyLen) return TEE_ERROR_BAD_PARAMETERS;
   tee_ptr<uint8_t> input;
   uint32_t input_len = 0;
-  TRY(make_mac_input(__func__, aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
+  TRY(make_mac_input(aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
   return Verify_HmacSha256(input.get(), input_len, cek, kCbcMacKeyLen, tag, tag_len);
 }
 
 // ---- Encryption
 
 static bool set_encoded(JSON_Object *into, const char *key, const uint8_t *bytes, uint32_t len,
-                        const char *caller, const char *failed) {
+                        const char *failed, const char *as = __builtin_FUNCTION()) {
   const tee_ptr<char> text(base64urlEncodeAddEndZero(bytes, len));
-  CHECK_AS(caller, text, false, "%s", failed);
+  CHECK_AS(as, text, false, "%s", failed);
   return json_object_set_string(into, key, text.get()) == JSONSuccess;
 }
 
@@ -124,14 +125,13 @@ JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,
 
   // One text at a time: a ciphertext may be large.
   const bool complete =
-      set_encoded(members, "protect", bytes_of(header), header_len, __func__,
+      set_encoded(members, "protect", bytes_of(header), header_len,
                   "base64url encode protect error") &&
-      set_encoded(recipient, "encrypted_key", encrypted_cek, encrypted_cek_len, __func__,
+      set_encoded(recipient, "encrypted_key", encrypted_cek, encrypted_cek_len,
                   "base64url encode encrypted_cek error") &&
-      set_encoded(members, "iv", iv, iv_len, __func__, "base64url encode iv error") &&
-      set_encoded(members, "ciphertext", cipher, cipher_len, __func__,
-                  "base64url encode ciphertext error") &&
-      set_encoded(members, "tag", tag, tag_len, __func__, "base64url encode tag error");
+      set_encoded(members, "iv", iv, iv_len, "base64url encode iv error") &&
+      set_encoded(members, "ciphertext", cipher, cipher_len, "base64url encode ciphertext error") &&
+      set_encoded(members, "tag", tag, tag_len, "base64url encode tag error");
   return complete ? jwe.release() : nullptr;
 }
 
@@ -194,13 +194,13 @@ JSON_Value *encrypt_json_with_gcm_iv_cek(TEE_ObjectHandle key, const JSON_Value 
                                 iv_len, cipher.get(), cipher_len, tag.get(), tag_len);
 }
 
-static bool draw_iv_and_cek(const char *caller, uint32_t iv_len, uint32_t cek_len, secret_bytes *iv,
-                            secret_bytes *cek) {
+static bool draw_iv_and_cek(uint32_t iv_len, uint32_t cek_len, secret_bytes *iv, secret_bytes *cek,
+                            const char *as = __builtin_FUNCTION()) {
   iv->data = gen_random_bytes(iv_len);
-  CHECK_AS(caller, iv->data != nullptr, false, "gen_random_bytes error for iv");
+  CHECK_AS(as, iv->data != nullptr, false, "gen_random_bytes error for iv");
   iv->len = iv_len;
   cek->data = gen_random_bytes(cek_len);
-  CHECK_AS(caller, cek->data != nullptr, false, "gen_random_bytes error for cek");
+  CHECK_AS(as, cek->data != nullptr, false, "gen_random_bytes error for cek");
   cek->len = cek_len;
   return true;
 }
@@ -209,7 +209,7 @@ JSON_Value *encrypt_json_with_aes_cbc(TEE_ObjectHandle key, const JSON_Value *va
                                       const char *header) {
   secret_bytes iv;
   secret_bytes cek;
-  if (!draw_iv_and_cek(__func__, kCbcIvLen, kCbcCekLen, &iv, &cek)) return nullptr;
+  if (!draw_iv_and_cek(kCbcIvLen, kCbcCekLen, &iv, &cek)) return nullptr;
   return encrypt_json_with_cbc_iv_cek(key, value, iv.data, iv.len, cek.data, cek.len, header,
                                       len_of(header));
 }
@@ -218,7 +218,7 @@ JSON_Value *encrypt_json_with_aes_gcm(TEE_ObjectHandle key, const JSON_Value *va
                                       const char *header) {
   secret_bytes iv;
   secret_bytes cek;
-  if (!draw_iv_and_cek(__func__, kGcmIvLen, kGcmCekLen, &iv, &cek)) return nullptr;
+  if (!draw_iv_and_cek(kGcmIvLen, kGcmCekLen, &iv, &cek)) return nullptr;
   return encrypt_json_with_gcm_iv_cek(key, value, iv.data, iv.len, cek.data, cek.len, header,
                                       len_of(header));
 }
@@ -236,26 +236,28 @@ JSON_Value *encrypt_json(TEE_ObjectHandle key, const JSON_Value *value, const ch
 // ---- Decryption
 
 // The canonical encoding of the decoded header is the AAD.
-static char *encode_aad(const char *caller, const uint8_t *header, uint32_t header_len) {
+static char *encode_aad(const uint8_t *header, uint32_t header_len,
+                        const char *as = __builtin_FUNCTION()) {
   char *aad = base64urlEncodeAddEndZero(header, header_len);
-  CHECK_AS(caller, aad != nullptr, nullptr, "base64urlEncodeAddEndZero protect error");
+  CHECK_AS(as, aad != nullptr, nullptr, "base64urlEncodeAddEndZero protect error");
   return aad;
 }
 
-static bool unwrap_cek(const char *caller, TEE_ObjectHandle key, const uint8_t *encrypted_cek,
-                       uint32_t encrypted_cek_len, uint32_t cek_len, secret_bytes *cek) {
+static bool unwrap_cek(TEE_ObjectHandle key, const uint8_t *encrypted_cek,
+                       uint32_t encrypted_cek_len, uint32_t cek_len, secret_bytes *cek,
+                       const char *as = __builtin_FUNCTION()) {
   const TEE_Result result =
       rsa_decrypt(key, encrypted_cek, encrypted_cek_len, &cek->data, &cek->len);
   if (result != TEE_SUCCESS) return false;
-  CHECK_AS(caller, cek->len == cek_len, false, "the content key has %u bytes, not %u", cek->len,
+  CHECK_AS(as, cek->len == cek_len, false, "the content key has %u bytes, not %u", cek->len,
            cek_len);
   return true;
 }
 
 // `plain` is followed by a zero byte.
-static JSON_Value *parse_plain(const char *caller, const secret_bytes &plain) {
+static JSON_Value *parse_plain(const secret_bytes &plain, const char *as = __builtin_FUNCTION()) {
   JSON_Value *value = json_parse_string(reinterpret_cast<const char *>(plain.data));
-  CHECK_AS(caller, value != nullptr, nullptr, "json_parse_string error");
+  CHECK_AS(as, value != nullptr, nullptr, "json_parse_string error");
   return value;
 }
 
@@ -264,11 +266,10 @@ JSON_Value *decrypt_json_with_aes_cbc(TEE_ObjectHandle key, const uint8_t *ciphe
                                       const uint8_t *encrypted_cek, uint32_t encrypted_cek_len,
                                       const uint8_t *header, uint32_t header_len,
                                       const uint8_t *tag, uint32_t tag_len) {
-  const tee_ptr<char> aad(encode_aad(__func__, header, header_len));
+  const tee_ptr<char> aad(encode_aad(header, header_len));
   if (!aad) return nullptr;
   secret_bytes cek;
-  if (!unwrap_cek(__func__, key, encrypted_cek, encrypted_cek_len, kCbcCekLen, &cek))
-    return nullptr;
+  if (!unwrap_cek(key, encrypted_cek, encrypted_cek_len, kCbcCekLen, &cek)) return nullptr;
   const TEE_Result verified =
       verify_jwe_auth_tag(cek.data, cek.len, bytes_of(aad.get()), len_of(aad.get()), cipher,
                           cipher_len, iv, iv_len, tag, tag_len);
@@ -277,7 +278,7 @@ JSON_Value *decrypt_json_with_aes_cbc(TEE_ObjectHandle key, const uint8_t *ciphe
   const TEE_Result decrypted = aes_cbc_decrypt(get_aes_key_from_cek(cek.data), kAesBlockLen, iv,
                                                iv_len, cipher, cipher_len, &plain.data, &plain.len);
   if (decrypted != TEE_SUCCESS) return nullptr;
-  return parse_plain(__func__, plain);
+  return parse_plain(plain);
 }
 
 JSON_Value *decrypt_json_with_aes_gcm(TEE_ObjectHandle key, const uint8_t *cipher,
@@ -285,60 +286,61 @@ JSON_Value *decrypt_json_with_aes_gcm(TEE_ObjectHandle key, const uint8_t *ciphe
                                       const uint8_t *encrypted_cek, uint32_t encrypted_cek_len,
                                       const uint8_t *header, uint32_t header_len,
                                       const uint8_t *tag, uint32_t tag_len) {
-  const tee_ptr<char> aad(encode_aad(__func__, header, header_len));
+  const tee_ptr<char> aad(encode_aad(header, header_len));
   if (!aad) return nullptr;
   secret_bytes cek;
-  if (!unwrap_cek(__func__, key, encrypted_cek, encrypted_cek_len, kGcmCekLen, &cek))
-    return nullptr;
+  if (!unwrap_cek(key, encrypted_cek, encrypted_cek_len, kGcmCekLen, &cek)) return nullptr;
   secret_bytes plain;
   const TEE_Result decrypted =
       aes_gcm_decrypt(cek.data, cek.len, iv, iv_len, bytes_of(aad.get()), len_of(aad.get()), tag,
                       tag_len, cipher, cipher_len, &plain.data, &plain.len);
   if (decrypted != TEE_SUCCESS) return nullptr;
-  return parse_plain(__func__, plain);
+  return parse_plain(plain);
 }
 
-static bool read_members(const char *caller, const JSON_Object *jwe, jwe_text *text) {
-  CHECK_AS(caller, jwe != nullptr, false, "enc_obj is null in %s", caller);
+static bool read_members(const JSON_Object *jwe, jwe_text *text,
+                         const char *as = __builtin_FUNCTION()) {
+  CHECK_AS(as, jwe != nullptr, false, "enc_obj is null in %s", as);
   text->protect = json_object_get_string(jwe, "protect");
-  CHECK_AS(caller, text->protect != nullptr, false, "protect is null in %s", caller);
+  CHECK_AS(as, text->protect != nullptr, false, "protect is null in %s", as);
   text->iv = json_object_get_string(jwe, "iv");
-  CHECK_AS(caller, text->iv != nullptr, false, "iv is null in %s", caller);
+  CHECK_AS(as, text->iv != nullptr, false, "iv is null in %s", as);
   text->ciphertext = json_object_get_string(jwe, "ciphertext");
-  CHECK_AS(caller, text->ciphertext != nullptr, false, "ciphertext is null in %s", caller);
+  CHECK_AS(as, text->ciphertext != nullptr, false, "ciphertext is null in %s", as);
   text->tag = json_object_get_string(jwe, "tag");
   const JSON_Array *recipients = json_object_get_array(jwe, "recipients");
-  CHECK_AS(caller, recipients != nullptr, false, "recipients is null in %s", caller);
+  CHECK_AS(as, recipients != nullptr, false, "recipients is null in %s", as);
   const JSON_Object *recipient = json_array_get_object(recipients, 0);
-  CHECK_AS(caller, recipient != nullptr, false, "recipient is null in %s", caller);
+  CHECK_AS(as, recipient != nullptr, false, "recipient is null in %s", as);
   const JSON_Object *header = json_object_get_object(recipient, "header");
-  CHECK_AS(caller, header != nullptr, false, "header is null in %s", caller);
-  CHECK_AS(caller, json_object_get_string(header, "alg") != nullptr, false, "alg is null in %s",
-           caller);
+  CHECK_AS(as, header != nullptr, false, "header is null in %s", as);
+  CHECK_AS(as, json_object_get_string(header, "alg") != nullptr, false, "alg is null in %s", as);
   text->encrypted_key = json_object_get_string(recipient, "encrypted_key");
-  CHECK_AS(caller, text->encrypted_key != nullptr, false, "encrypted_cek is null in %s", caller);
+  CHECK_AS(as, text->encrypted_key != nullptr, false, "encrypted_cek is null in %s", as);
   return true;
 }
 
-static bool decode(const char *caller, const char *text, const char *name, secret_bytes *bytes) {
+static bool decode(const char *text, const char *name, secret_bytes *bytes,
+                   const char *as = __builtin_FUNCTION()) {
   bytes->len = base64urlDecodeStringRemoveEndZero(text, &bytes->data);
-  CHECK_AS(caller, bytes->len != 0, false, "%sbase64url decode error %s", name, caller);
+  CHECK_AS(as, bytes->len != 0, false, "%sbase64url decode error %s", name, as);
   return true;
 }
 
-static bool decode_members(const char *caller, const jwe_text &text, jwe_bytes *bytes) {
-  return decode(caller, text.protect, "protect", &bytes->protect) &&
-         decode(caller, text.iv, "iv", &bytes->iv) &&
-         decode(caller, text.ciphertext, "ciphertext", &bytes->ciphertext) &&
-         decode(caller, text.tag, "tag", &bytes->tag) &&
-         decode(caller, text.encrypted_key, "encrypted_cek", &bytes->encrypted_cek);
+static bool decode_members(const jwe_text &text, jwe_bytes *bytes,
+                           const char *as = __builtin_FUNCTION()) {
+  return decode(text.protect, "protect", &bytes->protect, as) &&
+         decode(text.iv, "iv", &bytes->iv, as) &&
+         decode(text.ciphertext, "ciphertext", &bytes->ciphertext, as) &&
+         decode(text.tag, "tag", &bytes->tag, as) &&
+         decode(text.encrypted_key, "encrypted_cek", &bytes->encrypted_cek, as);
 }
 
 JSON_Value *decrypt_json(TEE_ObjectHandle key, const JSON_Value *jwe) {
   jwe_text text = {};
-  if (!read_members(__func__, json_value_get_object(jwe), &text)) return nullptr;
+  if (!read_members(json_value_get_object(jwe), &text)) return nullptr;
   jwe_bytes in;
-  if (!decode_members(__func__, text, &in)) return nullptr;
+  if (!decode_members(text, &in)) return nullptr;
 
   // Also a leading part of the A128GCM header chooses that scheme.
   const bool is_gcm = in.protect.len <= sizeof(kGcmHeader) - 1 &&

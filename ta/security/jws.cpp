@@ -40,37 +40,37 @@ static bool is_present(const slice_ptr &slice) {
 
 // ---- Verification
 
-static TEE_Result read_envelope(const char *caller, const request_context *context,
-                                envelope *parts) {
+static TEE_Result read_envelope(const request_context *context, envelope *parts,
+                                const char *as = __builtin_FUNCTION()) {
   const slice_ptr message(jsmn_init_string());
-  CHECK_AS(caller, message, OTRP_NO_MEMORY, "init root_object_jsmn_string error");
+  CHECK_AS(as, message, OTRP_NO_MEMORY, "init root_object_jsmn_string error");
   message->data = reinterpret_cast<const char *>(context->message);
   message->len = context->message_len;
   parts->root.reset(jsmn_init_object(message.get()));
-  CHECK_AS(caller, parts->root, OTRP_NO_MEMORY,
-           "parse root_object_jsmn_string to root_object error");
+  CHECK_AS(as, parts->root, OTRP_NO_MEMORY, "parse root_object_jsmn_string to root_object error");
   const token_object_ptr request(jsmn_object_get_object(parts->root.get(), context->request_name));
-  CHECK_AS(caller, request, OTRP_BAD_REQUEST, "%s not found", context->request_name);
+  CHECK_AS(as, request, OTRP_BAD_REQUEST, "%s not found", context->request_name);
 
   parts->payload.reset(jsmn_object_get_string(request.get(), "payload"));
-  CHECK_AS(caller, is_present(parts->payload), OTRP_BAD_REQUEST, "get base64 payload error");
+  CHECK_AS(as, is_present(parts->payload), OTRP_BAD_REQUEST, "get base64 payload error");
   parts->protect.reset(jsmn_object_get_string(request.get(), "protect"));
-  CHECK_AS(caller, is_present(parts->protect), OTRP_BAD_REQUEST, "get base64_protect error");
+  CHECK_AS(as, is_present(parts->protect), OTRP_BAD_REQUEST, "get base64_protect error");
   parts->signature.reset(jsmn_object_get_string(request.get(), "signature"));
-  CHECK_AS(caller, is_present(parts->signature), OTRP_BAD_REQUEST, "get base64 signature error");
+  CHECK_AS(as, is_present(parts->signature), OTRP_BAD_REQUEST, "get base64 signature error");
   const token_object_ptr header(jsmn_object_get_object(request.get(), "header"));
-  CHECK_AS(caller, header, OTRP_BAD_REQUEST, "request header is NULL");
+  CHECK_AS(as, header, OTRP_BAD_REQUEST, "request header is NULL");
   parts->tsmid.reset(jsmn_object_get_string(header.get(), "tsmid"));
-  CHECK_AS(caller, is_present(parts->tsmid), OTRP_BAD_REQUEST, "request header get tsmid is NULL");
+  CHECK_AS(as, is_present(parts->tsmid), OTRP_BAD_REQUEST, "request header get tsmid is NULL");
   return TEE_SUCCESS;
 }
 
 // Admits the TSM keys of a GetDeviceState payload, which has not been verified yet.
-static TEE_Result admit_key_chain(const char *caller, const jsmn_string *payload) {
+static TEE_Result admit_key_chain(const jsmn_string *payload,
+                                  const char *as = __builtin_FUNCTION()) {
   secret_bytes decoded;
   decoded.len = base64urlDecodeStringAddEndZeroV2(payload->data, payload->len, &decoded.data);
-  CHECK_AS(caller, decoded.len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
-  TRY_LOG_AS(caller, handle_tsm_key_chain(reinterpret_cast<const char *>(decoded.data)),
+  CHECK_AS(as, decoded.len != 0, OTRP_BAD_REQUEST, "Invalid payload value");
+  TRY_LOG_AS(as, handle_tsm_key_chain(reinterpret_cast<const char *>(decoded.data)),
              "handle_tsm_key_chain error code: 0x%x");
   return TEE_SUCCESS;
 }
@@ -120,22 +120,22 @@ void signing_input::hash_and_decode(const jsmn_string &text, secret_bytes *decod
   }
 }
 
-static TEE_Result digest_signing_input(const char *caller, const jsmn_string *payload,
-                                       const jsmn_string *protect, secret_bytes *decoded,
-                                       uint8_t digest[kSha256Len]) {
+static TEE_Result digest_signing_input(const jsmn_string *payload, const jsmn_string *protect,
+                                       secret_bytes *decoded, uint8_t digest[kSha256Len],
+                                       const char *as = __builtin_FUNCTION()) {
   // Three bytes for four characters, what two or three more give, and a NUL.
   decoded->data = allocate_bytes(payload->len / 4 * 3 + 3);
   signing_input input;
   input.piece.reset(reinterpret_cast<char *>(allocate_bytes(kLeftOverLen + kPieceLen)));
-  CHECK_AS(caller, decoded->data != nullptr && input.piece, TEE_ERROR_OUT_OF_MEMORY,
+  CHECK_AS(as, decoded->data != nullptr && input.piece, TEE_ERROR_OUT_OF_MEMORY,
            "decode base64 but not memory");
-  TRY_LOG_AS(caller, TEE_AllocateOperation(out(input.sha), TEE_ALG_SHA256, TEE_MODE_DIGEST, 0),
+  TRY_LOG_AS(as, TEE_AllocateOperation(out(input.sha), TEE_ALG_SHA256, TEE_MODE_DIGEST, 0),
              "TEE_AllocateOperation failed: %08x\n");
   input.hash_text(*protect);
   TEE_DigestUpdate(input.sha.get(), kDot.data, kDot.len);
   input.hash_and_decode(*payload, decoded);
   tee_length digest_len = kSha256Len;
-  TRY_LOG_AS(caller, TEE_DigestDoFinal(input.sha.get(), nullptr, 0, digest, &digest_len),
+  TRY_LOG_AS(as, TEE_DigestDoFinal(input.sha.get(), nullptr, 0, digest, &digest_len),
              "TEE_DigestDoFinal failed: %08x\n");
   return TEE_SUCCESS;
 }
@@ -146,7 +146,7 @@ bool verify_signature(TEE_ObjectHandle key, const jsmn_string *payload, const js
   bytes.len = base64urlDecodeStringRemoveEndZeroV2(signature->data, signature->len, &bytes.data);
   CHECK(bytes.len != 0, false, "base64urlDecodeStringRemoveEndZero decode length 0");
   uint8_t digest[kSha256Len];
-  TEE_Result result = digest_signing_input(__func__, payload, protect, decoded, digest);
+  TEE_Result result = digest_signing_input(payload, protect, decoded, digest);
   if (result == TEE_SUCCESS) {
     result = sha_verify_digest(key, digest, kSha256Len, bytes.data, bytes.len);
   }
@@ -154,13 +154,14 @@ bool verify_signature(TEE_ObjectHandle key, const jsmn_string *payload, const js
   return true;
 }
 
-static TEE_Result take_whole_message(request_context *context) {
+static TEE_Result take_whole_message(request_context *context,
+                                     const char *as = __builtin_FUNCTION()) {
   secret_bytes payload;
   if (context->message_len < UINT32_MAX) {
     payload.data = allocate_bytes(context->message_len + 1);
   }
-  CHECK_AS("verify_decode_by_name", payload.data != nullptr, OTRP_NO_MEMORY,
-           "no memory for %u bytes of payload", context->message_len);
+  CHECK_AS(as, payload.data != nullptr, OTRP_NO_MEMORY, "no memory for %u bytes of payload",
+           context->message_len);
   memcpy(payload.data, context->message, context->message_len);
   context->payload = payload.release();
   context->payload_len = context->message_len;
@@ -170,14 +171,14 @@ static TEE_Result take_whole_message(request_context *context) {
 TEE_Result verify_decode_by_name(request_context *context) {
   if (strcmp(context->request_name, kGetTaInfoRequest) == 0) return take_whole_message(context);
   envelope parts;
-  TRY(read_envelope(__func__, context, &parts));
+  TRY(read_envelope(context, &parts));
   const tee_ptr<char> tsmid(jsmn_string_dup(parts.tsmid->data, parts.tsmid->len));
   CHECK(tsmid, OTRP_NO_MEMORY, "tsmid_copy is null no memory");
 
   // The key to this signature may come in this very message: the chain has to be admitted first,
   // which each of its keys earns by the CA's signature alone.
   if (strcmp(context->request_name, kGetDeviceStateRequest) == 0) {
-    TRY(admit_key_chain(__func__, parts.payload.get()));
+    TRY(admit_key_chain(parts.payload.get()));
   }
 
   key_object key;
@@ -200,10 +201,11 @@ TEE_Result verify_decode_by_name(request_context *context) {
 
 // ---- Signing
 
-static TEE_Result sign(const char *caller, const jsmn_string *payload, const jsmn_string *protect,
-                       TEE_ObjectHandle key, uint8_t **signature, uint32_t *signature_len) {
+static TEE_Result sign(const jsmn_string *payload, const jsmn_string *protect, TEE_ObjectHandle key,
+                       uint8_t **signature, uint32_t *signature_len,
+                       const char *as = __builtin_FUNCTION()) {
   tee_ptr<uint8_t> buffer(allocate_bytes(kRsaSignatureLen));
-  CHECK_AS(caller, buffer, TEE_ERROR_OUT_OF_MEMORY, "no memory for signature");
+  CHECK_AS(as, buffer, TEE_ERROR_OUT_OF_MEMORY, "no memory for signature");
   uint32_t len = kRsaSignatureLen;
   const data_part parts[] = {{protect->data, protect->len}, kDot, {payload->data, payload->len}};
   TRY(sha_compute_signature(key, parts, kNumSignedParts, buffer.get(), &len));
@@ -218,24 +220,23 @@ TEE_Result sign_with_tee_key(const jsmn_string *payload, const jsmn_string *prot
   *signature_len = 0;
   const key_object key(get_tee_key());
   CHECK(key, TEE_ERROR_GENERIC, "get_tee_key error");
-  return sign(__func__, payload, protect, key.get(), signature, signature_len);
+  return sign(payload, protect, key.get(), signature, signature_len);
 }
 
 TEE_Result sign_with_spaik_key(const jsmn_string *payload, const jsmn_string *protect,
                                uint8_t **signature, uint32_t *signature_len, TEE_ObjectHandle key) {
   *signature = nullptr;
   *signature_len = 0;
-  return sign(__func__, payload, protect, key, signature, signature_len);
+  return sign(payload, protect, key, signature, signature_len);
 }
 
 static bool set_header(JSON_Object *header, uint32_t mode) {
-  const char *caller = "addHeader";
+  const char *as = "addHeader";
   if (json_object_set_string(header, "deviceId", "test_device_id") != JSONSuccess) return false;
   if (mode != kModeWithSpekid) return true;
   tee_ptr<char> sp_ek_id;
   const TEE_Result result = corvel_get_sp_ek_id(out(sp_ek_id));
-  CHECK_AS(caller, result == TEE_SUCCESS, false, "Failed to get SP_EK_ID from CORVEL: 0x%x",
-           result);
+  CHECK_AS(as, result == TEE_SUCCESS, false, "Failed to get SP_EK_ID from CORVEL: 0x%x", result);
   return json_object_set_string(header, "spekid", sp_ek_id.get()) == JSONSuccess;
 }
 
@@ -250,15 +251,16 @@ static jsmn_string slice_of(const char *text) {
 }
 
 // base64url of `text` up to its terminator, as a member of `into`.
-static char *encode_text(const char *caller, const char *text, const char *failed) {
+static char *encode_text(const char *text, const char *failed,
+                         const char *as = __builtin_FUNCTION()) {
   char *encoded = base64urlEncodeAddEndZero(reinterpret_cast<const uint8_t *>(text),
                                             static_cast<uint32_t>(strlen(text)));
-  CHECK_AS(caller, encoded != nullptr, nullptr, "%s", failed);
+  CHECK_AS(as, encoded != nullptr, nullptr, "%s", failed);
   return encoded;
 }
 
-static char *encode_signature(const char *caller, const char *payload, const char *protect,
-                              TEE_ObjectHandle key) {
+static char *encode_signature(const char *payload, const char *protect, TEE_ObjectHandle key,
+                              const char *as = __builtin_FUNCTION()) {
   const jsmn_string payload_slice = slice_of(payload);
   const jsmn_string protect_slice = slice_of(protect);
   tee_ptr<uint8_t> signature;
@@ -269,7 +271,7 @@ static char *encode_signature(const char *caller, const char *payload, const cha
           : sign_with_tee_key(&payload_slice, &protect_slice, out(signature), &len);
   if (result != TEE_SUCCESS) return nullptr;
   char *encoded = base64urlEncodeAddEndZero(signature.get(), len);
-  CHECK_AS(caller, encoded != nullptr, nullptr, "base64url encode signature error");
+  CHECK_AS(as, encoded != nullptr, nullptr, "base64url encode signature error");
   return encoded;
 }
 
@@ -279,13 +281,11 @@ char *construct_json_signature(const char *name, const char *payload, const char
   const json_ptr root(json_value_init_object());
   CHECK(name != nullptr && payload != nullptr && protect != nullptr, nullptr, "null parameter");
   CHECK(root, nullptr, "init response json error");
-  tee_ptr<char> payload_text(encode_text(__func__, payload, "base64url encode payload error"));
+  tee_ptr<char> payload_text(encode_text(payload, "base64url encode payload error"));
   if (!payload_text) return nullptr;
-  const tee_ptr<char> protect_text(
-      encode_text(__func__, protect, "base64url encode protect error"));
+  const tee_ptr<char> protect_text(encode_text(protect, "base64url encode protect error"));
   if (!protect_text) return nullptr;
-  const tee_ptr<char> signature_text(
-      encode_signature(__func__, payload_text.get(), protect_text.get(), key));
+  const tee_ptr<char> signature_text(encode_signature(payload_text.get(), protect_text.get(), key));
   if (!signature_text) return nullptr;
 
   json_ptr envelope(json_value_init_object());

@@ -87,14 +87,15 @@ TEE_Result get_ca_tsm_encoded_string_hash(uint8_t **hash, uint32_t *hash_len) {
 }
 
 // The last steps of both checks against the CA-TSM key, with the same texts.
-static TEE_Result check_ca_signature(const char *caller, const data_part *parts, uint32_t num_parts,
-                                     const secret_bytes &signature) {
+static TEE_Result check_ca_signature(const data_part *parts, uint32_t num_parts,
+                                     const secret_bytes &signature,
+                                     const char *as = __builtin_FUNCTION()) {
   const key_object ca_tsm(convert_ca_tsm_to_pubkey());
-  CHECK_AS(caller, ca_tsm, OTRP_NO_MEMORY, "convert_ca_tsm_to_pubkey get key NULL");
+  CHECK_AS(as, ca_tsm, OTRP_NO_MEMORY, "convert_ca_tsm_to_pubkey get key NULL");
   const TEE_Result result =
       sha_verify_signature(ca_tsm.get(), parts, num_parts, signature.data, signature.len);
-  CHECK_AS(caller, result == TEE_SUCCESS, OTRP_CA_CHECK_FAILED,
-           "sha_verify_signature error code: 0x%x", result);
+  CHECK_AS(as, result == TEE_SUCCESS, OTRP_CA_CHECK_FAILED, "sha_verify_signature error code: 0x%x",
+           result);
   return TEE_SUCCESS;
 }
 
@@ -128,17 +129,17 @@ static uint8_t *convert_java_hash_string_to_c_byte_array(const char *text, uint3
   return bytes.release();
 }
 
-static TEE_Result check_ca_tsm_hash(const char *caller, const char *claimed_text) {
+static TEE_Result check_ca_tsm_hash(const char *claimed_text,
+                                    const char *as = __builtin_FUNCTION()) {
   uint32_t claimed_len = 0;
   const tee_ptr<uint8_t> claimed(
       convert_java_hash_string_to_c_byte_array(claimed_text, &claimed_len));
-  CHECK_AS(caller, claimed, OTRP_NO_MEMORY, "convert_java_hash_string_to_c_byte_array get NULL");
+  CHECK_AS(as, claimed, OTRP_NO_MEMORY, "convert_java_hash_string_to_c_byte_array get NULL");
   tee_ptr<uint8_t> own;
   uint32_t own_len = 0;
-  TRY_LOG_AS(caller, get_ca_tsm_encoded_string_hash(out(own), &own_len),
+  TRY_LOG_AS(as, get_ca_tsm_encoded_string_hash(out(own), &own_len),
              "get_ca_tsm_encoded_string_hash error code: 0x%x");
-  CHECK_AS(caller,
-           claimed_len == own_len && equal_in_constant_time(claimed.get(), own.get(), own_len),
+  CHECK_AS(as, claimed_len == own_len && equal_in_constant_time(claimed.get(), own.get(), own_len),
            OTRP_CA_CHECK_FAILED, "ca_tsm not match with ca_tsm_in_tee");
   return TEE_SUCCESS;
 }
@@ -164,7 +165,7 @@ TEE_Result verify_tsm_pub_key(const JSON_Object *entry) {
   put_u16(block + 8, tsmid_part.len);
   put_u16(block + 10, signature.len);
   const data_part parts[] = {{block, kEntryBlockLen}, tsmid_part, {key.data, key.len}};
-  return check_ca_signature(__func__, parts, 3, signature);
+  return check_ca_signature(parts, 3, signature);
 }
 
 TEE_Result save_tsm_pub_key_to_persistent_object(const char *tsmid, const char *key_text) {
@@ -177,9 +178,9 @@ TEE_Result save_tsm_pub_key_to_persistent_object(const char *tsmid, const char *
   return TEE_SUCCESS;
 }
 
-static TEE_Result admit_entry(const char *caller, const JSON_Object *entry) {
-  TRY_LOG_AS(caller, verify_tsm_pub_key(entry), "verify_tsm_pub_key error code: 0x%x");
-  TRY_LOG_AS(caller,
+static TEE_Result admit_entry(const JSON_Object *entry, const char *as = __builtin_FUNCTION()) {
+  TRY_LOG_AS(as, verify_tsm_pub_key(entry), "verify_tsm_pub_key error code: 0x%x");
+  TRY_LOG_AS(as,
              save_tsm_pub_key_to_persistent_object(json_object_get_string(entry, "tsmid"),
                                                    json_object_get_string(entry, "tsm_pub_key")),
              "save_tsm_pub_key_to_persistent_object error code: 0x%x");
@@ -196,25 +197,26 @@ TEE_Result handle_tsm_key_chain(const char *payload) {
   const JSON_Object *chain = json_object_get_object(request, "tsm_key_chain");
   CHECK(chain != nullptr, OTRP_MISSING, "json_object_get_object get tsm_key_chain is NULL");
 
-  TRY(check_ca_tsm_hash(__func__, json_object_get_string(chain, "ca_tsm_hash")));
+  TRY(check_ca_tsm_hash(json_object_get_string(chain, "ca_tsm_hash")));
   const JSON_Array *entries = json_object_get_array(chain, "tsm_list");
   const size_t num_entries = json_array_get_count(entries);
   for (size_t i = 0; i < num_entries; ++i) {
-    TRY(admit_entry(__func__, json_array_get_object(entries, i)));
+    TRY(admit_entry(json_array_get_object(entries, i)));
   }
   return TEE_SUCCESS;
 }
 
 // ---- Stored keys
 
-static TEE_Result read_field(const char *caller, reader *in, const char *no_len,
-                             const char *no_memory, tee_ptr<uint8_t> *field, uint32_t *field_len) {
+static TEE_Result read_field(reader *in, const char *no_len, const char *no_memory,
+                             tee_ptr<uint8_t> *field, uint32_t *field_len,
+                             const char *as = __builtin_FUNCTION()) {
   uint32_t len = 0;
-  CHECK_AS(caller, take_u32(in, &len) && len != 0, OTRP_NO_MEMORY, "%s", no_len);
+  CHECK_AS(as, take_u32(in, &len) && len != 0, OTRP_NO_MEMORY, "%s", no_len);
   const uint8_t *bytes = nullptr;
-  CHECK_AS(caller, take(in, len, &bytes), OTRP_NO_MEMORY, "%s", no_len);
+  CHECK_AS(as, take(in, len, &bytes), OTRP_NO_MEMORY, "%s", no_len);
   field->reset(allocate_bytes(len));
-  CHECK_AS(caller, *field, OTRP_NO_MEMORY, "%s", no_memory);
+  CHECK_AS(as, *field, OTRP_NO_MEMORY, "%s", no_memory);
   memcpy(field->get(), bytes, len);
   *field_len = len;
   return TEE_SUCCESS;
@@ -231,9 +233,9 @@ TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_l
   tee_ptr<uint8_t> exponent;
   uint32_t modulus_len = 0;
   uint32_t exponent_len = 0;
-  TRY(read_field(__func__, &in, "read_pubkey_buf_to_n_and_e read tsm_key_n_len get NULL",
+  TRY(read_field(&in, "read_pubkey_buf_to_n_and_e read tsm_key_n_len get NULL",
                  "TEE_Malloc tsm_key_n get NULL", &modulus, &modulus_len));
-  TRY(read_field(__func__, &in, "read_pubkey_buf_to_n_and_e read tsm_key_e_len get NULL",
+  TRY(read_field(&in, "read_pubkey_buf_to_n_and_e read tsm_key_e_len get NULL",
                  "TEE_Malloc tsm_key_e get NULL", &exponent, &exponent_len));
   *n = modulus.release();
   *n_len = modulus_len;
@@ -273,9 +275,10 @@ TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key) {
 
 // ---- signature2
 
-static TEE_Result read_device_id(const char *caller, char (&id)[kMaxDeviceIdLen + 1]) {
+static TEE_Result read_device_id(char (&id)[kMaxDeviceIdLen + 1],
+                                 const char *as = __builtin_FUNCTION()) {
   uint32_t len = kMaxDeviceIdLen;
-  TRY_LOG_AS(caller, corvel_get_device_id(id, &len), "Failed to get TEE device ID with 0x%x\n");
+  TRY_LOG_AS(as, corvel_get_device_id(id, &len), "Failed to get TEE device ID with 0x%x\n");
   id[len] = 0;
   return TEE_SUCCESS;
 }
@@ -292,7 +295,7 @@ TEE_Result verify_tsm_installta_updateta_signature(const jsmn_object *tbs, const
   CHECK(text, OTRP_NO_MEMORY, "Failed to allocate signature\n");
 
   char device_id[kMaxDeviceIdLen + 1];
-  TRY(read_device_id(__func__, device_id));
+  TRY(read_device_id(device_id));
   const data_part parts[] = {{tid->data, tid->len},
                              {rid->data, rid->len},
                              text_part(device_id),
@@ -301,5 +304,5 @@ TEE_Result verify_tsm_installta_updateta_signature(const jsmn_object *tbs, const
   secret_bytes signature;
   signature.len = base64urlDecodeStringRemoveEndZero(text.get(), &signature.data);
   CHECK(signature.len != 0, OTRP_NO_MEMORY, "Failed to base64 decode signature");
-  return check_ca_signature(__func__, parts, 5, signature);
+  return check_ca_signature(parts, 5, signature);
 }

@@ -124,12 +124,11 @@ TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out) {
   return TEE_SUCCESS;
 }
 
-TEE_Result open_dsi(const char *caller, const dsi_json_str_t *dsi, TEE_Result no_memory,
-                    dsi_ptr *working) {
+TEE_Result open_dsi(const dsi_json_str_t *dsi, TEE_Result no_memory, dsi_ptr *working,
+                    const char *as) {
   working->reset(allocate_zeroed<dsi_t>());
-  CHECK_AS(caller, *working, no_memory, "malloc dsi fail");
-  TRY_LOG_AS(caller, dsi_json_str_2_dsi(dsi, working->get()),
-             "dsi_json_str_2_dsi error code: 0x%x");
+  CHECK_AS(as, *working, no_memory, "malloc dsi fail");
+  TRY_LOG_AS(as, dsi_json_str_2_dsi(dsi, working->get()), "dsi_json_str_2_dsi error code: 0x%x");
   return TEE_SUCCESS;
 }
 
@@ -146,22 +145,21 @@ TEE_Result judge_sp_exist(const JSON_Value *spl, const char *spid) {
   return TEE_ERROR_ITEM_NOT_FOUND;
 }
 
-TEE_Result append_aik_entry(const char *caller, JSON_Value *spl, const char *spid,
-                            const uint8_t *key, uint32_t key_len, const char *spaiktype) {
+TEE_Result append_aik_entry(JSON_Value *spl, const char *spid, const uint8_t *key, uint32_t key_len,
+                            const char *spaiktype, const char *as) {
   const tee_ptr<char> spaik(base64urlEncodeAddEndZero(key, key_len));
-  CHECK_AS(caller, spaik, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero pubkey fail");
+  CHECK_AS(as, spaik, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero pubkey fail");
   json_ptr entry(json_value_init_object());
-  CHECK_AS(caller, entry, TEE_ERROR_OUT_OF_MEMORY,
-           "json_value_init_object teeaiklist_item_value fail");
+  CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "json_value_init_object teeaiklist_item_value fail");
   JSON_Object *members = json_value_get_object(entry.get());
-  CHECK_AS(caller, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
+  CHECK_AS(as, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
            "json_value_get_object teeaiklist_item_object fail");
 
   const bool filled = json_object_set_string(members, "spaik", spaik.get()) == JSONSuccess &&
                       json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
                       json_object_set_string(members, "spid", spid) == JSONSuccess &&
                       json_array_take(json_value_get_array(spl), &entry) == JSONSuccess;
-  CHECK_AS(caller, filled, TEE_ERROR_OUT_OF_MEMORY, "set dsi->spl fail");
+  CHECK_AS(as, filled, TEE_ERROR_OUT_OF_MEMORY, "set dsi->spl fail");
   return TEE_SUCCESS;
 }
 
@@ -171,17 +169,16 @@ static bool copy_text_member(JSON_Object *entry, const JSON_Object *record, cons
   return json_object_take(entry, key, &copy) == JSONSuccess;
 }
 
-TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry, const JSON_Object *record) {
+TEE_Result fill_sd_entry(JSON_Object *entry, const JSON_Object *record, const char *as) {
   const bool named =
       copy_text_member(entry, record, "name") && copy_text_member(entry, record, "spid");
-  CHECK_AS(caller, named, TEE_ERROR_OUT_OF_MEMORY, "no memory for name and spid of sd object");
+  CHECK_AS(as, named, TEE_ERROR_OUT_OF_MEMORY, "no memory for name and spid of sd object");
   const bool has_talist = json_object_get_array(record, "talist") != nullptr;
   json_ptr talist;
   if (has_talist) {
     talist.reset(json_value_deep_copy(json_object_get_value(record, "talist")));
   }
-  CHECK_AS(caller, json_object_take(entry, "talist", &talist) == JSONSuccess,
-           TEE_ERROR_OUT_OF_MEMORY,
+  CHECK_AS(as, json_object_take(entry, "talist", &talist) == JSONSuccess, TEE_ERROR_OUT_OF_MEMORY,
            "json_value_deep_copy talist from sd object fail, no mem for copy");
   return TEE_SUCCESS;
 }
@@ -204,7 +201,7 @@ static TEE_Result dsi_init_sp(dsi_t *dsi, const char *spid) {
     return TEE_SUCCESS;
   }
   CHECK(result == TEE_SUCCESS, result, "read_public_aik fail error code 0x%x", result);
-  return append_aik_entry(__func__, dsi->spl, spid, key.get(), key_len, "RSA");
+  return append_aik_entry(dsi->spl, spid, key.get(), key_len, "RSA");
 }
 
 static TEE_Result dsi_init_sd_by_name(dsi_t *dsi, const char *sdname) {
@@ -218,7 +215,7 @@ static TEE_Result dsi_init_sd_by_name(dsi_t *dsi, const char *sdname) {
   CHECK(spid != nullptr, TEE_ERROR_GENERIC, "no spid in sd");
 
   TRY(dsi_init_sp(dsi, spid));
-  TRY(fill_sd_entry(__func__, json_value_get_object(entry.get()), members));
+  TRY(fill_sd_entry(json_value_get_object(entry.get()), members));
   const JSON_Status added = json_array_take(json_value_get_array(dsi->sdl), &entry);
   return added == JSONSuccess ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
 }
@@ -256,10 +253,10 @@ dsi_json_str_t *init_dsi() {
 // ---- The document
 
 // A copy of `list` as a member of `into`; `-1`, the setter's status, when it cannot be set.
-static TEE_Result set_copy(const char *caller, JSON_Object *into, const char *key,
-                           const JSON_Value *list, const char *no_memory) {
+static TEE_Result set_copy(JSON_Object *into, const char *key, const JSON_Value *list,
+                           const char *no_memory, const char *as = __builtin_FUNCTION()) {
   json_ptr copy(json_value_deep_copy(list));
-  CHECK_AS(caller, copy, TEE_ERROR_OUT_OF_MEMORY, "%s", no_memory);
+  CHECK_AS(as, copy, TEE_ERROR_OUT_OF_MEMORY, "%s", no_memory);
   return static_cast<TEE_Result>(json_object_take(into, key, &copy));
 }
 
@@ -268,12 +265,12 @@ static TEE_Result fill_sdlist_info(JSON_Object *tee, const JSON_Value *sdl) {
   const size_t num_sds = json_array_get_count(json_value_get_array(sdl));
   const JSON_Status set = json_object_set_number(sdlist, "cnt", static_cast<double>(num_sds));
   if (set != JSONSuccess) return static_cast<TEE_Result>(set);
-  return set_copy(__func__, sdlist, "sd", sdl, "No memory for dsi_sdl_copy");
+  return set_copy(sdlist, "sd", sdl, "No memory for dsi_sdl_copy");
 }
 
 static TEE_Result fill_teeaiklist_info(JSON_Object *tee, const JSON_Value *spl) {
   const TEE_Result result =
-      set_copy(__func__, tee, "teeaiklist", spl, "fill_teeaiklist_info json_value_deep_copy fail");
+      set_copy(tee, "teeaiklist", spl, "fill_teeaiklist_info json_value_deep_copy fail");
   CHECK(result == TEE_SUCCESS || result == TEE_ERROR_OUT_OF_MEMORY, TEE_ERROR_OUT_OF_MEMORY,
         "fill_teeaiklist_info json_object_set_value teeaiklist fail");
   return result;
@@ -324,25 +321,25 @@ static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
 }
 
 // What a TSM hashes is what it got: the document in base64.
-static TEE_Result digest_dsi(const char *caller, uint8_t *digest, uint32_t digest_len) {
+static TEE_Result digest_dsi(uint8_t *digest, uint32_t digest_len,
+                             const char *as = __builtin_FUNCTION()) {
   const json_text text(dsi_serialize_to_json());
-  CHECK_AS(caller, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");
+  CHECK_AS(as, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");
   const tee_ptr<char> encoded(base64EncodeAddEndZero(reinterpret_cast<const uint8_t *>(text.get()),
                                                      static_cast<uint32_t>(strlen(text.get()))));
-  CHECK_AS(caller, encoded, TEE_ERROR_OUT_OF_MEMORY,
-           "base64EncodeAddEndZero error now_dsi_str error");
+  CHECK_AS(as, encoded, TEE_ERROR_OUT_OF_MEMORY, "base64EncodeAddEndZero error now_dsi_str error");
   return do_digest_with_sha(TEE_ALG_SHA256, encoded.get(),
                             static_cast<uint32_t>(strlen(encoded.get())), digest, &digest_len);
 }
 
 TEE_Result dsi_validate_dsi_hash(const dsi_json_str_t *dsi, const char *hash) {
   dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(open_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
   working.reset();  // it was only to be seen that the texts parse
 
   const tee_ptr<uint8_t> digest(allocate_bytes(kSha256Len));
   CHECK(digest, TEE_ERROR_OUT_OF_MEMORY, "no memory for now_dsi_hash");
-  TRY(digest_dsi(__func__, digest.get(), kSha256Len));
+  TRY(digest_dsi(digest.get(), kSha256Len));
   const tee_ptr<uint8_t> now(allocate_bytes(kHashTextLen));
   CHECK(now, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero now_dsi_hash error");
   write_hex(digest.get(), kSha256Len, reinterpret_cast<char *>(now.get()));

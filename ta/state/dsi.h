@@ -51,10 +51,10 @@ dsi_json_str_t *init_dsi();
 /// Replaces the texts of `out` by those of the values: all of them or, after a failure, none.
 [[nodiscard]] TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out);
 
-/// The working form of `dsi`, for the operation named `caller`, which logs; `no_memory` is the
+/// The working form of `dsi`, for the operation named `as`, which logs; `no_memory` is the
 /// code when there is no room for the structure.
-[[nodiscard]] TEE_Result open_dsi(const char *caller, const dsi_json_str_t *dsi,
-                                  TEE_Result no_memory, dsi_ptr *working);
+[[nodiscard]] TEE_Result open_dsi(const dsi_json_str_t *dsi, TEE_Result no_memory, dsi_ptr *working,
+                                  const char *as = __builtin_FUNCTION());
 
 // ---- The document that is sent, and its hash
 
@@ -77,15 +77,15 @@ JSON_Value *construct_dsi();
 /// TEE_ERROR_GENERIC when an entry before it has no "spid".
 [[nodiscard]] TEE_Result judge_sp_exist(const JSON_Value *spl, const char *spid);
 
-/// A new AIK entry as the last one of `spl`, for the operation named `caller`, which logs.
-[[nodiscard]] TEE_Result append_aik_entry(const char *caller, JSON_Value *spl, const char *spid,
-                                          const uint8_t *key, uint32_t key_len,
-                                          const char *spaiktype);
+/// A new AIK entry as the last one of `spl`, for the operation named `as`, which logs.
+[[nodiscard]] TEE_Result append_aik_entry(JSON_Value *spl, const char *spid, const uint8_t *key,
+                                          uint32_t key_len, const char *spaiktype,
+                                          const char *as = __builtin_FUNCTION());
 
 /// Copies "name", "spid" and "talist" of an SD record into `entry`; a missing name or spid leaves
-/// what `entry` has. For the operation named `caller`, which logs.
-[[nodiscard]] TEE_Result fill_sd_entry(const char *caller, JSON_Object *entry,
-                                       const JSON_Object *record);
+/// what `entry` has. For the operation named `as`, which logs.
+[[nodiscard]] TEE_Result fill_sd_entry(JSON_Object *entry, const JSON_Object *record,
+                                       const char *as = __builtin_FUNCTION());
 
 /// Adds an AIK entry; one that the SP already has stays as it is, and that is no failure.
 [[nodiscard]] TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,

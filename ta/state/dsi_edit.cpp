@@ -10,10 +10,10 @@
 
 // Has `change` edit the working form of `dsi`, and puts it back unless that fails.
 template <class Change>
-static TEE_Result edit_dsi(const char *as, dsi_json_str_t *dsi, TEE_Result no_memory,
-                           const Change &change) {
+static TEE_Result edit_dsi(dsi_json_str_t *dsi, TEE_Result no_memory, const Change &change,
+                           const char *as = __builtin_FUNCTION()) {
   dsi_ptr working;
-  TRY(open_dsi(as, dsi, no_memory, &working));
+  TRY(open_dsi(dsi, no_memory, &working, as));
   TRY(change(working.get()));
   TRY_LOG_AS(as, dsi_2_dsi_json_str(working.get(), dsi), "dsi_2_dsi_json_str error code: 0x%x");
   return TEE_SUCCESS;
@@ -39,25 +39,25 @@ static TEE_Result find_entry(const JSON_Array *entries, const char *key, const c
 
 // ---- AIK entries
 
-static TEE_Result add_aik(const char *as, JSON_Value *spl, const char *spid, const uint8_t *key,
-                          uint32_t key_len, const char *spaiktype) {
+static TEE_Result add_aik(JSON_Value *spl, const char *spid, const uint8_t *key, uint32_t key_len,
+                          const char *spaiktype, const char *as = __builtin_FUNCTION()) {
   const TEE_Result judged = judge_sp_exist(spl, spid);
   if (judged == TEE_SUCCESS) {
     trace_error(as, __LINE__, "judge_sp_exist exist");
     return TEE_SUCCESS;
   }
   CHECK_AS(as, judged == TEE_ERROR_ITEM_NOT_FOUND, judged, "judge_sp_exist execution error");
-  return append_aik_entry(as, spl, spid, key, key_len, spaiktype);
+  return append_aik_entry(spl, spid, key, key_len, spaiktype, as);
 }
 
 TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *key,
                           uint32_t key_len, const char *spaiktype) {
-  const char *as = __func__;
+  const char *as = __builtin_FUNCTION();
   CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
         TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
-  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY, [=](dsi_t *working) {
-    return add_aik(as, working->spl, spid, key, key_len, spaiktype);
-  });
+  return edit_dsi(
+      dsi, TEE_ERROR_OUT_OF_MEMORY,
+      [=](dsi_t *working) { return add_aik(working->spl, spid, key, key_len, spaiktype, as); }, as);
 }
 
 static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
@@ -69,7 +69,7 @@ static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
 }
 
 TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
-  return edit_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY,
+  return edit_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY,
                   [=](dsi_t *working) { return remove_aik(working->spl, spid); });
 }
 
@@ -78,7 +78,7 @@ TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) 
 TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, uint32_t *found) {
   *found = 0;
   dsi_ptr working;
-  TRY(open_dsi(__func__, dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(open_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
   const JSON_Array *entries = json_value_get_array(working->sdl);
   size_t index = 0;
   TRY(find_entry(entries, "spid", spid, &index));
@@ -88,23 +88,26 @@ TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, ui
 }
 
 // Fills `entry` from the SD's record and appends it.
-static TEE_Result add_sd(const char *as, JSON_Value *sdl, const char *sdname, json_ptr *entry) {
+static TEE_Result add_sd(JSON_Value *sdl, const char *sdname, json_ptr *entry,
+                         const char *as = __builtin_FUNCTION()) {
   const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
   CHECK_AS(as, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
            sdname != nullptr ? sdname : "(null)");
-  TRY(fill_sd_entry(as, json_value_get_object(entry->get()), json_value_get_object(record.get())));
+  TRY(fill_sd_entry(json_value_get_object(entry->get()), json_value_get_object(record.get()), as));
   return static_cast<TEE_Result>(json_array_take(json_value_get_array(sdl), entry));
 }
 
-static TEE_Result load_sd(const char *as, dsi_json_str_t *dsi, const char *sdname) {
+static TEE_Result load_sd(dsi_json_str_t *dsi, const char *sdname,
+                          const char *as = __builtin_FUNCTION()) {
   json_ptr entry(json_value_init_object());
   CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
-  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY,
-                  [&](dsi_t *working) { return add_sd(as, working->sdl, sdname, &entry); });
+  return edit_dsi(
+      dsi, TEE_ERROR_OUT_OF_MEMORY,
+      [&](dsi_t *working) { return add_sd(working->sdl, sdname, &entry, as); }, as);
 }
 
 TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
-  const TEE_Result result = load_sd(__func__, dsi, sdname);
+  const TEE_Result result = load_sd(dsi, sdname);
   if (result != TEE_SUCCESS) dsi->lacks_an_sd = true;
   return result;
 }
@@ -114,7 +117,8 @@ TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname) {
   return TEE_SUCCESS;
 }
 
-static TEE_Result remove_sd(const char *as, JSON_Value *sdl, const char *sdname) {
+static TEE_Result remove_sd(JSON_Value *sdl, const char *sdname,
+                            const char *as = __builtin_FUNCTION()) {
   JSON_Array *entries = json_value_get_array(sdl);
   size_t index = 0;
   TRY(find_entry(entries, "name", sdname, &index));
@@ -123,13 +127,15 @@ static TEE_Result remove_sd(const char *as, JSON_Value *sdl, const char *sdname)
 }
 
 TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
-  const char *as = __func__;
-  return edit_dsi(as, g_dsi, OTRP_NO_MEMORY,
-                  [=](dsi_t *working) { return remove_sd(as, working->sdl, sdname); });
+  const char *as = __builtin_FUNCTION();
+  return edit_dsi(
+      g_dsi, OTRP_NO_MEMORY, [=](dsi_t *working) { return remove_sd(working->sdl, sdname, as); },
+      as);
 }
 
 // Stricter about the entries on the way, and content when none has the name.
-static TEE_Result remove_sd_if_there(const char *as, JSON_Value *sdl, const char *sdname) {
+static TEE_Result remove_sd_if_there(JSON_Value *sdl, const char *sdname,
+                                     const char *as = __builtin_FUNCTION()) {
   JSON_Array *entries = json_value_get_array(sdl);
   CHECK_AS(as, entries != nullptr, TEE_ERROR_BAD_FORMAT, "get array from dsi->sdl is NULL");
   const size_t num_entries = json_array_get_count(entries);
@@ -149,7 +155,8 @@ static TEE_Result remove_sd_if_there(const char *as, JSON_Value *sdl, const char
 }
 
 TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
-  const char *as = __func__;
-  return edit_dsi(as, dsi, TEE_ERROR_OUT_OF_MEMORY,
-                  [=](dsi_t *working) { return remove_sd_if_there(as, working->sdl, sdname); });
+  const char *as = __builtin_FUNCTION();
+  return edit_dsi(
+      dsi, TEE_ERROR_OUT_OF_MEMORY,
+      [=](dsi_t *working) { return remove_sd_if_there(working->sdl, sdname, as); }, as);
 }

@@ -12,28 +12,28 @@ namespace {
 constexpr uint32_t kLengthLen = 4;
 }
 
-static TEE_Result open_or_create(const char *caller, const char *id, uint32_t id_len,
-                                 bool overwrite, stored_object *object) {
+static TEE_Result open_or_create(const char *id, uint32_t id_len, bool overwrite,
+                                 stored_object *object, const char *as = __builtin_FUNCTION()) {
   TEE_Result result = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, id, id_len,
                                                TEE_DATA_FLAG_ACCESS_WRITE, out(*object));
   if (result == TEE_ERROR_ITEM_NOT_FOUND) {
-    trace_error(caller, __LINE__, "Item not exist. Try to create one");
+    trace_error(as, __LINE__, "Item not exist. Try to create one");
     // Platforms refuse the overwrite flag in an open call, where it means nothing.
     const uint32_t flags = TEE_DATA_FLAG_ACCESS_WRITE | (overwrite ? TEE_DATA_FLAG_OVERWRITE : 0);
     result = TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, id, id_len, flags, TEE_HANDLE_NULL,
                                         nullptr, 0, out(*object));
   }
-  CHECK_AS(caller, result == TEE_SUCCESS, result,
+  CHECK_AS(as, result == TEE_SUCCESS, result,
            "Failed to create persistent object: 0x%x overwrite: %d", result, overwrite ? 1 : 0);
   return TEE_SUCCESS;
 }
 
 // The data stream of a record: length and payload.
-static TEE_Result join_stream(const char *caller, const void *data, uint32_t len,
-                              secret_bytes *stream) {
+static TEE_Result join_stream(const void *data, uint32_t len, secret_bytes *stream,
+                              const char *as = __builtin_FUNCTION()) {
   if (len <= UINT32_MAX - kLengthLen) stream->data = allocate_bytes(kLengthLen + len);
-  CHECK_AS(caller, stream->data != nullptr, TEE_ERROR_OUT_OF_MEMORY,
-           "No memory for buffer (size %u)", len);
+  CHECK_AS(as, stream->data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",
+           len);
   stream->len = kLengthLen + len;
   put_u32(stream->data, len);
   if (len != 0) memcpy(stream->data + kLengthLen, data, len);
@@ -46,9 +46,9 @@ TEE_Result save_data_to_persistent_object(const void *data, uint32_t len, const 
 
   // Before the object is touched: for want of memory nothing is created.
   secret_bytes stream;
-  TRY(join_stream(__func__, data, len, &stream));
+  TRY(join_stream(data, len, &stream));
   stored_object object;
-  TRY(open_or_create(__func__, id, id_len, overwrite, &object));
+  TRY(open_or_create(id, id_len, overwrite, &object));
   // Many platforms make each write durable by itself. A new length before an old payload, left by
   // a power cut between two writes, would be a record that no start gets past.
   TRY_LOG(let_go_if_corrupt(&object, TEE_WriteObjectData(object.get(), stream.data, stream.len)),
@@ -155,13 +155,13 @@ void concat_pobj_name(const char *prefix, const char *name, char **id) {
   *id = text;
 }
 
-static TEE_Result read_json(const char *caller, const char *prefix, const char *name,
-                            JSON_Value **value) {
+static TEE_Result read_json(const char *prefix, const char *name, JSON_Value **value,
+                            const char *as = __builtin_FUNCTION()) {
   *value = nullptr;
   if (name == nullptr) return TEE_ERROR_ITEM_NOT_FOUND;
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
-  CHECK_AS(caller, id, OTRP_NO_MEMORY, "No memory for sd_pobj_name");
+  CHECK_AS(as, id, OTRP_NO_MEMORY, "No memory for sd_pobj_name");
   secret_bytes data;
   TRY(load_payload(id.get(), &data));
   if (data.len == 0) return TEE_ERROR_ITEM_NOT_FOUND;
@@ -170,7 +170,7 @@ static TEE_Result read_json(const char *caller, const char *prefix, const char *
 }
 
 TEE_Result read_json_by_name(const char *prefix, const char *name, JSON_Value **value) {
-  const TEE_Result result = read_json("get_json_by_name", prefix, name, value);
+  const TEE_Result result = read_json(prefix, name, value, "get_json_by_name");
   // No object has an ID that is too long for one.
   return result == TEE_ERROR_BAD_PARAMETERS ? TEE_ERROR_ITEM_NOT_FOUND : result;
 }

@@ -101,15 +101,15 @@ TEE_Result save_sd_list(const JSON_Value *sd_list) {
 
 // Fills a copy of `record`; see init_sd_info() for the results.
 template <size_t kNumMembers>
-static TEE_Result fill_template(const char *caller, const char *record,
-                                const text_member (&members)[kNumMembers], JSON_Object **object,
-                                JSON_Value **value) {
+static TEE_Result fill_template(const char *record, const text_member (&members)[kNumMembers],
+                                JSON_Object **object, JSON_Value **value,
+                                const char *as = __builtin_FUNCTION()) {
   *object = nullptr;
   *value = nullptr;
   json_ptr document(json_parse_string(record));
   JSON_Object *into = json_value_get_object(document.get());
   if (into == nullptr) {
-    trace_error(caller, __LINE__, "json_parse_string error");
+    trace_error(as, __LINE__, "json_parse_string error");
     return TEE_SUCCESS;
   }
   for (const text_member &member : members) {
@@ -124,13 +124,13 @@ static TEE_Result fill_template(const char *caller, const char *record,
 TEE_Result init_sd_info(const char *spid, const char *tsmid, const char *sdname,
                         JSON_Object **object, JSON_Value **value) {
   const text_member members[] = {{"spid", spid}, {"tsmid", tsmid}, {"name", sdname}};
-  return fill_template(__func__, kSdInfoTemplate, members, object, value);
+  return fill_template(kSdInfoTemplate, members, object, value);
 }
 
 TEE_Result init_sp_info(const char *spid, const char *spcert, const char *aik, JSON_Object **object,
                         JSON_Value **value) {
   const text_member members[] = {{"spid", spid}, {"spcert", spcert}, {"aik", aik}};
-  return fill_template(__func__, kSpInfoTemplate, members, object, value);
+  return fill_template(kSpInfoTemplate, members, object, value);
 }
 
 // ---- SD records
@@ -193,31 +193,31 @@ TEE_Result save_sp_info(const char *spid, const char *spcert, const char *aik) {
   return TEE_SUCCESS;
 }
 
-// `no_memory` and `failed` are the texts of the operation named `caller`.
-static TEE_Result delete_record(const char *caller, const char *prefix, const char *name,
-                                const char *no_memory, const char *failed) {
+// `no_memory` and `failed` are the texts of the operation named `as`.
+static TEE_Result delete_record(const char *prefix, const char *name, const char *no_memory,
+                                const char *failed, const char *as = __builtin_FUNCTION()) {
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
-  CHECK_AS(caller, id, OTRP_NO_MEMORY, "%s", no_memory);
-  TRY_LOG_AS(caller, delete_persistent_object(id.get(), text_len(id.get())), failed);
+  CHECK_AS(as, id, OTRP_NO_MEMORY, "%s", no_memory);
+  TRY_LOG_AS(as, delete_persistent_object(id.get(), text_len(id.get())), failed);
   return TEE_SUCCESS;
 }
 
 TEE_Result delete_sp_info(const char *spid) {
-  return delete_record(__func__, SP_INFO_PREFIX, spid, "no memory for sp_info_name",
+  return delete_record(SP_INFO_PREFIX, spid, "no memory for sp_info_name",
                        "delete_persistent_object error code: 0x%x");
 }
 
 // ---- TA records
 
 TEE_Result delete_ta_persistent_object(const char *taid) {
-  return delete_record(__func__, TA_INFO_PREFIX, taid, "delete_ta_persistent_object out of mem",
+  return delete_record(TA_INFO_PREFIX, taid, "delete_ta_persistent_object out of mem",
                        "delete_persistent_object error code 0x%x");
 }
 
-static TEE_Result delete_existing_ta_info(const char *caller, const char *id) {
+static TEE_Result delete_existing_ta_info(const char *id, const char *as = __builtin_FUNCTION()) {
   const TEE_Result deleted = delete_persistent_object(id, text_len(id));
-  CHECK_AS(caller, deleted == TEE_SUCCESS || deleted == TEE_ERROR_ITEM_NOT_FOUND, deleted,
+  CHECK_AS(as, deleted == TEE_SUCCESS || deleted == TEE_ERROR_ITEM_NOT_FOUND, deleted,
            "delete existing ta info fail");
   return TEE_SUCCESS;
 }
@@ -240,6 +240,6 @@ TEE_Result save_ta_info_to_persistent_object(const char *spid, const char *sdnam
   tee_ptr<char> id;
   concat_pobj_name(TA_INFO_PREFIX, taid, out(id));
   if (!id) return OTRP_NO_MEMORY;
-  if (replace) TRY(delete_existing_ta_info(__func__, id.get()));
+  if (replace) TRY(delete_existing_ta_info(id.get()));
   return save_text(text.get(), id.get());
 }

@@ -43,14 +43,14 @@ static uint8_t *read_ta_bin_ta_hash(const uint8_t *ta_image) {
 
 // ---- The stored table
 
-static TEE_Result load_table(const char *caller, table *rows) {
+static TEE_Result load_table(table *rows, const char *as = __builtin_FUNCTION()) {
   const uint8_t no_rows[kCountLen] = {};
   TRY(load_or_create(TA_REGISTER_ID, {no_rows, kCountLen},
-                     "can not init ta_register_info " TA_REGISTER_ID, &rows->payload, caller));
+                     "can not init ta_register_info " TA_REGISTER_ID, &rows->payload, as));
   const uint32_t len = rows->payload.len;
   const uint32_t num_rows = len < kCountLen ? UINT32_MAX : get_u32(rows->payload.data);
-  CHECK_AS(caller, len >= kCountLen && num_rows <= (len - kCountLen) / kRowLen,
-           TEE_ERROR_BAD_FORMAT, "ta_register_info holds %u bytes, not %u rows", len, num_rows);
+  CHECK_AS(as, len >= kCountLen && num_rows <= (len - kCountLen) / kRowLen, TEE_ERROR_BAD_FORMAT,
+           "ta_register_info holds %u bytes, not %u rows", len, num_rows);
   rows->num_rows = num_rows;
   return TEE_SUCCESS;
 }
@@ -67,15 +67,15 @@ static uint32_t find_row(const table &rows, const char *taid) {
 
 // Saves the first `num_before` rows, then the row of `taid` with `digest` unless that is NULL,
 // then the rows from `rest` on.
-static TEE_Result save_table(const char *caller, const table &rows, uint32_t num_before,
-                             const char *taid, const uint8_t *digest, uint32_t rest,
-                             const char *not_saved) {
+static TEE_Result save_table(const table &rows, uint32_t num_before, const char *taid,
+                             const uint8_t *digest, uint32_t rest, const char *not_saved,
+                             const char *as = __builtin_FUNCTION()) {
   const uint32_t num_new = digest != nullptr ? 1 : 0;
   const uint32_t num_after = rows.num_rows - rest;
   const uint32_t num_rows = num_before + num_new + num_after;
   const uint32_t len = kCountLen + num_rows * kRowLen;
   const tee_ptr<uint8_t> data(allocate_bytes(len));
-  CHECK_AS(caller, data, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
+  CHECK_AS(as, data, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
 
   put_u32(data.get(), num_rows);
   uint8_t *at = data.get() + kCountLen;
@@ -90,7 +90,7 @@ static TEE_Result save_table(const char *caller, const table &rows, uint32_t num
 
   const TEE_Result saved =
       save_data_to_persistent_object(data.get(), len, TA_REGISTER_ID, kRegisterIdLen, false);
-  CHECK_AS(caller, saved == TEE_SUCCESS, saved, not_saved, TA_REGISTER_ID);
+  CHECK_AS(as, saved == TEE_SUCCESS, saved, not_saved, TA_REGISTER_ID);
   return TEE_SUCCESS;
 }
 
@@ -106,16 +106,16 @@ TEE_Result save_ta_register_info(const char *taid, const uint8_t *ta_image,
   CHECK(valid, OTRP_MISSING, "input format not valid!");
 
   table rows;
-  TRY(load_table(__func__, &rows));
+  TRY(load_table(&rows));
   const uint32_t row = find_row(rows, taid);
   const bool listed = row < rows.num_rows;
   if (operation_code == kRegisterTa) {
     CHECK(!listed, OTRP_TA_EXISTS, "this ta %s has been installed", taid);
-    return save_table(__func__, rows, rows.num_rows, taid, digest.get(), rows.num_rows,
+    return save_table(rows, rows.num_rows, taid, digest.get(), rows.num_rows,
                       "can not init ta_register_info %s");
   }
   CHECK(listed, OTRP_NOT_FOUND, "this ta %s has not been installed", taid);
   const uint8_t *new_digest = operation_code == kUpdateTa ? digest.get() : nullptr;
-  return save_table(__func__, rows, row, taid, new_digest, row + 1,
+  return save_table(rows, row, taid, new_digest, row + 1,
                     "can not init ta_register_info %s, create_sd function fail");
 }
