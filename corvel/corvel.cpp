@@ -56,12 +56,6 @@ static TEE_Result give_device_id(TEE_Param params[4]) {
   return TEE_SUCCESS;
 }
 
-static uint8_t *put_sized(uint8_t *at, const reader &content) {
-  put_u32(at, content.left);
-  memcpy(at + 4, content.at, content.left);
-  return at + 4 + content.left;
-}
-
 static TEE_Result give_public_identity(TEE_Param params[4]) {
   identity device;
   TRY(get_identity(&device));
@@ -72,8 +66,9 @@ static TEE_Result give_public_identity(TEE_Param params[4]) {
     params[0].memref.size = device.device_id.left;
     return TEE_ERROR_SHORT_BUFFER;
   }
-  auto *key = static_cast<uint8_t *>(params[1].memref.buffer);
-  put_sized(put_sized(key, device.modulus), device.public_exponent);
+  writer key = {static_cast<uint8_t *>(params[1].memref.buffer), key_len};
+  put_block(&key, {device.modulus.at, device.modulus.left});
+  put_block(&key, {device.public_exponent.at, device.public_exponent.left});
   return give(device.device_id, &params[0]);
 }
 

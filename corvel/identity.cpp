@@ -33,31 +33,34 @@ static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
 
 // ---- Making
 
-static void write_device_id(uint8_t *id) {
+static void put_device_id(writer *out) {
   uint8_t random[kDeviceIdLen / 2];
+  char id[kDeviceIdLen];
   TEE_GenerateRandom(random, sizeof(random));
-  write_hex(random, sizeof(random), reinterpret_cast<char *>(id));
+  write_hex(random, sizeof(random), id);
+  put(out, {id, sizeof id});
 }
 
-// The caller has room for the three records of a key of kKeySize bits.
-static TEE_Result write_key_box(TEE_ObjectHandle key, uint8_t *box, uint32_t *box_len) {
-  *box_len = 0;
+static TEE_Result put_key_box(TEE_ObjectHandle key, writer *out) {
+  secret_bytes value;
+  value.data = allocate_bytes(kKeySize / 8);
+  if (value.data == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
+  value.len = kKeySize / 8;
   for (const key_record &record : kKeyRecords) {
-    uint8_t *header = box + *box_len;
-    tee_length len = kKeySize / 8;
-    TRY(TEE_GetObjectBufferAttribute(key, record.attribute, header + kRecordHeaderLen, &len));
-    put_u16(header, record.type);
-    put_u16(header + 2, static_cast<uint32_t>(len));
-    *box_len += kRecordHeaderLen + static_cast<uint32_t>(len);
+    tee_length len = value.len;
+    TRY(TEE_GetObjectBufferAttribute(key, record.attribute, value.data, &len));
+    put_u16(out, record.type);
+    put_u16(out, static_cast<uint16_t>(len));
+    put(out, {value.data, static_cast<uint32_t>(len)});
   }
-  return TEE_SUCCESS;
+  return out->ok ? TEE_SUCCESS : TEE_ERROR_EXCESS_DATA;
 }
 
-static TEE_Result generate_key_box(uint8_t *box, uint32_t *box_len) {
+static TEE_Result generate_key_box(writer *box) {
   key_object key;
   TRY(TEE_AllocateTransientObject(TEE_TYPE_RSA_KEYPAIR, kKeySize, out(key)));
   TRY(TEE_GenerateKey(key.get(), kKeySize, nullptr, 0));
-  return write_key_box(key.get(), box, box_len);
+  return put_key_box(key.get(), box);
 }
 
 static TEE_Result make_identity() {
@@ -65,14 +68,14 @@ static TEE_Result make_identity() {
   draft.data = allocate_bytes(kMaxIdentityLen);
   if (draft.data == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
   draft.len = kMaxIdentityLen;
-  write_device_id(draft.data);
-  uint32_t box_len = 0;
-  TRY(generate_key_box(draft.data + kDeviceIdLen, &box_len));
+  writer rest = {draft.data, draft.len};
+  put_device_id(&rest);
+  TRY(generate_key_box(&rest));
 
   stored_object object;
   return TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, kObjectId, sizeof kObjectId,
                                     TEE_DATA_FLAG_ACCESS_WRITE, TEE_HANDLE_NULL, draft.data,
-                                    kDeviceIdLen + box_len, out(object));
+                                    draft.len - rest.left, out(object));
 }
 
 // ---- Reading

@@ -2,8 +2,8 @@
 #include "crypto/rsa.h"
 
 #include "crypto/symmetric.h"
+#include "cursor.h"
 #include "failure.h"
-#include "little_endian.h"
 #include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
@@ -171,6 +171,17 @@ TEE_Result get_rsa_pubkey_from_tlv(const tlv_box *box, uint8_t **modulus, uint32
   return TEE_SUCCESS;
 }
 
+uint8_t *encode_public_key(const data_part &modulus, const data_part &exponent, uint32_t *len) {
+  *len = 4 + modulus.len + 4 + exponent.len;  // of a sum that wraps, there is not enough room
+  tee_ptr<uint8_t> encoded(allocate_bytes(*len));
+  writer out = {encoded.get(), encoded ? *len : 0};
+  put_block(&out, modulus);
+  put_block(&out, exponent);
+  if (out.ok) return encoded.release();
+  *len = 0;
+  return nullptr;
+}
+
 TEE_Result parse_key_tlv_box_to_encoded_pubkey(const tlv_box *box, uint8_t **encoded,
                                                uint32_t *encoded_len) {
   *encoded = nullptr;
@@ -185,16 +196,42 @@ TEE_Result parse_key_tlv_box_to_encoded_pubkey(const tlv_box *box, uint8_t **enc
   CHECK(modulus && modulus_len != 0 && exponent && exponent_len != 0, OTRP_MISSING,
         "get_rsa_pubkey_from_tlv return NULL");
 
-  // A record says its length in 16 bits: the sum cannot wrap.
-  const uint32_t len = 4 + modulus_len + 4 + exponent_len;
-  uint8_t *bytes = allocate_bytes(len);
-  CHECK(bytes != nullptr, OTRP_NO_MEMORY, "allocate data_buf out of mem");
-  put_u32(bytes, modulus_len);
-  memcpy(bytes + 4, modulus.get(), modulus_len);
-  put_u32(bytes + 4 + modulus_len, exponent_len);
-  memcpy(bytes + 8 + modulus_len, exponent.get(), exponent_len);
-  *encoded = bytes;
-  *encoded_len = len;
+  *encoded =
+      encode_public_key({modulus.get(), modulus_len}, {exponent.get(), exponent_len}, encoded_len);
+  CHECK(*encoded != nullptr, OTRP_NO_MEMORY, "allocate data_buf out of mem");
+  return TEE_SUCCESS;
+}
+
+static TEE_Result copy_block(reader *in, const char *no_len, const char *no_memory, uint8_t **block,
+                             uint32_t *block_len, const char *as = __builtin_FUNCTION()) {
+  const uint8_t *bytes = nullptr;
+  CHECK_AS(as, take_u32(in, block_len) && take(in, *block_len, &bytes), OTRP_NO_MEMORY, "%s",
+           no_len);
+  *block = allocate_bytes(*block_len);
+  CHECK_AS(as, *block != nullptr, OTRP_NO_MEMORY, "%s", no_memory);
+  memcpy(*block, bytes, *block_len);
+  return TEE_SUCCESS;
+}
+
+TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_len, uint8_t **n,
+                                      uint32_t *n_len, uint8_t **e, uint32_t *e_len) {
+  *n = nullptr;
+  *n_len = 0;
+  *e = nullptr;
+  *e_len = 0;
+  reader in = {encoded, encoded_len};
+  tee_ptr<uint8_t> modulus;
+  tee_ptr<uint8_t> exponent;
+  uint32_t modulus_len = 0;
+  uint32_t exponent_len = 0;
+  TRY(copy_block(&in, "read_pubkey_buf_to_n_and_e read tsm_key_n_len get NULL",
+                 "TEE_Malloc tsm_key_n get NULL", out(modulus), &modulus_len));
+  TRY(copy_block(&in, "read_pubkey_buf_to_n_and_e read tsm_key_e_len get NULL",
+                 "TEE_Malloc tsm_key_e get NULL", out(exponent), &exponent_len));
+  *n = modulus.release();
+  *n_len = modulus_len;
+  *e = exponent.release();
+  *e_len = exponent_len;
   return TEE_SUCCESS;
 }
 

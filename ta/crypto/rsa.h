@@ -56,6 +56,15 @@ TEE_ObjectHandle deserialize_rsa_key_from_tlv(const tlv_box *box);
 [[nodiscard]] TEE_Result parse_key_tlv_box_to_encoded_pubkey(const tlv_box *box, uint8_t **encoded,
                                                              uint32_t *encoded_len);
 
+/// The encoded public key of these, in a new buffer; NULL: no memory.
+uint8_t *encode_public_key(const data_part &modulus, const data_part &exponent, uint32_t *len);
+
+/// Modulus and exponent of an encoded key, in new buffers. OTRP_NO_MEMORY when it ends too early.
+/// Logs.
+[[nodiscard]] TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_len,
+                                                    uint8_t **n, uint32_t *n_len, uint8_t **e,
+                                                    uint32_t *e_len);
+
 /// RSAES-PKCS1-v1_5 (RFC 8017, 7.2) into a new buffer. A NULL key is TEE_ERROR_BAD_PARAMETERS, as
 /// in the other three.
 [[nodiscard]] TEE_Result rsa_encrypt(TEE_ObjectHandle key, const uint8_t *input, uint32_t input_len,

@@ -60,7 +60,8 @@ int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t l
 
 int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value) {
   uint8_t bytes[kIntLen];
-  put_u32(bytes, value);
+  writer out = {bytes, sizeof bytes};
+  put_u32(&out, value);
   return tlv_box_put_bytes(box, type, bytes, sizeof bytes);
 }
 
@@ -70,18 +71,17 @@ int tlv_box_put_bytes(tlv_box *box, uint16_t type, const uint8_t *value, uint32_
 
 int tlv_box_serialize(tlv_box *box) {
   if (box->serialized != nullptr) return TLV_SERIALIZED;
-  uint8_t *at = allocate_bytes(box->serialized_len);
-  CHECK(at != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
+  box->serialized = allocate_bytes(box->serialized_len);
+  CHECK(box->serialized != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
         static_cast<int>(box->serialized_len));
-  box->serialized = at;
+  writer out = {box->serialized, box->serialized_len};
   for (const key_list_entry *entry = box->items->head; entry != nullptr; entry = entry->next) {
     const auto *item = static_cast<const tlv_item *>(entry->value);
-    put_u16(at, item->type);
-    put_u16(at + sizeof item->type, item->len);
-    memcpy(at + kRecordHeaderLen, item->value, item->len);
-    at += kRecordHeaderLen + item->len;
+    put_u16(&out, item->type);
+    put_u16(&out, item->len);
+    put(&out, {item->value, item->len});
   }
-  return 0;
+  return out.ok ? 0 : TLV_ERROR;
 }
 
 const uint8_t *tlv_box_get_buffer(const tlv_box *box) {
@@ -125,9 +125,9 @@ static const tlv_item *find_item(const tlv_box *box, uint16_t type) {
 
 int tlv_box_get_int(const tlv_box *box, uint16_t type, uint32_t *value) {
   const tlv_item *item = find_item(box, type);
-  if (item == nullptr || item->len < kIntLen) return TLV_ERROR;
-  *value = get_u32(item->value);
-  return 0;
+  if (item == nullptr) return TLV_ERROR;
+  reader in = {item->value, item->len};
+  return take_u32(&in, value) ? 0 : TLV_ERROR;
 }
 
 int tlv_box_get_bytes(const tlv_box *box, uint16_t type, uint8_t *bytes, uint32_t *len) {

@@ -12,18 +12,12 @@
 namespace {
 
 constexpr uint32_t kWordLen = 4;
-constexpr uint32_t kHeaderLen = kWordLen + kWordLen;  // status, R
 
 // The caller's output buffer and what has been put into it.
 struct output {
   uint8_t *buffer;
   uint32_t capacity;
   uint32_t response_len;  // R
-
-  void set_header(TEE_Result status) const {
-    put_u32(buffer, status);
-    put_u32(buffer + kWordLen, response_len);
-  }
 };
 
 // What a message needs while it is worked on; freed when the command ends.
@@ -37,6 +31,12 @@ struct work {
 };
 
 }  // namespace
+
+void put_answer_head(uint8_t *out, TEE_Result status, uint32_t response_len) {
+  writer head = {out, kAnswerHeadLen};
+  put_u32(&head, status);
+  put_u32(&head, response_len);
+}
 
 // ---- The output buffer as working memory
 
@@ -63,10 +63,9 @@ void return_borrow_share_memory(void *destination, const jsmn_string *slice) {
 TEE_Result add_ta_bin_to_out_buf(void *destination, const uint8_t *image, uint32_t image_len) {
   CHECK(destination != nullptr && image != nullptr && image_len != 0, OTRP_MISSING,
         "add_ta_bin_to_out_buf input is NULL");
-  auto *at = static_cast<uint8_t *>(destination);
-  put_u32(at, image_len);
-  memcpy(at + kWordLen, image, image_len);
-  return TEE_SUCCESS;
+  writer out = {static_cast<uint8_t *>(destination), kWordLen + image_len};
+  put_block(&out, {image, image_len});
+  return out.ok ? TEE_SUCCESS : OTRP_NO_MEMORY;
 }
 
 // ---- The input frame
@@ -141,8 +140,8 @@ static TEE_Result place_payload(secret_bytes *payload, const output &out, work *
            "after verify_decode get tbs json is NULL");
   job->payload->data = reinterpret_cast<const char *>(payload->data);
   job->payload->len = payload->len;
-  if (payload->len < out.capacity - kHeaderLen) {
-    placed->reset(borrow_share_memory(out.buffer + kHeaderLen, job->payload.get()));
+  if (payload->len < out.capacity - kAnswerHeadLen) {
+    placed->reset(borrow_share_memory(out.buffer + kAnswerHeadLen, job->payload.get()));
   }
   job->payload->data = nullptr;
   CHECK_AS(kName, *placed && (*placed)->len != 0, OTRP_NO_MEMORY, "borrow_share_memory get NULL");
@@ -161,14 +160,14 @@ static TEE_Result process(const message_entry *entry, const output &out, const s
   job->response.reset(response);
   job->image.data = image.data;
   job->image.len = image.len;
-  return_borrow_share_memory(out.buffer + kHeaderLen, placed.get());
+  return_borrow_share_memory(out.buffer + kAnswerHeadLen, placed.get());
   CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to process message");
   return TEE_SUCCESS;
 }
 
 static TEE_Result encode(const message_entry *entry, const work &job, output *out) {
-  uint32_t len = out->capacity - kHeaderLen;
-  const TEE_Result result = entry->encode(job.response.get(), out->buffer + kHeaderLen, &len);
+  uint32_t len = out->capacity - kAnswerHeadLen;
+  const TEE_Result result = entry->encode(job.response.get(), out->buffer + kAnswerHeadLen, &len);
   CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to encode message");
   out->response_len = len;
   return TEE_SUCCESS;
@@ -180,7 +179,7 @@ static bool has_image(const work &job) {
 
 static TEE_Result add_image(const work &job, const output &out) {
   if (!has_image(job)) return TEE_SUCCESS;
-  const uint32_t offset = kHeaderLen + out.response_len;
+  const uint32_t offset = kAnswerHeadLen + out.response_len;
   CHECK_AS(kName, uint64_t{offset} + kWordLen + job.image.len <= out.capacity, OTRP_NO_MEMORY,
            "Failed to add ta_bin, rbuf too small");
   return add_ta_bin_to_out_buf(out.buffer + offset, job.image.data, job.image.len);
@@ -210,7 +209,7 @@ static TEE_Result answer_message(reader *in, uint32_t message_id, work *job, out
 TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out, uint32_t *out_len) {
   CHECK(in != nullptr && in_len > kWordLen && out != nullptr && out_len != nullptr,
         TEE_ERROR_BAD_PARAMETERS, "Invalid parameters/length\n");
-  CHECK(*out_len >= kHeaderLen, TEE_ERROR_SHORT_BUFFER, "output buffer is too small\n");
+  CHECK(*out_len >= kAnswerHeadLen, TEE_ERROR_SHORT_BUFFER, "output buffer is too small\n");
   work job;
   job.message.reset(jsmn_init_string());
   job.payload.reset(jsmn_init_string());
@@ -218,17 +217,18 @@ TEE_Result OTrP_TaInvokeCmd(const void *in, uint32_t in_len, void *out, uint32_t
         "Failed to allocate memory for request_json_str/request_json_tbs_str\n");
 
   output answer = {static_cast<uint8_t *>(out), *out_len, 0};
-  answer.set_header(OTRP_RESPONSE_FAILED);
+  put_answer_head(answer.buffer, OTRP_RESPONSE_FAILED, 0);
   reader frame = {static_cast<const uint8_t *>(in), in_len};
   uint32_t message_id = 0;
   const TEE_Result framed = read_frame_head(&frame, &message_id);
   if (framed != TEE_SUCCESS) {
-    answer.set_header(framed);
+    put_answer_head(answer.buffer, framed, 0);
     return framed;
   }
 
-  answer.set_header(answer_message(&frame, message_id, &job, &answer));
-  *out_len = kHeaderLen + answer.response_len;
+  const TEE_Result status = answer_message(&frame, message_id, &job, &answer);
+  put_answer_head(answer.buffer, status, answer.response_len);
+  *out_len = kAnswerHeadLen + answer.response_len;
   if (has_image(job)) *out_len += kWordLen + job.image.len;
   return TEE_SUCCESS;
 }

@@ -15,6 +15,10 @@
 #include "platform.h"
 #include "state/token_reader.h"
 
+/// Status and R.
+constexpr uint32_t kAnswerHeadLen = 8;
+void put_answer_head(uint8_t *out, TEE_Result status, uint32_t response_len);
+
 /// Handles one request. `*out_len` is the capacity of `out` and then what was written; with a TA
 /// image that did not fit, what would have been. Both buffers are shared with the normal world,
 /// and `out` serves as working memory for the decoded payload, which is wiped before returning.

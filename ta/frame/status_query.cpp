@@ -3,15 +3,13 @@
 
 #include "cursor.h"
 #include "failure.h"
+#include "frame/pipeline.h"
 #include "ownership.h"
 #include "platform.h"
 #include "state/json.h"
 #include "state/object_store.h"
 
-namespace {
-constexpr uint32_t kWordLen = 4;
-constexpr uint32_t kHeaderLen = kWordLen + kWordLen;
-}  // namespace
+static constexpr uint32_t kQueryHeadLen = 8;  // reserved word, L
 
 // Looks the TA of a query text up; TEE_SUCCESS when it is recorded.
 static TEE_Result find_ta(const uint8_t *query, uint32_t query_len,
@@ -38,7 +36,7 @@ static bool set_answer(JSON_Object *answer, bool found) {
 }
 
 TEE_Result os_query_otrp(const void *in, uint32_t in_len, void *out, uint32_t *out_len) {
-  CHECK(in != nullptr && in_len >= kHeaderLen && out != nullptr && out_len != nullptr,
+  CHECK(in != nullptr && in_len >= kQueryHeadLen && out != nullptr && out_len != nullptr,
         TEE_ERROR_BAD_PARAMETERS, "os_query_otrp input is null");
   const json_ptr answer(json_value_init_object());
   CHECK(answer, TEE_ERROR_OUT_OF_MEMORY, "response_json is NULL, out of memory");
@@ -61,9 +59,8 @@ TEE_Result os_query_otrp(const void *in, uint32_t in_len, void *out, uint32_t *o
   CHECK(text, TEE_ERROR_OUT_OF_MEMORY, "json_serialize_to_string response_json_str is NULL");
   const auto text_len = static_cast<uint32_t>(strlen(text.get()));
   auto *at = static_cast<uint8_t *>(out);
-  put_u32(at, result);
-  put_u32(at + kWordLen, text_len);
-  memcpy(at + kHeaderLen, text.get(), text_len);
-  *out_len = kHeaderLen + text_len;
+  put_answer_head(at, result, text_len);
+  memcpy(at + kAnswerHeadLen, text.get(), text_len);
+  *out_len = kAnswerHeadLen + text_len;
   return result;
 }

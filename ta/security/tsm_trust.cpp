@@ -20,7 +20,6 @@
 namespace {
 
 const uint8_t kCaTsmExponent[] = {1, 0, 1};
-constexpr uint32_t kCaTsmEncodedLen = 4 + sizeof(kCaTsmModulus) + 4 + sizeof(kCaTsmExponent);
 static_assert(sizeof(kCaTsmModulus) * 8 == kRsaKeyBits);
 
 constexpr uint32_t kEntryBlockLen = 12;
@@ -57,15 +56,12 @@ TEE_ObjectHandle convert_ca_tsm_to_pubkey() {
 
 TEE_Result get_ca_tsm_encoded_string(char **text) {
   *text = nullptr;
-  const tee_ptr<uint8_t> encoded(allocate_bytes(kCaTsmEncodedLen));
+  uint32_t encoded_len = 0;
+  const tee_ptr<uint8_t> encoded(encode_public_key({kCaTsmModulus, sizeof kCaTsmModulus},
+                                                   {kCaTsmExponent, sizeof kCaTsmExponent},
+                                                   &encoded_len));
   CHECK(encoded, TEE_ERROR_OUT_OF_MEMORY, "get_ca_tsm_encoded_string, malloc mem error");
-  uint8_t *at = encoded.get();
-  put_u32(at, sizeof kCaTsmModulus);
-  memcpy(at + 4, kCaTsmModulus, sizeof kCaTsmModulus);
-  at += 4 + sizeof kCaTsmModulus;
-  put_u32(at, sizeof kCaTsmExponent);
-  memcpy(at + 4, kCaTsmExponent, sizeof kCaTsmExponent);
-  *text = base64urlEncodeAddEndZero(encoded.get(), kCaTsmEncodedLen);
+  *text = base64urlEncodeAddEndZero(encoded.get(), encoded_len);
   CHECK(*text != nullptr, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero get output NULL");
   return TEE_SUCCESS;
 }
@@ -159,11 +155,12 @@ TEE_Result verify_tsm_pub_key(const JSON_Object *entry) {
 
   const data_part tsmid_part = text_part(tsmid);
   uint8_t block[kEntryBlockLen];
-  put_u32(block, TEE_ALG_RSASSA_PKCS1_V1_5_SHA256);
-  put_u16(block + 4, kEntryBlockVersion);
-  put_u16(block + 6, kEntryBlockKeyLen);
-  put_u16(block + 8, tsmid_part.len);
-  put_u16(block + 10, signature.len);
+  writer out = {block, kEntryBlockLen};
+  put_u32(&out, TEE_ALG_RSASSA_PKCS1_V1_5_SHA256);
+  put_u16(&out, kEntryBlockVersion);
+  put_u16(&out, kEntryBlockKeyLen);
+  put_u16(&out, static_cast<uint16_t>(tsmid_part.len));
+  put_u16(&out, static_cast<uint16_t>(signature.len));
   const data_part parts[] = {{block, kEntryBlockLen}, tsmid_part, {key.data, key.len}};
   return check_ca_signature(parts, 3, signature);
 }
@@ -207,42 +204,6 @@ TEE_Result handle_tsm_key_chain(const char *payload) {
 }
 
 // ---- Stored keys
-
-static TEE_Result read_field(reader *in, const char *no_len, const char *no_memory,
-                             tee_ptr<uint8_t> *field, uint32_t *field_len,
-                             const char *as = __builtin_FUNCTION()) {
-  uint32_t len = 0;
-  CHECK_AS(as, take_u32(in, &len) && len != 0, OTRP_NO_MEMORY, "%s", no_len);
-  const uint8_t *bytes = nullptr;
-  CHECK_AS(as, take(in, len, &bytes), OTRP_NO_MEMORY, "%s", no_len);
-  field->reset(allocate_bytes(len));
-  CHECK_AS(as, *field, OTRP_NO_MEMORY, "%s", no_memory);
-  memcpy(field->get(), bytes, len);
-  *field_len = len;
-  return TEE_SUCCESS;
-}
-
-TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_len, uint8_t **n,
-                                      uint32_t *n_len, uint8_t **e, uint32_t *e_len) {
-  *n = nullptr;
-  *n_len = 0;
-  *e = nullptr;
-  *e_len = 0;
-  reader in = {encoded, encoded_len};
-  tee_ptr<uint8_t> modulus;
-  tee_ptr<uint8_t> exponent;
-  uint32_t modulus_len = 0;
-  uint32_t exponent_len = 0;
-  TRY(read_field(&in, "read_pubkey_buf_to_n_and_e read tsm_key_n_len get NULL",
-                 "TEE_Malloc tsm_key_n get NULL", &modulus, &modulus_len));
-  TRY(read_field(&in, "read_pubkey_buf_to_n_and_e read tsm_key_e_len get NULL",
-                 "TEE_Malloc tsm_key_e get NULL", &exponent, &exponent_len));
-  *n = modulus.release();
-  *n_len = modulus_len;
-  *e = exponent.release();
-  *e_len = exponent_len;
-  return TEE_SUCCESS;
-}
 
 TEE_Result get_tsm_pubkey_by_tsmid(const char *tsmid, TEE_ObjectHandle *key) {
   if (key != nullptr) *key = TEE_HANDLE_NULL;

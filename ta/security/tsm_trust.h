@@ -49,11 +49,6 @@ struct jsmn_object;
 
 // ---- The steps
 
-/// Takes an encoded key apart, into new buffers. OTRP_NO_MEMORY when it ends too early.
-[[nodiscard]] TEE_Result read_pubkey_buf_to_n_and_e(const uint8_t *encoded, uint32_t encoded_len,
-                                                    uint8_t **n, uint32_t *n_len, uint8_t **e,
-                                                    uint32_t *e_len);
-
 /// Key objects, or NULL: of the key that the build decided on, and of any other.
 TEE_ObjectHandle convert_ca_tsm_to_pubkey();
 TEE_ObjectHandle convert_tsm_n_e_to_pubkey(const uint8_t *n, uint32_t n_len, const uint8_t *e,

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/object_store.h"
 
+#include "cursor.h"
 #include "failure.h"
-#include "little_endian.h"
 #include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
@@ -32,11 +32,10 @@ static TEE_Result open_or_create(const char *id, uint32_t id_len, bool overwrite
 static TEE_Result join_stream(const void *data, uint32_t len, secret_bytes *stream,
                               const char *as = __builtin_FUNCTION()) {
   if (len <= UINT32_MAX - kLengthLen) stream->data = allocate_bytes(kLengthLen + len);
-  CHECK_AS(as, stream->data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",
-           len);
-  stream->len = kLengthLen + len;
-  put_u32(stream->data, len);
-  if (len != 0) memcpy(stream->data + kLengthLen, data, len);
+  if (stream->data != nullptr) stream->len = kLengthLen + len;
+  writer out = {stream->data, stream->len};
+  put_block(&out, {data, len});
+  CHECK_AS(as, out.ok, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)", len);
   return TEE_SUCCESS;
 }
 
@@ -76,13 +75,14 @@ TEE_Result allocate_and_load_data_from_persistent_object(const char *id, uint32_
   tee_length count = 0;
   TRY_LOG(let_go_if_corrupt(&object, TEE_ReadObjectData(object.get(), prefix, kLengthLen, &count)),
           "Failed to read data size, error code 0x%x\n");
-  if (count < kLengthLen) {
+  uint32_t stored_len = 0;
+  reader in = {prefix, static_cast<uint32_t>(count)};
+  if (!take_u32(&in, &stored_len)) {
     *len = static_cast<uint32_t>(count);
     trace_error(__func__, __LINE__, "Unexpected data size\n");
     return TEE_SUCCESS;
   }
 
-  const uint32_t stored_len = get_u32(prefix);
   secret_bytes buffer;
   if (stored_len < UINT32_MAX) buffer.data = allocate_bytes(stored_len + 1);
   CHECK(buffer.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for buffer (size %u)",

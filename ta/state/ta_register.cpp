@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/ta_register.h"
 
+#include "cursor.h"
 #include "failure.h"
-#include "little_endian.h"
 #include "otrp_result.h"
 #include "ownership.h"
 #include "platform.h"
@@ -33,8 +33,10 @@ struct table {
 
 // A new copy of the digest in the image's header, or NULL.
 static uint8_t *read_ta_bin_ta_hash(const uint8_t *ta_image) {
-  const uint16_t len = get_u16(ta_image + kDigestLenOffset);
-  CHECK(len == kDigestLen, nullptr, "read ta hash size should be 32, but hash size is %d", len);
+  uint16_t len = 0;
+  reader in = {ta_image + kDigestLenOffset, kTaImageHeaderLen - kDigestLenOffset};
+  CHECK(take_u16(&in, &len) && len == kDigestLen, nullptr,
+        "read ta hash size should be 32, but hash size is %d", len);
   uint8_t *digest = allocate_bytes(kDigestLen);
   CHECK(digest != nullptr, nullptr, "malloc ta mem get NULL");
   memcpy(digest, ta_image + kDigestOffset, kDigestLen);
@@ -47,10 +49,10 @@ static TEE_Result load_table(table *rows, const char *as = __builtin_FUNCTION())
   const uint8_t no_rows[kCountLen] = {};
   TRY(load_or_create(TA_REGISTER_ID, {no_rows, kCountLen},
                      "can not init ta_register_info " TA_REGISTER_ID, &rows->payload, as));
-  const uint32_t len = rows->payload.len;
-  const uint32_t num_rows = len < kCountLen ? UINT32_MAX : get_u32(rows->payload.data);
-  CHECK_AS(as, len >= kCountLen && num_rows <= (len - kCountLen) / kRowLen, TEE_ERROR_BAD_FORMAT,
-           "ta_register_info holds %u bytes, not %u rows", len, num_rows);
+  reader in = {rows->payload.data, rows->payload.len};
+  uint32_t num_rows = UINT32_MAX;
+  CHECK_AS(as, take_u32(&in, &num_rows) && num_rows <= in.left / kRowLen, TEE_ERROR_BAD_FORMAT,
+           "ta_register_info holds %u bytes, not %u rows", rows->payload.len, num_rows);
   rows->num_rows = num_rows;
   return TEE_SUCCESS;
 }
@@ -75,18 +77,15 @@ static TEE_Result save_table(const table &rows, uint32_t num_before, const char 
   const uint32_t num_rows = num_before + num_new + num_after;
   const uint32_t len = kCountLen + num_rows * kRowLen;
   const tee_ptr<uint8_t> data(allocate_bytes(len));
-  CHECK_AS(as, data, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
-
-  put_u32(data.get(), num_rows);
-  uint8_t *at = data.get() + kCountLen;
-  memcpy(at, rows.row(0), num_before * kRowLen);
-  at += num_before * kRowLen;
+  writer out = {data.get(), data ? len : 0};
+  put_u32(&out, num_rows);
+  put(&out, {rows.row(0), num_before * kRowLen});
   if (digest != nullptr) {
-    memcpy(at, taid, kTaidLen);
-    memcpy(at + kTaidLen, digest, kDigestLen);
-    at += kRowLen;
+    put(&out, {taid, kTaidLen});
+    put(&out, {digest, kDigestLen});
   }
-  memcpy(at, rows.row(rest), num_after * kRowLen);
+  put(&out, {rows.row(rest), num_after * kRowLen});
+  CHECK_AS(as, out.ok, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
 
   const TEE_Result saved =
       save_data_to_persistent_object(data.get(), len, TA_REGISTER_ID, kRegisterIdLen, false);
