@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstdlib>
 #include <limits>
 #include <nlohmann/json.hpp>
 
@@ -152,11 +153,14 @@ const TEEC_UUID kKeyServiceUuid = DEVICE_KEY_SERVICE_UUID;
 Error::Error(std::string_view action, TEEC_Result code, Origin origin, std::string_view detail)
     : std::runtime_error(error_text(action, code, origin, detail)), code_(code), origin_(origin) {}
 
-Buffer::Buffer(size_t size, uint8_t fill) : bytes_(new uint8_t[size]), size_(size) {
-  std::fill_n(bytes_.get(), size, fill);
+// Pages of zeros take no memory before something is written to them.
+Buffer::Buffer(size_t size, uint8_t fill)
+    : bytes_(static_cast<uint8_t *>(calloc(std::max<size_t>(size, 1), 1))), size_(size) {
+  if (!bytes_) throw std::bad_alloc();
+  if (fill != 0) std::fill_n(bytes_.get(), size, fill);
 }
 
-Buffer::Buffer(std::string_view bytes) : bytes_(new uint8_t[bytes.size()]), size_(bytes.size()) {
+Buffer::Buffer(std::string_view bytes) : Buffer(bytes.size(), 0) {
   std::copy(bytes.begin(), bytes.end(), bytes_.get());
 }
 
@@ -191,7 +195,7 @@ TEEC_Result Session::invoke(uint32_t command_id, TEEC_Operation &operation, Orig
 
 Reply Session::invoke(Call call) {
   Buffer output;
-  if (call.capacity > 0) output = Buffer(call.capacity, kUntouched);
+  if (call.capacity > 0) output = Buffer(call.capacity, call.fill);
   TEEC_Operation operation{};
   operation.paramTypes = call.types;
   const bool has_input = is_temporary_memory(call.types, 0);
@@ -267,10 +271,12 @@ Answer parse_answer(std::string_view buffer, size_t size) {
 }
 
 Answer send(Session &agent, const Message &message, std::string_view request, uint32_t capacity) {
-  const Reply reply =
-      agent.invoke({.command_id = OTRP_COMMAND_MESSAGE,
-                    .input = Buffer(build_frame(static_cast<uint32_t>(message.id), request)),
-                    .capacity = capacity});
+  // The capacity is for the longest answer: most of it will not be used.
+  Call call{.command_id = OTRP_COMMAND_MESSAGE,
+            .input = Buffer(build_frame(static_cast<uint32_t>(message.id), request)),
+            .capacity = capacity,
+            .fill = 0};
+  const Reply reply = agent.invoke(std::move(call));
   if (reply.result != TEEC_SUCCESS) throw Error(message.command, reply.result, reply.origin);
   Answer answer = parse_answer(reply.output.bytes(), reply.size);
   answer.request_len = request.size();

@@ -19,6 +19,7 @@ extern "C" {
 }
 
 #include <cstdint>
+#include <cstdlib>
 #include <memory>
 #include <optional>
 #include <stdexcept>
@@ -70,7 +71,10 @@ class Buffer {
   std::string_view bytes() const;
 
  private:
-  std::unique_ptr<uint8_t[]> bytes_;
+  struct Free {
+    void operator()(uint8_t *bytes) const { free(bytes); }
+  };
+  std::unique_ptr<uint8_t[], Free> bytes_;
   size_t size_ = 0;
 };
 
@@ -94,14 +98,16 @@ constexpr uint16_t kMessageTypes =
     TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT, TEEC_NONE, TEEC_NONE);
 constexpr uint8_t kUntouched = 0xA5;  // what an output buffer is full of before a call
 
-/// One invocation. Parameter 0 carries `input` and parameter 1 an output buffer of `capacity` bytes
-/// (absent when 0) where `types`, a nibble each, makes them temporary memory references, whatever
-/// their direction. Other parameters are value pairs of 0 or absent memory.
+/// One invocation. Parameter 0 carries `input` and parameter 1 a buffer of `capacity` bytes for the
+/// output, full of `fill` (absent when 0), where `types`, a nibble each, makes them temporary
+/// memory references, whatever their direction. Other parameters are value pairs of 0 or absent
+/// memory.
 struct Call {
   uint32_t command_id = 0;
   Buffer input;
   uint32_t capacity = 0;
   uint16_t types = kMessageTypes;
+  uint8_t fill = kUntouched;
 };
 
 struct Reply {

@@ -16,6 +16,7 @@ namespace {
 namespace beast = boost::beast;
 using beast::http::error;
 
+constexpr size_t kGrowthDivisor = 8;  // room beyond what a body needs, as a part of it
 constexpr std::string_view kEndOfHead = "\r\n\r\n";
 constexpr char kTooManyHeaders[] = "the headers are more than --max-header and --max-headers allow";
 constexpr char kBodyTooLong[] = "the request is longer than --max-body allows";
@@ -119,6 +120,13 @@ class RequestReader::Parser : public beast::http::basic_parser<true> {
     if (!is_header_done()) request.headers.push_back({std::string(name), std::string(value)});
   }
   size_t on_body_impl(View bytes, Code &) override {
+    // What doubled each time would be held to twice its length, by each of many connections.
+    const size_t len = request.body.size() + bytes.size();
+    if (len > request.body.capacity()) {
+      std::string roomier;
+      roomier.reserve(len + len / kGrowthDivisor);
+      request.body.swap(roomier.append(request.body));
+    }
     request.body.append(bytes.data(), bytes.size());
     return bytes.size();
   }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "http/server.h"
 
+#include <malloc.h>
 #include <openssl/ssl.h>
 #include <sys/resource.h>
 
@@ -36,6 +37,7 @@ constexpr milliseconds kFarewellAtEnd{500};  // when the server ends
 constexpr milliseconds kAnswerAtEnd{1'000};  // likewise
 constexpr size_t kSpareFiles = 64;           // that the process has open beside connections
 constexpr size_t kSmallBodyLen = 16 << 10;   // never refused for what others send
+constexpr int kOwnMappingLen = 128 << 10;
 constexpr std::string_view kContinue = "HTTP/1.1 100 Continue\r\n\r\n";
 
 // ---- Addresses
@@ -547,6 +549,8 @@ static size_t allow_files(size_t num_connections) {
 
 Server::Loop::Loop(ServerOptions options)
     : options_(std::move(options)), workers_(options_.num_workers) {
+  // Bodies come in all lengths: as mappings of their own they leave no holes when they go.
+  mallopt(M_MMAP_THRESHOLD, kOwnMappingLen);
   options_.max_connections = allow_files(options_.max_connections);
 }
 
