@@ -49,11 +49,16 @@ std::string named_code(TEEC_Result code, const tools::ResultName *result) {
   return result == nullptr ? number : number + " (" + result->name + ")";
 }
 
-/// The TEE knows more of its own failures than their codes; codes of others have hints.
+/// The TEE knows more of its own failures than their codes; codes of others have hints. What the
+/// agent says is not there is something else than what a TEE or its Client API does.
 std::string explanation(const tools::ResultName *result, Origin origin) {
   const bool is_of_tee =
       origin == Origin::kClientApi || origin == Origin::kCommunication || origin == Origin::kTee;
   const std::string reason = is_of_tee && inspection() ? inspection()->last_error() : "";
+  if (reason.empty() && is_of_tee && result != nullptr &&
+      result->code == TEEC_ERROR_ITEM_NOT_FOUND) {
+    return "there is no TEE of this name, or it has no such trusted application";
+  }
   return reason.empty() && result != nullptr ? tools::advice(*result) : reason;
 }
 
