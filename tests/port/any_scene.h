@@ -6,9 +6,24 @@
 
 #include <gtest/gtest.h>
 
+#include "common/result_names.h"
 #include "support/manager.h"
 
 namespace otrp_test {
+
+/// Whether an answer has this code; says which it has, by name, and where that arose.
+inline testing::AssertionResult gave(uint32_t expected, uint32_t code, device::Origin origin) {
+  if (code == expected) return testing::AssertionSuccess();
+  return testing::AssertionFailure() << device::Error("answered", code, origin).what()
+                                     << "; expected " << tools::describe_result(expected);
+}
+inline testing::AssertionResult gave(uint32_t expected, const Answer &answer) {
+  return gave(expected, answer.result, answer.origin);
+}
+inline testing::AssertionResult gave(uint32_t expected, const Reply &reply) {
+  if (reply.result != TEEC_SUCCESS) return gave(expected, reply.answer);
+  return gave(expected, reply.status, device::Origin::kStatusWord);
+}
 
 struct AnyDevice : ClientDevice {
   AnyDevice() : ClientDevice(environment("OTRP_TEST_CONTEXT", "")) {}
