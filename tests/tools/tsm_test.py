@@ -5,12 +5,15 @@
 The programs, with what runs them where this machine cannot, are in $OTRP_DEVICE and $OTRP_TSM.
 """
 import base64
+import contextlib
 import hashlib
+import http.server
 import json
 import os
 import shutil
 import subprocess
 import tempfile
+import threading
 import unittest
 
 DEVICE, TSM = (os.environ[name].split() for name in ("OTRP_DEVICE", "OTRP_TSM"))
@@ -79,6 +82,100 @@ class Operator(unittest.TestCase):
     def kept(self, name):
         [device] = os.listdir(self.path("tsm/devices"))
         return f"tsm/devices/{device}/{name}"
+
+
+@contextlib.contextmanager
+def serving(answer):
+    """A server on this machine; `answer` gets method and body, and gives a reply or None."""
+    class Handler(http.server.BaseHTTPRequestHandler):
+        def do_GET(self):
+            body = self.rfile.read(int(self.headers.get("Content-Length", 0)))
+            status, text, headers = answer(f"{self.command} {self.path}", body) or (0, b"", {})
+            if not status:
+                return  # hangs up
+            self.send_response(status)
+            for name, value in {"Content-Length": len(text), **headers}.items():
+                self.send_header(name, str(value))
+            self.end_headers()
+            self.wfile.write(text)
+        do_POST = do_GET
+
+        def log_message(self, *words):
+            pass
+    with http.server.ThreadingHTTPServer(("127.0.0.1", 0), Handler) as server:
+        threading.Thread(target=server.serve_forever, daemon=True).start()
+        yield f"http://127.0.0.1:{server.server_address[1]}"
+        server.shutdown()
+
+
+class OverHttp(Operator):
+    def serve(self, state):
+        started = subprocess.Popen(DEVICE + ["--state", state, "serve", "--listen", "127.0.0.1:0"],
+                                   cwd=self.folder, stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+        self.addCleanup(started.stdout.close)
+        self.addCleanup(started.wait)
+        self.addCleanup(started.terminate)
+        return started.stdout.readline().decode().strip()
+
+    def test_a_served_device_is_managed_as_one_in_a_directory(self):
+        url = self.serve("d")
+        self.tsm(f"manage --url {url}/ get-device-state")  # known from --state
+        self.tsm(f"manage --url {url} create-sd --sp sp --sd sd --sp-cert text", 0, "SD sd")
+        self.write("file", os.urandom(30000))
+        self.tsm("image pack file -o image")
+        self.tsm(f"manage --url {url}/otrp --image-out back install-ta --sp sp --sd sd --ta {TAID} "
+                 "--ta-version 1 --image image", 0, f"TA {TAID}")
+        self.assertEqual(self.read("back"), self.read("image"))
+        self.tsm(f"manage --url {url} create-sd --sp sp --sd sd", 1, "OTRP_SD_EXISTS")
+
+    def test_the_key_of_a_device_is_not_taken_from_its_address(self):
+        url = self.serve("e")
+        unknown = self.tsm(f"manage --url {url} get-device-state", 2, "this TSM does not know")
+        self.assertEqual((unknown.out, len(os.listdir(self.path("tsm/devices")))), (b"", 1))
+        self.tsm(f"manage --url {url} --device device.json get-device-state", 3)  # d's, not e's
+        self.tsm("manage --state f --device device.json get-device-state", 2, "has the key")
+        with open(self.path("e.json"), "w") as file:
+            subprocess.run(["curl", "-s", url + "/info"], stdout=file, check=True)
+        self.tsm(f"manage --url {url} --device e.json get-device-state")
+        self.tsm(f"manage --url {url} get-device-state")
+
+    def test_what_an_address_says_is_told_and_not_believed(self):
+        self.request("get-device-state", "asked")
+        self.send("get-device-state", "asked")
+        earlier, info = self.read("asked.answer"), self.read("device.json")
+        waiting = self.read(self.kept("requests.json"))
+        otrp = {"Content-Type": "application/otrp+json"}
+        for code, text, answer in (
+                (3, "answers another request", (200, earlier, otrp)),
+                (3, "not one JSON object", (200, b"<html>", {})),
+                (1, "without a response", (200, b"", otrp)),
+                (1, "409: more to say", (400, b'{"message":"409: more to say","code":"0x1"}', {})),
+                (1, "404 Not Found: expected the service of a device", (404, b"<html>", {})),
+                (1, "the device may have done it", None)):
+            with self.subTest(text), serving(
+                    lambda call, body: (200, info, {}) if "GET" in call else answer) as url:
+                out = self.tsm(f"manage --url {url} get-device-state", code, text).out
+                self.assertEqual(out, b"")
+        self.assertEqual(json.loads(self.read(self.kept("requests.json")))["waiting"],
+                         json.loads(waiting)["waiting"])
+        self.tsm("manage --url http://127.0.0.1:1 get-device-state", 1, "no connection")
+
+    def test_an_image_that_was_changed_on_its_way_back_is_not_kept(self):
+        self.manage("create-sd --sp sp --sd sd --sp-cert text")
+        self.write("file", "code")
+        self.tsm("image pack file -o image")
+
+        def on_the_way(call, body):
+            if call.startswith("GET"):
+                return 200, self.read("device.json") if "info" in call else b"another", {}
+            self.write("sent", body)
+            self.send("install-ta", "sent")
+            return 200, self.read("sent.answer"), {"OTrP-TA-Image": "/images/1"}
+        with serving(on_the_way) as url:
+            self.tsm(f"manage --url {url} --image-out back install-ta --sp sp --sd sd --ta {TAID} "
+                     "--ta-version 1 --image image", 3, "not the one that it was sent")
+        self.assertFalse(os.path.exists(self.path("back")))
+        self.tsm("show", 0, f"TA {TAID}")
 
 
 class Answers(Operator):

@@ -19,6 +19,12 @@ class ChannelError : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
+/// Nothing came back: nobody is there, or what was sent or answered is lost.
+class NoAnswer : public ChannelError {
+ public:
+  using ChannelError::ChannelError;
+};
+
 struct ChannelAnswer {
   std::string response;        // empty when the device only says that it failed
   std::optional<Bytes> image;  // that the device hands back
@@ -33,11 +39,17 @@ class Channel {
   /// As the device itself says, which proves nothing.
   virtual DeviceInfo info() = 0;
 
-  virtual ChannelAnswer send(const Message &message, const std::string &request) = 0;
+  /// The image is brought only when it is wanted.
+  virtual ChannelAnswer send(const Message &message, const std::string &request,
+                             bool wants_image) = 0;
 };
 
 /// A device on this machine, which is this process's alone while the channel lives.
 std::unique_ptr<Channel> open_local_device(const std::string &state_directory);
+
+/// A device that is served over HTTP below `url`. `ca_file` has the only roots to trust for https;
+/// empty: those of the system. Throws tools::UsageError for a URL or a file that is none.
+std::unique_ptr<Channel> open_served_device(const std::string &url, const std::string &ca_file);
 
 }  // namespace tsm
 

@@ -6,13 +6,14 @@
 
 #include "common/error_line.h"
 #include "common/files.h"
-#include "tsm/channel.h"
+#include "tsm/dsi.h"
 #include "tsm/exchange.h"
 #include "tsm/home.h"
 #include "tsm/image.h"
 #include "tsm/operator_input.h"
 #include "tsm/report.h"
 #include "tsm/response.h"
+#include "tsm/target.h"
 
 namespace tsm {
 namespace {
@@ -52,10 +53,6 @@ int finish(const Arguments &arguments, const Exchange &done) {
   return refusal.empty() && done.failure.empty() ? 0 : tools::kExitRefused;
 }
 
-DeviceInfo read_device_file(const std::string &file) {
-  return parse_device_info(tools::read_file(file));
-}
-
 }  // namespace
 
 int run_init(const Arguments &arguments) {
@@ -68,12 +65,13 @@ int run_init(const Arguments &arguments) {
 }
 
 int run_request(const Arguments &arguments) {
+  const Order order = read_order(arguments);
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
   DeviceRecord record = home.open_record(read_device_file(arguments.device_file));
   const std::optional<Json> dsi = state_for(arguments.message, record, arguments.dsi_file);
   tools::OutputFile output(arguments.output_file);
-  output.write(make_kept_request(arguments, tsm, dsi, &record).text);
+  output.write(make_kept_request(order, tsm, dsi, &record).text);
   return 0;
 }
 
@@ -127,10 +125,13 @@ int run_image_show(const Arguments &arguments) {
 int run_manage(const Arguments &arguments) {
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
+  const Target target = target_of(arguments);
+  const Order order = read_order(arguments);
   try {
-    const std::unique_ptr<Channel> channel = open_local_device(arguments.state_dir);
-    DeviceRecord record = home.open_record(channel->info());
-    return finish(arguments, exchange(arguments, tsm, channel.get(), &record));
+    const std::unique_ptr<Channel> channel = open_channel(target);
+    DeviceRecord record = home.open_record(identify(target, home, channel.get()));
+    return finish(arguments, exchange(order, tsm, channel.get(), &record,
+                                      {arguments.dsi_out_file, arguments.image_out_file}));
   } catch (const ChannelError &error) {
     tools::print_error_line("otrp-tsm", error.what());
     return tools::kExitRefused;

@@ -31,6 +31,8 @@ struct Arguments {
   std::string image_out_file;
   std::string spcert;  // a file, or the certificate itself
   std::string state_dir;
+  std::string url;
+  std::string tls_ca_file;
   std::vector<std::string> codes;        // to explain
   std::vector<std::string> input_files;  // to inspect
   std::vector<std::string> key_files;

@@ -5,6 +5,8 @@
 #include <cstdio>
 #include <vector>
 
+#include "common/error_line.h"
+
 namespace tsm {
 namespace {
 
@@ -93,6 +95,14 @@ bool is_dsi_document(const Json &document) {
   const Json *sdlist = tee == nullptr ? nullptr : find_object(*tee, "sdlist");
   return sdlist != nullptr && find_array(*sdlist, "sd") != nullptr &&
          find_array(*tee, "teeaiklist") != nullptr;
+}
+
+Json parse_dsi(std::string_view text) {
+  const std::optional<Json> dsi = parse_json(text);
+  if (!dsi || !is_dsi_document(*dsi)) {
+    throw tools::UsageError("not a device state document: expected what --dsi-out wrote");
+  }
+  return *dsi;
 }
 
 std::optional<RsaKey> find_aik(const Json &document, std::string_view spid) {

@@ -23,6 +23,9 @@ std::string dsi_hash(const Json &document);
 /// Whether the document has its two lists.
 bool is_dsi_document(const Json &document);
 
+/// Reads a document as --dsi-out writes it; throws tools::UsageError.
+Json parse_dsi(std::string_view text);
+
 /// The AIK of a service provider; nothing when the device lists none, or no RSA key.
 std::optional<RsaKey> find_aik(const Json &document, std::string_view spid);
 

@@ -3,10 +3,12 @@
 
 #include "common/files.h"
 #include "common/result_names.h"
-#include "tsm/operator_input.h"
+#include "tsm/dsi.h"
 
 namespace tsm {
 namespace {
+
+using tools::UsageError;
 
 /// Nothing for a file that is not wanted.
 std::optional<tools::OutputFile> open_output(const std::string &path) {
@@ -14,14 +16,81 @@ std::optional<tools::OutputFile> open_output(const std::string &path) {
   return tools::OutputFile(path);
 }
 
+struct Outputs {
+  explicit Outputs(const OutputNames &names)
+      : dsi(open_output(names.dsi)), image(open_output(names.image)) {}
+
+  std::optional<tools::OutputFile> dsi;
+  std::optional<tools::OutputFile> image;
+};
+
+bool quotes_dsi(MessageId id) {
+  return id != MessageId::kGetDeviceState && id != MessageId::kGetTaInfo;
+}
+
+void check_certificate(const Order &order, const std::optional<Json> &dsi) {
+  const RequestOptions &options = order.options;
+  if (!options.spcert.empty()) return;
+  if (order.message == MessageId::kUpdateSd && options.renew_aik) {
+    throw UsageError("--renew-aik needs --sp-cert: expected the SP's new certificate");
+  }
+  const bool is_known = dsi && find_aik(*dsi, options.spid);
+  if (order.message == MessageId::kCreateSd && !is_known) {
+    throw UsageError("the device does not know service provider \"" + options.spid +
+                     "\" yet: expected its certificate in --sp-cert");
+  }
+}
+
+/// What the order says, and what the device's state adds to it.
+RequestOptions options_for(const Order &order, const std::optional<Json> &dsi) {
+  RequestOptions options = order.options;
+  if (quotes_dsi(order.message)) {
+    if (!dsi) {
+      throw UsageError(
+          "the state of the device is not known yet: send get-device-state first, or name a "
+          "document of --dsi-out with --dsi");
+    }
+    options.dsihash = dsi_hash(*dsi);
+  }
+  check_certificate(order, dsi);
+  return options;
+}
+
+/// Sends the request, and takes and keeps its answer.
+Exchange ask(const Order &order, const MadeRequest &request, const ResponseKeys &keys,
+             Outputs *outputs, Channel *channel, DeviceRecord *record) {
+  const ChannelAnswer answer =
+      channel->send(message_of(order.message), request.text, outputs->image.has_value());
+  if (answer.response.empty()) throw ChannelError(answer.failure);
+  Exchange done = {.response = open_response(answer.response, keys),
+                   .tie = Tie::kUnchecked,
+                   .failure = answer.failure,
+                   .image = answer.image};
+  tools::keep_or_print(answer.response, [&] {
+    done.tie = record->take(done.response, {.named = request.sent});
+    if (done.response.dsi_text && outputs->dsi) outputs->dsi->write(*done.response.dsi_text);
+  });
+  return done;
+}
+
+void keep_image(const Order &order, tools::OutputFile *file, Exchange *done) {
+  if (done->image && *done->image != order.options.image) {
+    throw NotVerified("the TA image that the device handed back is not the one that it was sent");
+  }
+  if (done->image) {
+    file->write(*done->image);
+  } else if (done->failure.empty() && !done->response.error_code) {
+    done->failure = "the device handed back no TA image: the file for it is not written";
+  }
+}
+
 }  // namespace
 
-MadeRequest make_kept_request(const Arguments &arguments, const Identity &tsm,
+MadeRequest make_kept_request(const Order &order, const Identity &tsm,
                               const std::optional<Json> &dsi, DeviceRecord *record) {
-  const RequestOptions options = prepare_options(arguments, dsi);
   MadeRequest made;
-  made.text =
-      make_request(arguments.message, options, tsm, record->device(), dsi ? &*dsi : nullptr);
+  made.text = make_request(order.message, options_for(order, dsi), tsm, record->device(),
+                           dsi ? &*dsi : nullptr);
   made.sent = read_request(made.text, tsm.key);
   record->add(made.sent);
   return made;
@@ -34,29 +103,25 @@ std::optional<Json> state_for(MessageId message, const DeviceRecord &record,
   return record.dsi();
 }
 
-Exchange exchange(const Arguments &arguments, const Identity &tsm, Channel *channel,
-                  DeviceRecord *record) {
-  std::optional<tools::OutputFile> dsi_out = open_output(arguments.dsi_out_file);
-  std::optional<tools::OutputFile> image_out = open_output(arguments.image_out_file);
-  const std::optional<Json> dsi = state_for(arguments.message, *record, "");
-  const MadeRequest request = make_kept_request(arguments, tsm, dsi, record);
-
-  const ChannelAnswer answer = channel->send(message_of(arguments.message), request.text);
-  if (answer.response.empty()) {
+Exchange exchange(const Order &order, const Identity &tsm, Channel *channel, DeviceRecord *record,
+                  const OutputNames &outputs) {
+  Outputs files(outputs);
+  const std::optional<Json> dsi = state_for(order.message, *record, "");
+  const MadeRequest request = make_kept_request(order, tsm, dsi, record);
+  const ResponseKeys keys = {
+      .tee_key = record->device().tee_key, .tsm_key = tsm.key, .dsi = dsi ? &*dsi : nullptr};
+  std::optional<Exchange> done;
+  try {
+    done = ask(order, request, keys, &files, channel, record);
+  } catch (const ChannelError &) {
+    record->forget(request.sent);  // nobody will bring its answer any more
+    throw;
+  } catch (const NotVerified &) {
     record->forget(request.sent);
-    throw ChannelError(answer.failure);
+    throw;
   }
-  Exchange done = {.response = open_response(answer.response, {.tee_key = record->device().tee_key,
-                                                               .tsm_key = tsm.key,
-                                                               .dsi = dsi ? &*dsi : nullptr}),
-                   .tie = Tie::kUnchecked,
-                   .failure = answer.failure};
-  tools::keep_or_print(answer.response, [&] {
-    done.tie = record->take(done.response, {.named = request.sent});
-    if (done.response.dsi_text && dsi_out) dsi_out->write(*done.response.dsi_text);
-  });
-  if (answer.image && image_out) image_out->write(*answer.image);
-  return done;
+  if (files.image) keep_image(order, &*files.image, &*done);
+  return *done;
 }
 
 std::string refusal_of(const Response &response) {

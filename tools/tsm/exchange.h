@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// One message to one device, from the operator's words to the kept answer.
+/// One message to one device, from the order to the kept answer.
 #ifndef TSM_EXCHANGE_H
 #define TSM_EXCHANGE_H
 
@@ -7,26 +7,34 @@
 #include <string>
 
 #include "tsm/channel.h"
-#include "tsm/commands.h"
-#include "tsm/home.h"
+#include "tsm/device_record.h"
+#include "tsm/request.h"
 #include "tsm/response.h"
 #include "tsm/waiting.h"
 
 namespace tsm {
 
+/// A message that is to be sent, whatever the device.
+struct Order {
+  MessageId message;
+  RequestOptions options;
+};
+
 /// A verified response, and how it is known to answer what was asked.
 struct Exchange {
   Response response;
   Tie tie;
-  std::string failure = {};  // what the device failed with although it answered; or empty
+  std::string failure = {};         // what the device failed with although it answered; or empty
+  std::optional<Bytes> image = {};  // that the device handed back, where that was wanted
 };
 
-/// A request whose answer `record` waits for from now on.
+/// A request whose answer `record` waits for from now on. `dsi` is the last known state of the
+/// device, without which tools::UsageError is thrown where the message cannot do without.
 struct MadeRequest {
   std::string text;
   SentRequest sent;
 };
-MadeRequest make_kept_request(const Arguments &arguments, const Identity &tsm,
+MadeRequest make_kept_request(const Order &order, const Identity &tsm,
                               const std::optional<Json> &dsi, DeviceRecord *record);
 
 /// The state that `message` is made from: the one in `dsi_file` or, when that is empty, the kept
@@ -34,10 +42,18 @@ MadeRequest make_kept_request(const Arguments &arguments, const Identity &tsm,
 std::optional<Json> state_for(MessageId message, const DeviceRecord &record,
                               const std::string &dsi_file);
 
-/// Sends the message that `arguments` name. The response is kept, or printed where it cannot be.
+/// Files for what an answer brings; not written where they are empty.
+struct OutputNames {
+  std::string dsi = {};
+  std::string image = {};
+};
+
+/// Sends a message. The response is kept, or printed where it cannot be. The image that the device
+/// hands back must be the one that it was sent.
+///
 /// Throws tools::UsageError, NotVerified or ChannelError.
-Exchange exchange(const Arguments &arguments, const Identity &tsm, Channel *channel,
-                  DeviceRecord *record);
+Exchange exchange(const Order &order, const Identity &tsm, Channel *channel, DeviceRecord *record,
+                  const OutputNames &outputs = {});
 
 /// Why a verified response is a refusal, with its code; empty when it is none.
 std::string refusal_of(const Response &response);

@@ -119,6 +119,12 @@ std::string Home::folder_of(const DeviceInfo &device) const {
   return path("devices/" + device.tee_key.fingerprint());
 }
 
+std::optional<DeviceInfo> Home::find_device(const std::string &fingerprint) const {
+  const std::string file = path("devices/" + fingerprint + "/device.json");
+  if (!tools::file_exists(file)) return std::nullopt;
+  return read_device(file);
+}
+
 std::vector<KnownDevice> Home::known_devices() const {
   require_identity();
   std::vector<KnownDevice> known;

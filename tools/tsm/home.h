@@ -12,6 +12,7 @@
 #ifndef TSM_HOME_H
 #define TSM_HOME_H
 
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -40,6 +41,9 @@ class Home {
     return DeviceRecord(folder_of(device), device);
   }
   std::string folder_of(const DeviceInfo &device) const;
+
+  /// The device whose key has this fingerprint, if something was ever sent to it.
+  std::optional<DeviceInfo> find_device(const std::string &fingerprint) const;
 
   /// Those that have been sent something, by their IDs.
   std::vector<KnownDevice> known_devices() const;

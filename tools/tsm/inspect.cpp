@@ -7,9 +7,9 @@
 #include <filesystem>
 
 #include "common/files.h"
+#include "tsm/dsi.h"
 #include "tsm/home.h"
 #include "tsm/inspect_input.h"
-#include "tsm/operator_input.h"
 
 namespace tsm {
 namespace {

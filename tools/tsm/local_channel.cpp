@@ -27,7 +27,7 @@ class LocalChannel : public Channel {
     return {info.device_id, *tee_key};
   }
 
-  ChannelAnswer send(const Message &message, const std::string &request) override {
+  ChannelAnswer send(const Message &message, const std::string &request, bool) override {
     return with_device([&] {
       const device::Message &known = *device::find_message(message.command);
       device::Session agent(device_, device::kAgentUuid);
@@ -53,7 +53,11 @@ class LocalChannel : public Channel {
 }  // namespace
 
 std::unique_ptr<Channel> open_local_device(const std::string &state_directory) {
-  return with_device([&] { return std::make_unique<LocalChannel>(state_directory); });
+  try {
+    return std::make_unique<LocalChannel>(state_directory);
+  } catch (const device::Error &error) {
+    throw NoAnswer(error.what());
+  }
 }
 
 }  // namespace tsm

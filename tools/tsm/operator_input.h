@@ -1,23 +1,16 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// From what an operator typed to what a request needs: files are read and
-/// checked against what the message and the device need. Everything here throws tools::UsageError.
+/// From what an operator typed to what a message needs: files are read and checked. Everything here
+/// throws tools::UsageError.
 #ifndef TSM_OPERATOR_INPUT_H
 #define TSM_OPERATOR_INPUT_H
 
-#include <optional>
-#include <string>
-
 #include "tsm/commands.h"
-#include "tsm/json.h"
+#include "tsm/exchange.h"
 
 namespace tsm {
 
-/// Parses a state document as --dsi-out writes it.
-Json parse_dsi(const std::string &text);
-
-/// The complete options of the request that `arguments` ask for. `dsi` is the last known state of
-/// the device; the messages that change something cannot do without.
-RequestOptions prepare_options(const Arguments &arguments, const std::optional<Json> &dsi);
+/// The message that `arguments` name. Reads each file once, however many devices there are.
+Order read_order(const Arguments &arguments);
 
 }  // namespace tsm
 
