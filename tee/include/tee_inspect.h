@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// Looking into the host TEE from outside, for developers: the stored objects of a trusted
-/// application and the figures of its heap. A real device offers nothing of the kind.
+/// application, the figures of its heap, its trace. A real device offers nothing of the kind.
 ///
 /// `context` is initialized, `uuid` the trusted application, which need not run. IDs are any bytes,
 /// of up to 64. What else than the codes named below can come is TEEC_ERROR_BAD_PARAMETERS and the
@@ -57,6 +57,11 @@ TEEC_Result tee_inspect_remove(TEEC_Context *context, const TEEC_UUID *uuid, con
 /// directory X is in use by another process"); empty when there is nothing to add. Never NULL;
 /// valid until the thread's next call.
 const char *tee_inspect_last_error(void);
+
+/// Hands the lines of the trace that this thread's calls cause to `take`, each with its line feed,
+/// in place of standard error; NULL: to standard error again. `take` gets `closure`, a line that is
+/// valid during the call only, and its length. It must not call into the device.
+void tee_inspect_trace(void (*take)(void *closure, const char *line, size_t len), void *closure);
 
 #ifdef __cplusplus
 }

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include <sys/syscall.h>
+#include <tee_inspect.h>
 #include <tee_test.h>
 #include <tee_trace.h>
 #include <unistd.h>
@@ -23,6 +24,10 @@ constexpr char kNoPrefix[] = "TEE";
 
 std::mutex g_sinks_lock;
 std::vector<test::TraceSink::Impl *> g_sinks;  // innermost last
+
+// Where this thread's lines go, but for a sink; NULL: standard error.
+thread_local void (*t_take)(void *closure, const char *line, size_t len);
+thread_local void *t_closure;
 
 const char *tag_of(int level) {
   switch (level) {
@@ -68,6 +73,7 @@ void print(const char *tag, const char *function, int line, const std::string &m
                 running != nullptr ? running->instance().program.trace_prefix.c_str() : kNoPrefix,
                 function, line);
   const std::string text = where + message + '\n';
+  if (t_take != nullptr) return t_take(t_closure, text.data(), text.size());
   // One write, so that lines of several threads and processes do not mix.
   [[maybe_unused]] const ssize_t written = ::write(STDERR_FILENO, text.data(), text.size());
 }
@@ -134,4 +140,9 @@ void tee_trace(const char *function, int line, int level, const char *format, ..
     // A line is lost; the trusted application goes on.
   }
   va_end(args);
+}
+
+void tee_inspect_trace(void (*take)(void *closure, const char *line, size_t len), void *closure) {
+  t_take = take;
+  t_closure = closure;
 }
