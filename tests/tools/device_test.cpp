@@ -195,6 +195,25 @@ TEST_F(DeviceProgram, FailedMessageLeavesNoFile) {
   EXPECT_EQ(asked.out, "{\"status\":\"-1\",\"msg\":\"ta_info not found in otrp\"}\n");
 }
 
+TEST_F(DeviceProgram, MakesNoDeviceUnnoticed) {
+  const Outcome refused = run("--existing info");
+  EXPECT_EQ(refused.exit_code, 2);
+  EXPECT_THAT(refused.err, HasSubstr("otrp-device: no device in state"));
+  EXPECT_FALSE(std::filesystem::exists(path("state")));
+  EXPECT_EQ(run("info").err, "note: made a new device in " + path("state") + "\n");
+  EXPECT_EQ(run("--existing info").err, "");
+}
+
+TEST_F(DeviceProgram, LogOfTheAgentIsShownWithFailuresOrWhenItIsWanted) {
+  for (const auto &[command, is_shown] : {std::pair("device-id", false),
+                                          {"device-id --trace", true},
+                                          {"query unknown", true},
+                                          {"invoke 2 - /dev/null --capacity 64", true}}) {
+    std::filesystem::remove_all(path("state"));  // the first start has something to log
+    EXPECT_EQ(run(command).err.find("ERR [") != std::string::npos, is_shown) << command;
+  }
+}
+
 TEST_F(DeviceProgram, ObjectsOfAnyNameAreStoredListedAndRemoved) {
   const std::string data = "\0raw\xFF"s;
   EXPECT_EQ(run("objects put -- '-\\x00\\x5c' -", data).exit_code, 0);

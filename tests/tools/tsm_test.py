@@ -257,6 +257,7 @@ class Requests(Operator):
                 sd + "sd --dsi device.json" + device, sd + "sd --sp-cert \udcff" + device,
                 sd + "s\1" + device, sd + "\udcff" + device, sd + "x" * 57 + device,
                 "request install-ta --sd sd --sp sp --ta short --ta-version 1 --image file" + device,
+                "request update-ta --sd sd --sp sp --ta short --ta-version 1 --image file" + device,
                 f"request install-ta --sd sd --sp sp --ta {TAID} --ta-version 1 --image file" + device,
                 "request delete-sd --sd sd --delete-ta maybe" + device,
                 "response missing.json --device device.json", "response file --device device.json",
@@ -286,6 +287,27 @@ class Requests(Operator):
         self.request(install + "other", "made", code=2, text="no AIK")
         os.remove(self.path("tsm/ca-tsm.pem"))
         self.request(install + "sp", "made", code=2, text="CA-TSM key's signature")
+
+
+    def test_a_certificate_is_a_file_or_plainly_a_text(self):
+        self.write("certs.txt", "from a file")
+        os.mkdir(self.path("certs"))
+        create = "request create-sd --sp sp --sd sd --device device.json -o made --sp-cert "
+        for value in ("bank.pem", "./bank", "/bank", "certs/bank", "../x", "certs"):
+            self.tsm(create + value, 2, value)
+            self.tsm(create + "text:" + value)
+        self.tsm(create + "certs.txt")
+        for value in ("MII/ab+c=", "1.0", "text", "x." + "y" * 300):
+            self.tsm(create + value)
+
+    def test_the_agent_is_heard_when_something_failed(self):
+        create = "create-sd --sp sp --sd sd --sp-cert text"
+        self.assertEqual(self.manage(create).err, "")
+        self.assertIn("ERR [", self.manage(create, 1).err)
+        self.assertIn("ERR [", self.manage("--trace create-sd --sp sp --sd more").err)
+        self.tsm("manage --state typo --existing get-device-state", 2, "no device in typo")
+        self.assertFalse(os.path.exists(self.path("typo")))
+        self.tsm("manage --state e get-device-state", 0, f"note: made a new device in {self.folder}/e")
 
 
 class HomeFolder(Operator):

@@ -6,12 +6,14 @@
 #include <optional>
 
 #include "common/files.h"
+#include "device/agent_log.h"
 #include "device/device_client.h"
 #include "device/envelope.h"
 #include "device/info_json.h"
 #include "device/inspect.h"
 #include "device/object_id.h"
 #include "device/raw_session.h"
+#include "device/state_directory.h"
 
 namespace device {
 namespace {
@@ -53,12 +55,17 @@ class StatsAtEnd {
   Device &device_;
 };
 
+struct OpenDevice : StateDevice {
+  explicit OpenDevice(const Arguments &arguments)
+      : StateDevice(arguments.state_directory, arguments.must_exist) {}
+};
+
 /// A device with a session to the agent.
 struct OpenAgent {
   explicit OpenAgent(const Arguments &arguments)
-      : device(arguments.state_directory), session(device, kAgentUuid), stats(arguments, device) {}
+      : device(arguments), session(device, kAgentUuid), stats(arguments, device) {}
 
-  Device device;
+  OpenDevice device;
   Session session;
   StatsAtEnd stats;
 };
@@ -98,7 +105,8 @@ std::optional<tools::OutputFile> open_image_file(const Arguments &arguments) {
 }  // namespace
 
 void print_info(const Arguments &arguments) {
-  Device device(arguments.state_directory);
+  const AgentLog log(arguments.trace);
+  OpenDevice device(arguments);
   const StatsAtEnd stats(arguments, device);
   print(info_json(read_info(device)));
 }
@@ -111,8 +119,10 @@ void send_request(const Arguments &arguments) {
 
   tools::OutputFile response_file(arguments.response_file);
   std::optional<tools::OutputFile> image_file = open_image_file(arguments);
+  AgentLog log(arguments.trace);
   OpenAgent agent(arguments);
   const Answer answer = send(agent.session, message, request, capacity);
+  if (verdict_of_response(answer.response) != "pass") log.show();
   if (!answer.response.empty()) {
     tools::keep_or_print(answer.response, [&] { response_file.write(answer.response); });
   }
@@ -124,6 +134,8 @@ void send_request(const Arguments &arguments) {
 }
 
 void query_ta(const Arguments &arguments) {
+  (void)build_query(arguments.taid);  // throws for what no device is opened for
+  const AgentLog log(arguments.trace);
   OpenAgent agent(arguments);
   const QueryAnswer answer = query(agent.session, arguments.taid);
   print(answer.text + "\n");
@@ -131,12 +143,13 @@ void query_ta(const Arguments &arguments) {
 }
 
 void print_device_id(const Arguments &arguments) {
+  const AgentLog log(arguments.trace);
   OpenAgent agent(arguments);
   print(device_id(agent.session) + "\n");
 }
 
 void list_objects(const Arguments &arguments) {
-  Device device(arguments.state_directory);
+  OpenDevice device(arguments);
   std::string lines;
   for (const StoredObject &object : inspection()->list_objects(device)) {
     lines += show_object_id(object.id) + "\t" + std::to_string(object.size) + "\n";
@@ -146,20 +159,20 @@ void list_objects(const Arguments &arguments) {
 
 void get_object(const Arguments &arguments) {
   const std::string id = parse_object_id(arguments.object_id);
-  Device device(arguments.state_directory);
+  OpenDevice device(arguments);
   print(inspection()->get_object(device, id));
 }
 
 void put_object(const Arguments &arguments) {
   const std::string id = parse_object_id(arguments.object_id);
   const std::string data = tools::read_file(arguments.object_file);
-  Device device(arguments.state_directory);
+  OpenDevice device(arguments);
   inspection()->put_object(device, id, data);
 }
 
 void remove_object(const Arguments &arguments) {
   const std::string id = parse_object_id(arguments.object_id);
-  Device device(arguments.state_directory);
+  OpenDevice device(arguments);
   inspection()->remove_object(device, id);
 }
 
@@ -177,14 +190,14 @@ void invoke_once(const Arguments &arguments) {
 }
 
 void obey_session(const Arguments &arguments) {
-  Device device(arguments.state_directory);
+  OpenDevice device(arguments);
   std::optional<Session> agent;
   const StatsAtEnd stats(arguments, device);
   run_session(device, std::cin, agent);
 }
 
 void serve(const Arguments &arguments) {
-  serve_device(arguments.state_directory, arguments);
+  serve_device(arguments);
 }
 
 }  // namespace device

@@ -14,7 +14,6 @@ constexpr const char *kProgram = "otrp-device";
 
 /// What the command line says, as it stands there.
 struct Arguments : ServeArguments {
-  std::string state_directory;  // or what else names the device to the Client API
   bool stats = false;
   std::string message;
   std::string request_file;

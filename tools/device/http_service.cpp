@@ -8,6 +8,7 @@
 #include "common/agent_codes.h"
 #include "common/error_line.h"
 #include "common/result_names.h"
+#include "device/agent_log.h"
 #include "device/envelope.h"
 #include "device/info_json.h"
 
@@ -93,8 +94,8 @@ uint32_t capacity_for(std::string_view request) {
 
 }  // namespace
 
-HttpService::HttpService(Device &device, const std::string &state_directory)
-    : device_(device), state_(state_directory) {
+HttpService::HttpService(Device &device, const std::string &state_directory, bool traces)
+    : device_(device), state_(state_directory), traces_(traces) {
   add_routes();
 }
 
@@ -140,9 +141,13 @@ void HttpService::add_routes() {
 template <class Answering>
 http::Answer HttpService::use_device(Answering &&answering) {
   if (!state_.is_there()) return http::failure(500, kStateIsGone);
+  AgentLog log(traces_);
   try {
-    return answering();
+    http::Answer answer = answering();
+    if (answer.status != 200 || answer.note.starts_with("fail")) log.show();
+    return answer;
   } catch (const Error &error) {
+    log.show();
     if (error.origin() != Origin::kStatusWord) agent_.reset();
     return device_failure(error, status_of(error.code()));
   } catch (const tools::UsageError &error) {

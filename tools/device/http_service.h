@@ -30,7 +30,8 @@ namespace device {
 /// agent stays open, so that a TSM finds the device state as its last response described it.
 class HttpService {
  public:
-  HttpService(Device &device, const std::string &state_directory);
+  /// With `traces` all that the agent logs is printed, else what it logs of a failure.
+  HttpService(Device &device, const std::string &state_directory, bool traces);
 
   http::Handler &handler() { return router_; }
 
@@ -58,6 +59,7 @@ class HttpService {
   std::optional<Session> agent_;
   std::deque<KeptImage> images_;
   uint64_t num_images_ = 0;
+  bool traces_;
 };
 
 }  // namespace device

@@ -83,6 +83,14 @@ void remove_object(Device &device, std::string_view id) {
         "cannot remove the object");
 }
 
+void add_line(void *closure, const char *line, size_t len) {
+  static_cast<std::string *>(closure)->append(line, len);
+}
+
+void collect_trace(std::string *lines) {
+  tee_inspect_trace(lines == nullptr ? nullptr : add_line, lines);
+}
+
 constexpr Inspection kInspection = {
     .last_error = last_error,
     .heap_figures = heap_figures,
@@ -90,6 +98,7 @@ constexpr Inspection kInspection = {
     .get_object = get_object,
     .put_object = put_object,
     .remove_object = remove_object,
+    .collect_trace = collect_trace,
 };
 
 }  // namespace

@@ -30,6 +30,8 @@ struct Inspection {
   std::string (*get_object)(Device &device, std::string_view id);
   void (*put_object)(Device &device, std::string_view id, std::string_view data);
   void (*remove_object)(Device &device, std::string_view id);
+  /// The trace of this thread's calls is added to `*lines`; NULL: it goes to standard error again.
+  void (*collect_trace)(std::string *lines);
 };
 
 /// NULL where the TEE does not let anyone look.

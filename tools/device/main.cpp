@@ -181,6 +181,9 @@ void add_commands(CLI::App *app, std::span<const Command> commands, Arguments &a
 
 /// What only a TEE for developers lets one see.
 void add_inspection(CLI::App *app, Arguments &arguments, const Command *&chosen) {
+  app->add_flag("--existing", arguments.must_exist, "Make no device where there is none");
+  app->add_flag("--trace", arguments.trace,
+                "Show all that the agent logs; else a failed command does, and invoke and session");
   app->add_flag("--stats", arguments.stats, "Print the agent's heap figures to standard error");
   CLI::App *objects = app->add_subcommand("objects", "Look at the agent's stored objects");
   objects->footer(footer("IDs show bytes outside printable ASCII, and the backslash, as \\xNN.\n",

@@ -8,6 +8,7 @@
 #include "device/commands.h"
 #include "device/http_service.h"
 #include "device/raw_session.h"
+#include "device/state_directory.h"
 #include "http/server.h"
 
 namespace device {
@@ -69,12 +70,12 @@ http::ListenOptions listen_options(const ServeArguments &arguments) {
 
 }  // namespace
 
-void serve_device(const std::string &state_directory, const ServeArguments &arguments) {
+void serve_device(const ServeArguments &arguments) {
   const http::Endpoint endpoint = http::parse_endpoint(arguments.listen);
   http::ListenOptions options = listen_options(arguments);
   http::Server server(server_options(arguments));
-  Device device(state_directory);
-  HttpService service(device, state_directory);
+  StateDevice device(arguments.state_directory, arguments.must_exist);
+  HttpService service(device, arguments.state_directory, arguments.trace);
   tools::write_file("-", server.listen(endpoint, service.handler(), std::move(options)) + "\n");
   server.run();
 }

@@ -8,8 +8,15 @@
 
 namespace device {
 
+/// The device that the command line names.
+struct DeviceArguments {
+  std::string state_directory;  // or what else names it to the Client API
+  bool must_exist = false;
+  bool trace = false;  // show all that the agent logs
+};
+
 /// Numbers as the command line gives them; empty ones are the server's defaults.
-struct ServeArguments {
+struct ServeArguments : DeviceArguments {
   std::string listen = "127.0.0.1:8080";
   std::vector<std::string> allowed_hosts;
   std::string tls_cert;
@@ -28,7 +35,7 @@ struct ServeArguments {
 
 /// When it listens, the URL is on standard output; each exchange is a line on standard error.
 /// Throws tools::UsageError for what cannot be done so.
-void serve_device(const std::string &state_directory, const ServeArguments &arguments);
+void serve_device(const ServeArguments &arguments);
 
 }  // namespace device
 

@@ -42,10 +42,15 @@ class Channel {
   /// The image is brought only when it is wanted.
   virtual ChannelAnswer send(const Message &message, const std::string &request,
                              bool wants_image) = 0;
+
+  /// What the device logged since it was last asked, where that is to be had.
+  virtual std::string take_log() { return ""; }
 };
 
-/// A device on this machine, which is this process's alone while the channel lives.
-std::unique_ptr<Channel> open_local_device(const std::string &state_directory);
+/// A device on this machine, which is this process's alone while the channel lives. One that is not
+/// there is made, and a line on standard error says so; with `must_exist` that is a
+/// tools::UsageError.
+std::unique_ptr<Channel> open_local_device(const std::string &state_directory, bool must_exist);
 
 /// A device that is served over HTTP below `url`. `ca_file` has the only roots to trust for https;
 /// empty: those of the system. Throws tools::UsageError for a URL or a file that is none.

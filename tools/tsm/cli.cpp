@@ -37,7 +37,7 @@ std::string check_plain(const std::string &value) {
   return is_plain ? "" : "expected printable ASCII characters, no \" or \\";
 }
 
-/// A TA of another ID would be kept by the device, which then could not register its image.
+/// A TA of another ID would be recorded by the device, which then could not register its image.
 std::string check_taid(const std::string &taid) {
   return taid.size() == kTaidLen ? "" : "expected 32 characters, such as a UUID without its dashes";
 }
@@ -107,11 +107,11 @@ void add_message_options(CLI::App *command, const MessageHelp &help, Arguments *
   if (help.options & kTa) {
     CLI::Option *ta = require_name(command, "--ta,--taid", &request.taid, "TA's ID");
     if (is_raw) ta->check(validator(check_plain));
-    if (help.id == MessageId::kInstallTa) ta->check(validator(check_taid));
+    if (help.options & kImage) ta->check(validator(check_taid));
   }
   if (help.options & kSpCert) {
     command->add_option("--sp-cert", arguments->spcert,
-                        "SP's certificate: a file, or the text itself");
+                        "SP's certificate: a file, or the text itself, as it is or behind text:");
   }
   if (help.options & kDid) {
     command->add_option("--did", request.did, "Device ID to claim (default: the device's)");
@@ -219,6 +219,9 @@ const Command kCommands[] = {
        "Device file that says who the device is (default: what this TSM knows of it)"},
       {"--ca-file", &Arguments::tls_ca_file,
        "PEM file of the only CAs to trust for https (default: the system's)"},
+      {"--existing", &Arguments::must_exist, "Make no device where there is none"},
+      {"--trace", &Arguments::trace,
+       "Show all that the agent logs (else what it logs of a failure)"},
       kDsiOut,
       {"--image-out", &Arguments::image_out_file,
        "Write the TA image that the device hands back here"},

@@ -11,6 +11,7 @@
 #include "tsm/home.h"
 #include "tsm/image.h"
 #include "tsm/operator_input.h"
+#include "tsm/outcome.h"
 #include "tsm/report.h"
 #include "tsm/response.h"
 #include "tsm/target.h"
@@ -34,23 +35,6 @@ std::string default_ca_file() {
   std::error_code failure;
   const std::filesystem::path program = std::filesystem::read_symlink("/proc/self/exe", failure);
   return program.parent_path().parent_path() / "share" / "otrp" / kDevCaName;
-}
-
-/// Shows a verified response that is kept; the exit code says whether it is a refusal.
-int finish(const Arguments &arguments, const Exchange &done) {
-  std::string refusal = refusal_of(done.response);
-  if (!refusal.empty() && done.tie != Tie::kIds) {
-    refusal += "; tied by " + std::string(tie_text(done.tie));
-  }
-  if (arguments.json) {
-    print_json(report_json(done.response, done.tie));
-  } else if (refusal.empty() && arguments.dsi_out_file != "-") {
-    print(report_lines(done.response, done.tie));
-  }
-  for (const std::string &failure : {refusal, done.failure}) {
-    if (!failure.empty()) tools::print_error_line("otrp-tsm", failure);
-  }
-  return refusal.empty() && done.failure.empty() ? 0 : tools::kExitRefused;
 }
 
 }  // namespace
@@ -95,7 +79,7 @@ int run_response(const Arguments &arguments) {
   if (response.dsi_text && !arguments.dsi_out_file.empty()) {
     tools::write_file(arguments.dsi_out_file, *response.dsi_text);
   }
-  return finish(arguments, {.response = response, .tie = tie});
+  return print_outcome(outcome_of(arguments, {.response = response, .tie = tie}), false);
 }
 
 int run_image_pack(const Arguments &arguments) {
@@ -120,22 +104,6 @@ int run_image_show(const Arguments &arguments) {
           (parsed->digest_matches ? "digest matches" : "digest does not match") + "\n");
   }
   return 0;
-}
-
-int run_manage(const Arguments &arguments) {
-  const Home home(arguments.home);
-  const Identity tsm = home.load_identity();
-  const Target target = target_of(arguments);
-  const Order order = read_order(arguments);
-  try {
-    const std::unique_ptr<Channel> channel = open_channel(target);
-    DeviceRecord record = home.open_record(identify(target, home, channel.get()));
-    return finish(arguments, exchange(order, tsm, channel.get(), &record,
-                                      {arguments.dsi_out_file, arguments.image_out_file}));
-  } catch (const ChannelError &error) {
-    tools::print_error_line("otrp-tsm", error.what());
-    return tools::kExitRefused;
-  }
 }
 
 int run_show(const Arguments &arguments) {

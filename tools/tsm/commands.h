@@ -31,12 +31,14 @@ struct Arguments {
   std::string image_out_file;
   std::string spcert;  // a file, or the certificate itself
   std::string state_dir;
+  bool must_exist = false;  // the device in `state_dir`
   std::string url;
   std::string tls_ca_file;
   std::vector<std::string> codes;        // to explain
   std::vector<std::string> input_files;  // to inspect
   std::vector<std::string> key_files;
   bool json = false;
+  bool trace = false;  // show all that the device logs
   MessageId message = MessageId::kGetDeviceState;
   RequestOptions request;
 };

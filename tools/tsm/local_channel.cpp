@@ -1,24 +1,17 @@
 // SPDX-License-Identifier: BSD-2-Clause
+#include "device/agent_log.h"
 #include "device/device_client.h"
+#include "device/state_directory.h"
 #include "tsm/channel.h"
 #include "tsm/response.h"
 
 namespace tsm {
 namespace {
 
-/// Runs a step with the device; what fails there is told as a channel's failure.
-template <class Step>
-auto with_device(Step &&step) {
-  try {
-    return step();
-  } catch (const device::Error &error) {
-    throw ChannelError(error.what());
-  }
-}
-
 class LocalChannel : public Channel {
  public:
-  explicit LocalChannel(const std::string &state_directory) : device_(state_directory) {}
+  LocalChannel(const std::string &state_directory, bool must_exist)
+      : device_(state_directory, must_exist) {}
 
   DeviceInfo info() override {
     const device::Info info = with_device([&] { return device::read_info(device_); });
@@ -37,7 +30,23 @@ class LocalChannel : public Channel {
     });
   }
 
+  std::string take_log() override { return std::exchange(log_, {}); }
+
  private:
+  /// Runs a step with the device; what fails there is told as a channel's failure.
+  template <class Step>
+  auto with_device(Step &&step) -> decltype(step()) {
+    device::AgentLog log(false);
+    try {
+      auto result = step();
+      log_ += log.take();
+      return result;
+    } catch (const device::Error &error) {
+      log_ += log.take();
+      throw ChannelError(error.what());
+    }
+  }
+
   static std::string failure_of(const device::Message &message, const device::Answer &answer) {
     try {
       device::require_success(message, answer);
@@ -47,14 +56,15 @@ class LocalChannel : public Channel {
     }
   }
 
-  device::Device device_;
+  device::StateDevice device_;
+  std::string log_;
 };
 
 }  // namespace
 
-std::unique_ptr<Channel> open_local_device(const std::string &state_directory) {
+std::unique_ptr<Channel> open_local_device(const std::string &state_directory, bool must_exist) {
   try {
-    return std::make_unique<LocalChannel>(state_directory);
+    return std::make_unique<LocalChannel>(state_directory, must_exist);
   } catch (const device::Error &error) {
     throw NoAnswer(error.what());
   }

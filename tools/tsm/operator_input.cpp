@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/operator_input.h"
 
+#include <algorithm>
 #include <filesystem>
 
 #include "common/files.h"
@@ -26,17 +27,40 @@ std::string read_image(const std::string &file) {
   return image;
 }
 
-std::string text_or_file(const std::string &value) {
+bool is_letter(char c) {
+  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
+
+/// A name with a folder before it or an ending behind it, as no certificate's text has.
+bool looks_like_file(const std::string &value) {
+  constexpr size_t kMaxPathLen = 255;
+  constexpr size_t kMaxEndingLen = 5;
+  if (value.size() > kMaxPathLen || value.find('\n') != std::string::npos) return false;
+  const std::filesystem::path path = value;
   std::error_code ignored;
-  const bool is_file = value == "-" || std::filesystem::is_regular_file(value, ignored);
-  return is_file ? tools::read_file(value) : value;
+  if (path.has_parent_path() && std::filesystem::exists(path.parent_path(), ignored)) return true;
+  const std::string ending = path.extension();  // with its dot
+  return value.starts_with("./") || value.starts_with("../") ||
+         (ending.size() > 1 && ending.size() <= 1 + kMaxEndingLen &&
+          std::all_of(ending.begin() + 1, ending.end(), is_letter));
+}
+
+std::string read_certificate(const std::string &value) {
+  constexpr std::string_view kText = "text:";
+  if (value.starts_with(kText)) return value.substr(kText.size());
+  std::error_code ignored;
+  const bool is_file = std::filesystem::exists(value, ignored);
+  if (value == "-" || is_file) return tools::read_file(value);
+  if (!looks_like_file(value)) return value;
+  throw UsageError("--sp-cert: there is no file " + value +
+                   ": expected the SP's certificate, or its text as text:" + value);
 }
 
 }  // namespace
 
 Order read_order(const Arguments &arguments) {
   Order order = {arguments.message, arguments.request};
-  if (!arguments.spcert.empty()) order.options.spcert = text_or_file(arguments.spcert);
+  if (!arguments.spcert.empty()) order.options.spcert = read_certificate(arguments.spcert);
   if (!arguments.image_file.empty()) order.options.image = read_image(arguments.image_file);
   return order;
 }

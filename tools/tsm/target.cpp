@@ -35,8 +35,10 @@ DeviceInfo read_device_file(const std::string &file) {
 }
 
 Target target_of(const Arguments &arguments) {
-  Target target = {
-      .state_dir = arguments.state_dir, .url = arguments.url, .ca_file = arguments.tls_ca_file};
+  Target target = {.state_dir = arguments.state_dir,
+                   .url = arguments.url,
+                   .ca_file = arguments.tls_ca_file,
+                   .must_exist = arguments.must_exist};
   if (!target.url.empty() && !target.state_dir.empty()) {
     throw UsageError("--state and --url name two devices: expected one of them");
   }
@@ -49,7 +51,7 @@ Target target_of(const Arguments &arguments) {
 }
 
 std::unique_ptr<Channel> open_channel(const Target &target) {
-  return target.url.empty() ? open_local_device(target.state_dir)
+  return target.url.empty() ? open_local_device(target.state_dir, target.must_exist)
                             : open_served_device(target.url, target.ca_file);
 }
 

@@ -18,6 +18,7 @@ struct Target {
   std::string state_dir = {};  // a way to it: at most one of these
   std::string url = {};
   std::string ca_file = {};               // for https
+  bool must_exist = false;                // in the directory
   std::optional<DeviceInfo> device = {};  // who it must be, where that is known already
 };
 
