@@ -19,12 +19,11 @@ TEE_ObjectHandle allocate_aes_key(const uint8_t *key, uint32_t key_len) {
 }
 
 // The operation keeps a copy of the key, so the key object need not outlive this stage.
-static TEE_Result start_aes(uint32_t algorithm, TEE_OperationMode mode, const uint8_t *key,
-                            uint32_t key_len, operation *aes,
-                            const char *as = __builtin_FUNCTION()) {
-  TRY_LOG_AS(as, TEE_AllocateOperation(out(*aes), algorithm, mode, key_len * 8),
+static TEE_Result start_aes(uint32_t algorithm, TEE_OperationMode mode, const data_part &key,
+                            operation *aes, const char *as = __builtin_FUNCTION()) {
+  TRY_LOG_AS(as, TEE_AllocateOperation(out(*aes), algorithm, mode, key.len * 8),
              "TEE_AllocateOperation fail for aes 0x%x\n");
-  const key_object key_holder(allocate_aes_key(key, key_len));
+  const key_object key_holder(allocate_aes_key(static_cast<const uint8_t *>(key.data), key.len));
   if (!key_holder) return TEE_ERROR_GENERIC;
   TRY_LOG_AS(as, TEE_SetOperationKey(aes->get(), key_holder.get()),
              "set operation key error, 0x%x\n");
@@ -33,17 +32,16 @@ static TEE_Result start_aes(uint32_t algorithm, TEE_OperationMode mode, const ui
 
 // ---- AES-GCM
 
-static TEE_Result start_gcm(TEE_OperationMode mode, const uint8_t *key, uint32_t key_len,
-                            const uint8_t *iv, uint32_t iv_len, const uint8_t *aad,
-                            uint32_t aad_len, operation *aes,
+static TEE_Result start_gcm(TEE_OperationMode mode, const data_part &key, const data_part &iv,
+                            const data_part &aad, operation *aes,
                             const char *as = __builtin_FUNCTION()) {
-  TRY(start_aes(TEE_ALG_AES_GCM, mode, key, key_len, aes, as));
+  TRY(start_aes(TEE_ALG_AES_GCM, mode, key, aes, as));
   // The sender chose the nonce; TEE_AEInit panics on an empty one.
-  CHECK_AS(as, iv_len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
+  CHECK_AS(as, iv.len != 0, TEE_ERROR_NOT_SUPPORTED, "aes TEE_AEInit error 0x%x\n",
            TEE_ERROR_NOT_SUPPORTED);
-  TRY_LOG_AS(as, TEE_AEInit(aes->get(), iv, iv_len, kGcmTagLen * 8, 0, 0),
+  TRY_LOG_AS(as, TEE_AEInit(aes->get(), iv.data, iv.len, kGcmTagLen * 8, 0, 0),
              "aes TEE_AEInit error 0x%x\n");
-  TEE_AEUpdateAAD(aes->get(), aad, aad_len);
+  TEE_AEUpdateAAD(aes->get(), aad.data, aad.len);
   return TEE_SUCCESS;
 }
 
@@ -62,7 +60,7 @@ TEE_Result aes_gcm_encrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   *tag_len = 0;
 
   operation aes;
-  TRY(start_gcm(TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
+  TRY(start_gcm(TEE_MODE_ENCRYPT, {key, key_len}, {iv, iv_len}, {aad, aad_len}, &aes));
 
   tee_ptr<uint8_t> data(allocate_bytes(plain_len));
   CHECK(data, TEE_ERROR_OUT_OF_MEMORY, "No memory for data buf\n");
@@ -96,7 +94,7 @@ TEE_Result aes_gcm_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   *plain_len = 0;
 
   operation aes;
-  TRY(start_gcm(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, aad, aad_len, &aes));
+  TRY(start_gcm(TEE_MODE_DECRYPT, {key, key_len}, {iv, iv_len}, {aad, aad_len}, &aes));
 
   secret_bytes data;
   if (cipher_len < UINT32_MAX) data.data = allocate_bytes(cipher_len + 1);
@@ -120,23 +118,21 @@ TEE_Result aes_gcm_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
 
 // ---- AES-CBC
 
-static TEE_Result start_cbc(TEE_OperationMode mode, const uint8_t *key, uint32_t key_len,
-                            const uint8_t *iv, uint32_t iv_len, operation *aes,
-                            const char *as = __builtin_FUNCTION()) {
-  TRY(start_aes(TEE_ALG_AES_CBC_NOPAD, mode, key, key_len, aes, as));
+static TEE_Result start_cbc(TEE_OperationMode mode, const data_part &key, const data_part &iv,
+                            operation *aes, const char *as = __builtin_FUNCTION()) {
+  TRY(start_aes(TEE_ALG_AES_CBC_NOPAD, mode, key, aes, as));
   // The sender chose the IV; TEE_CipherInit panics on a length that is not a block's.
-  CHECK_AS(as, iv_len == kAesBlockLen, TEE_ERROR_BAD_PARAMETERS, "aes update error 0x%x\n",
+  CHECK_AS(as, iv.len == kAesBlockLen, TEE_ERROR_BAD_PARAMETERS, "aes update error 0x%x\n",
            TEE_ERROR_BAD_PARAMETERS);
-  TEE_CipherInit(aes->get(), iv, iv_len);
+  TEE_CipherInit(aes->get(), iv.data, iv.len);
   return TEE_SUCCESS;
 }
 
 // The whole input in one update and a final step; `*produced` is the capacity of `output` first.
-static TEE_Result run_cbc(TEE_OperationHandle aes, const uint8_t *input, uint32_t input_len,
-                          uint8_t *output, uint32_t *produced,
-                          const char *as = __builtin_FUNCTION()) {
+static TEE_Result run_cbc(TEE_OperationHandle aes, const data_part &input, uint8_t *output,
+                          uint32_t *produced, const char *as = __builtin_FUNCTION()) {
   tee_length updated = *produced;
-  TRY_LOG_AS(as, TEE_CipherUpdate(aes, input, input_len, output, &updated),
+  TRY_LOG_AS(as, TEE_CipherUpdate(aes, input.data, input.len, output, &updated),
              "aes update error 0x%x\n");
   tee_length rest = *produced - updated;
   TRY_LOG_AS(as, TEE_CipherDoFinal(aes, nullptr, 0, output + updated, &rest),
@@ -167,9 +163,9 @@ TEE_Result aes_cbc_encrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   memset(padded.data + plain_len, static_cast<int>(pad), pad);
 
   operation aes;
-  TRY(start_cbc(TEE_MODE_ENCRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_ENCRYPT, {key, key_len}, {iv, iv_len}, &aes));
   uint32_t produced = plain_len + kAesBlockLen;
-  TRY(run_cbc(aes.get(), padded.data, padded.len, data.get(), &produced));
+  TRY(run_cbc(aes.get(), {padded.data, padded.len}, data.get(), &produced));
 
   *cipher = data.release();
   *cipher_len = produced;
@@ -192,12 +188,12 @@ TEE_Result aes_cbc_decrypt(const uint8_t *key, uint32_t key_len, const uint8_t *
   data.len = cipher_len + kAesBlockLen;
 
   operation aes;
-  TRY(start_cbc(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_DECRYPT, {key, key_len}, {iv, iv_len}, &aes));
   // A part of a block would make the final step panic.
   CHECK(cipher_len % kAesBlockLen == 0, TEE_ERROR_BAD_FORMAT, "aes final error 0x%x\n",
         TEE_ERROR_BAD_FORMAT);
   uint32_t produced = data.len;
-  TRY(run_cbc(aes.get(), cipher, cipher_len, data.data, &produced));
+  TRY(run_cbc(aes.get(), {cipher, cipher_len}, data.data, &produced));
   uint32_t unpadded = 0;
   TRY_LOG(remove_pkcs_pading_length(data.data, produced, &unpadded),
           "remove_pkcs_pading_length error 0x%x\n");
@@ -220,7 +216,7 @@ TEE_Result aes_cbc_decrypt_with_update_block(const uint8_t *key, uint32_t key_le
   data.len = buffer_len;
 
   operation aes;
-  TRY(start_cbc(TEE_MODE_DECRYPT, key, key_len, iv, iv_len, &aes));
+  TRY(start_cbc(TEE_MODE_DECRYPT, {key, key_len}, {iv, iv_len}, &aes));
   CHECK(buffer_len % kAesBlockLen == 0, TEE_ERROR_BAD_FORMAT, "aes update error 0x%x, length: %d\n",
         TEE_ERROR_BAD_FORMAT, static_cast<int>(buffer_len % kAesBlockLen));
   for (uint32_t offset = 0; offset < buffer_len; offset += kAesBlockLen) {
@@ -261,27 +257,28 @@ TEE_Result remove_pkcs_pading_length(const uint8_t *data, uint32_t len, uint32_t
 static constexpr uint32_t kMinHmacKeyLen = 24;
 
 // A shorter key is filled up with zeros, which HMAC itself would do (RFC 2104, 2).
-static TEE_Result populate_hmac_key(TEE_ObjectHandle object, const uint8_t *key, uint32_t key_len) {
+static TEE_Result populate_hmac_key(TEE_ObjectHandle object, const data_part &key) {
   uint8_t filled[kMinHmacKeyLen] = {};
-  const bool is_short = key_len < kMinHmacKeyLen;
-  if (is_short && key_len != 0) memcpy(filled, key, key_len);
+  const bool is_short = key.len < kMinHmacKeyLen;
+  if (is_short && key.len != 0) memcpy(filled, key.data, key.len);
   TEE_Attribute secret;
-  TEE_InitRefAttribute(&secret, TEE_ATTR_SECRET_VALUE, is_short ? filled : key,
-                       is_short ? kMinHmacKeyLen : key_len);
+  TEE_InitRefAttribute(&secret, TEE_ATTR_SECRET_VALUE, is_short ? filled : key.data,
+                       is_short ? kMinHmacKeyLen : key.len);
   const TEE_Result result = TEE_PopulateTransientObject(object, &secret, 1);
   wipe(filled, sizeof filled);
   return result;
 }
 
-// `mac` holds kHmacSha256Len bytes. `final_text` is what the caller says of a failed last step.
-static TEE_Result hmac_sha256(const char *final_text, const uint8_t *data, uint32_t data_len,
-                              const uint8_t *key, uint32_t key_len, uint8_t *mac, uint32_t *mac_len,
+// `mac` holds kHmacSha256Len bytes. `last_step` is what the caller calls the last one when it
+// fails.
+static TEE_Result hmac_sha256(const data_part &data, const data_part &key, const char *last_step,
+                              uint8_t *mac, uint32_t *mac_len,
                               const char *as = __builtin_FUNCTION()) {
-  const uint32_t bits = 8 * (key_len < kMinHmacKeyLen ? kMinHmacKeyLen : key_len);
+  const uint32_t bits = 8 * (key.len < kMinHmacKeyLen ? kMinHmacKeyLen : key.len);
   key_object key_holder;
   TRY_LOG_AS(as, TEE_AllocateTransientObject(TEE_TYPE_HMAC_SHA256, bits, out(key_holder)),
              "Failed in TEE_AllocateTransientObject 0x%x\n");
-  TRY_LOG_AS(as, populate_hmac_key(key_holder.get(), key, key_len),
+  TRY_LOG_AS(as, populate_hmac_key(key_holder.get(), key),
              "Failed in TEE_PopulateTransientObject 0x%x\n");
 
   operation hmac;
@@ -290,9 +287,10 @@ static TEE_Result hmac_sha256(const char *final_text, const uint8_t *data, uint3
   TRY_LOG_AS(as, TEE_SetOperationKey(hmac.get(), key_holder.get()),
              "Failed in TEE_SetOperationKey 0x%x\n");
   TEE_MACInit(hmac.get(), nullptr, 0);
-  TEE_MACUpdate(hmac.get(), data, data_len);
+  TEE_MACUpdate(hmac.get(), data.data, data.len);
   tee_length produced = kHmacSha256Len;
-  TRY_LOG_AS(as, TEE_MACComputeFinal(hmac.get(), nullptr, 0, mac, &produced), final_text);
+  const TEE_Result result = TEE_MACComputeFinal(hmac.get(), nullptr, 0, mac, &produced);
+  CHECK_AS(as, result == TEE_SUCCESS, result, "Failed in %s 0x%x\n", last_step, result);
   *mac_len = static_cast<uint32_t>(produced);
   return TEE_SUCCESS;
 }
@@ -305,8 +303,8 @@ TEE_Result Compute_HmacSha256(const uint8_t *data, uint32_t data_len, const uint
   tee_ptr<uint8_t> buffer(allocate_bytes(kHmacSha256Len));
   if (!buffer) return TEE_ERROR_OUT_OF_MEMORY;
   uint32_t produced = 0;
-  TRY(hmac_sha256("Failed in TEE_MACCompareFinal 0x%x\n", data, data_len, key, key_len,
-                  buffer.get(), &produced));
+  TRY(hmac_sha256({data, data_len}, {key, key_len}, "TEE_MACCompareFinal", buffer.get(),
+                  &produced));
   CHECK(produced >= T_LEN, TEE_ERROR_BAD_STATE, "mac_len %u is not larger than T_LEN %u", produced,
         T_LEN);
 
@@ -322,8 +320,8 @@ TEE_Result Verify_HmacSha256(const uint8_t *data, uint32_t data_len, const uint8
   CHECK(real_mac.data != nullptr, TEE_ERROR_OUT_OF_MEMORY, "No memory for real_mac");
   real_mac.len = kHmacSha256Len;
   uint32_t produced = 0;
-  TRY(hmac_sha256("Failed in TEE_MACComputeFinal 0x%x\n", data, data_len, key, key_len,
-                  real_mac.data, &produced));
+  TRY(hmac_sha256({data, data_len}, {key, key_len}, "TEE_MACComputeFinal", real_mac.data,
+                  &produced));
   CHECK(mac_len <= produced && equal_in_constant_time(real_mac.data, mac, mac_len),
         TEE_ERROR_MAC_INVALID, "MAC unmatch");
   return TEE_SUCCESS;

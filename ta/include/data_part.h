@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// One of several byte strings that are hashed or signed as if they stood behind each other.
+/// A slice, alone or one of several that are hashed or signed as if they stood behind each other.
 #ifndef DATA_PART_H
 #define DATA_PART_H
 

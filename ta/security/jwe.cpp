@@ -4,6 +4,7 @@
 #include "crypto/base64.h"
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
+#include "cursor.h"
 #include "failure.h"
 #include "ownership.h"
 #include "platform.h"
@@ -54,24 +55,22 @@ static uint32_t len_of(const char *text) {
 // ---- Authentication tag of A128CBC-HS256
 
 // AAD, IV, ciphertext and AL, the length of the AAD in bits (8 bytes, big-endian).
-static TEE_Result make_mac_input(const uint8_t *aad, uint32_t aad_len, const uint8_t *cipher,
-                                 uint32_t cipher_len, const uint8_t *iv, uint32_t iv_len,
+static TEE_Result make_mac_input(const data_part &aad, const data_part &iv, const data_part &cipher,
                                  tee_ptr<uint8_t> *input, uint32_t *input_len,
                                  const char *as = __builtin_FUNCTION()) {
-  const uint64_t len = uint64_t{aad_len} + iv_len + cipher_len + kAlLen;
+  const uint64_t len = uint64_t{aad.len} + iv.len + cipher.len + kAlLen;
   if (len <= UINT32_MAX) input->reset(allocate_bytes(static_cast<uint32_t>(len)));
-  CHECK_AS(as, *input, TEE_ERROR_OUT_OF_MEMORY, "no memory for hmac_input");
+  *input_len = *input ? static_cast<uint32_t>(len) : 0;
 
-  uint8_t *at = input->get();
-  memcpy(at, aad, aad_len);
-  at += aad_len;
-  memcpy(at, iv, iv_len);
-  at += iv_len;
-  memcpy(at, cipher, cipher_len);
-  at += cipher_len;
-  const uint32_t aad_bits = aad_len * 8;
-  for (uint32_t i = 0; i < 4; ++i) at[4 + i] = static_cast<uint8_t>(aad_bits >> (24 - 8 * i));
-  *input_len = static_cast<uint32_t>(len);
+  const uint32_t aad_bits = aad.len * 8;
+  uint8_t al[kAlLen] = {};
+  for (uint32_t i = 0; i < 4; ++i) al[4 + i] = static_cast<uint8_t>(aad_bits >> (24 - 8 * i));
+  writer out = {input->get(), *input_len};
+  put(&out, aad);
+  put(&out, iv);
+  put(&out, cipher);
+  put(&out, {al, kAlLen});
+  CHECK_AS(as, out.ok, TEE_ERROR_OUT_OF_MEMORY, "no memory for hmac_input");
   return TEE_SUCCESS;
 }
 
@@ -84,7 +83,7 @@ TEE_Result compute_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint
   if (cek_len < kCbcMacKeyLen) return TEE_ERROR_BAD_PARAMETERS;
   tee_ptr<uint8_t> input;
   uint32_t input_len = 0;
-  TRY(make_mac_input(aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
+  TRY(make_mac_input({aad, aad_len}, {iv, iv_len}, {cipher, cipher_len}, &input, &input_len));
   return Compute_HmacSha256(input.get(), input_len, cek, kCbcMacKeyLen, tag, tag_len);
 }
 
@@ -95,7 +94,7 @@ TEE_Result verify_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint8
   if (cek_len < kCbcMacKeyLen) return TEE_ERROR_BAD_PARAMETERS;
   tee_ptr<uint8_t> input;
   uint32_t input_len = 0;
-  TRY(make_mac_input(aad, aad_len, cipher, cipher_len, iv, iv_len, &input, &input_len));
+  TRY(make_mac_input({aad, aad_len}, {iv, iv_len}, {cipher, cipher_len}, &input, &input_len));
   return Verify_HmacSha256(input.get(), input_len, cek, kCbcMacKeyLen, tag, tag_len);
 }
 

@@ -193,26 +193,27 @@ TEE_Result save_sp_info(const char *spid, const char *spcert, const char *aik) {
   return TEE_SUCCESS;
 }
 
-// `no_memory` and `failed` are the texts of the operation named `as`.
+// `no_memory` and `failed`, behind which the code comes, are the texts of the operation named `as`.
 static TEE_Result delete_record(const char *prefix, const char *name, const char *no_memory,
                                 const char *failed, const char *as = __builtin_FUNCTION()) {
   tee_ptr<char> id;
   concat_pobj_name(prefix, name, out(id));
   CHECK_AS(as, id, OTRP_NO_MEMORY, "%s", no_memory);
-  TRY_LOG_AS(as, delete_persistent_object(id.get(), text_len(id.get())), failed);
+  const TEE_Result deleted = delete_persistent_object(id.get(), text_len(id.get()));
+  CHECK_AS(as, deleted == TEE_SUCCESS, deleted, "%s 0x%x", failed, deleted);
   return TEE_SUCCESS;
 }
 
 TEE_Result delete_sp_info(const char *spid) {
   return delete_record(SP_INFO_PREFIX, spid, "no memory for sp_info_name",
-                       "delete_persistent_object error code: 0x%x");
+                       "delete_persistent_object error code:");
 }
 
 // ---- TA records
 
 TEE_Result delete_ta_persistent_object(const char *taid) {
   return delete_record(TA_INFO_PREFIX, taid, "delete_ta_persistent_object out of mem",
-                       "delete_persistent_object error code 0x%x");
+                       "delete_persistent_object error code");
 }
 
 static TEE_Result delete_existing_ta_info(const char *id, const char *as = __builtin_FUNCTION()) {

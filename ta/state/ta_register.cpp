@@ -27,7 +27,12 @@ struct table {
   uint32_t num_rows = 0;
 
   const uint8_t *row(uint32_t i) const { return payload.data + kCountLen + i * kRowLen; }
+  data_part range(uint32_t from, uint32_t to) const { return {row(from), (to - from) * kRowLen}; }
 };
+
+const char kNotSaved[] = "can not init ta_register_info " TA_REGISTER_ID;
+const char kNotChanged[] =
+    "can not init ta_register_info " TA_REGISTER_ID ", create_sd function fail";
 
 }  // namespace
 
@@ -47,8 +52,7 @@ static uint8_t *read_ta_bin_ta_hash(const uint8_t *ta_image) {
 
 static TEE_Result load_table(table *rows, const char *as = __builtin_FUNCTION()) {
   const uint8_t no_rows[kCountLen] = {};
-  TRY(load_or_create(TA_REGISTER_ID, {no_rows, kCountLen},
-                     "can not init ta_register_info " TA_REGISTER_ID, &rows->payload, as));
+  TRY(load_or_create(TA_REGISTER_ID, {no_rows, kCountLen}, kNotSaved, &rows->payload, as));
   reader in = {rows->payload.data, rows->payload.len};
   uint32_t num_rows = UINT32_MAX;
   CHECK_AS(as, take_u32(&in, &num_rows) && num_rows <= in.left / kRowLen, TEE_ERROR_BAD_FORMAT,
@@ -67,29 +71,20 @@ static uint32_t find_row(const table &rows, const char *taid) {
 
 // ---- Operations
 
-// Saves the first `num_before` rows, then the row of `taid` with `digest` unless that is NULL,
-// then the rows from `rest` on.
-static TEE_Result save_table(const table &rows, uint32_t num_before, const char *taid,
-                             const uint8_t *digest, uint32_t rest, const char *not_saved,
-                             const char *as = __builtin_FUNCTION()) {
-  const uint32_t num_new = digest != nullptr ? 1 : 0;
-  const uint32_t num_after = rows.num_rows - rest;
-  const uint32_t num_rows = num_before + num_new + num_after;
-  const uint32_t len = kCountLen + num_rows * kRowLen;
+// A table of the rows before, one row in between, or none, and the rows after.
+static TEE_Result save_rows(const data_part (&parts)[4], const char *not_saved,
+                            const char *as = __builtin_FUNCTION()) {
+  uint32_t len = kCountLen;
+  for (const data_part &part : parts) len += part.len;
   const tee_ptr<uint8_t> data(allocate_bytes(len));
   writer out = {data.get(), data ? len : 0};
-  put_u32(&out, num_rows);
-  put(&out, {rows.row(0), num_before * kRowLen});
-  if (digest != nullptr) {
-    put(&out, {taid, kTaidLen});
-    put(&out, {digest, kDigestLen});
-  }
-  put(&out, {rows.row(rest), num_after * kRowLen});
+  put_u32(&out, (len - kCountLen) / kRowLen);
+  for (const data_part &part : parts) put(&out, part);
   CHECK_AS(as, out.ok, OTRP_NO_MEMORY, "malloc data_buf but get NULL");
 
   const TEE_Result saved =
       save_data_to_persistent_object(data.get(), len, TA_REGISTER_ID, kRegisterIdLen, false);
-  CHECK_AS(as, saved == TEE_SUCCESS, saved, not_saved, TA_REGISTER_ID);
+  CHECK_AS(as, saved == TEE_SUCCESS, saved, "%s", not_saved);
   return TEE_SUCCESS;
 }
 
@@ -108,13 +103,13 @@ TEE_Result save_ta_register_info(const char *taid, const uint8_t *ta_image,
   TRY(load_table(&rows));
   const uint32_t row = find_row(rows, taid);
   const bool listed = row < rows.num_rows;
-  if (operation_code == kRegisterTa) {
-    CHECK(!listed, OTRP_TA_EXISTS, "this ta %s has been installed", taid);
-    return save_table(rows, rows.num_rows, taid, digest.get(), rows.num_rows,
-                      "can not init ta_register_info %s");
-  }
-  CHECK(listed, OTRP_NOT_FOUND, "this ta %s has not been installed", taid);
-  const uint8_t *new_digest = operation_code == kUpdateTa ? digest.get() : nullptr;
-  return save_table(rows, row, taid, new_digest, row + 1,
-                    "can not init ta_register_info %s, create_sd function fail");
+  const bool is_new = operation_code == kRegisterTa;
+  CHECK(!is_new || !listed, OTRP_TA_EXISTS, "this ta %s has been installed", taid);
+  CHECK(is_new || listed, OTRP_NOT_FOUND, "this ta %s has not been installed", taid);
+  data_part parts[] = {rows.range(0, row),
+                       {taid, kTaidLen},
+                       {digest.get(), kDigestLen},
+                       rows.range(is_new ? row : row + 1, rows.num_rows)};
+  if (operation_code == kUnregisterTa) parts[1] = parts[2] = {};
+  return save_rows(parts, is_new ? kNotSaved : kNotChanged);
 }
