@@ -44,20 +44,20 @@ static void release_node(JSON_Value *node) {
   TEE_Free(block);
 }
 
+static JSON_Value *first_leaf(JSON_Value *at) {
+  while (has_children(at)) at = at->first;
+  return at;
+}
+
 // Children go before their parent, so that a block goes after everything that hangs from it.
 void json_value_free(JSON_Value *value) {
   if (value == nullptr || value->next != nullptr) return;
-  for (JSON_Value *at = value;;) {
-    while (has_children(at)) at = at->first;
-    for (bool last = true; last;) {
-      JSON_Value *next = at->next;
-      last = is_last_child(at);
-      const bool done = at == value;
-      release_node(at);
-      if (done) return;
-      at = next;
-    }
+  for (JSON_Value *at = first_leaf(value); at != value;) {
+    JSON_Value *next = is_last_child(at) ? at->next : first_leaf(at->next);
+    release_node(at);
+    at = next;
   }
+  release_node(value);
 }
 
 static JSON_Value *new_single(json_type type) {
@@ -75,21 +75,22 @@ JSON_Value *json_value_init_array() {
 
 // ---- Copies
 
+// The node that follows in the text of the document `root`; NULL behind its last one.
+static const JSON_Value *next_in_text(const JSON_Value *at, const JSON_Value *root) {
+  if (has_children(at)) return at->first;
+  while (at != root && is_last_child(at)) at = at->next;
+  return at != root ? at->next : nullptr;
+}
+
 static json_extent measure_tree(const JSON_Value *root) {
   json_extent extent = {};
-  for (const JSON_Value *at = root;;) {
+  for (const JSON_Value *at = root; at != nullptr; at = next_in_text(at, root)) {
     ++extent.num_nodes;
     if (at->type == kJsonArray) ++extent.num_arrays;
     if (at->type == kJsonString) extent.text_len += uint64_t{at->count} + 1;
     if (at != root && at->name != nullptr) extent.text_len += strlen(at->name) + 1;
-    if (has_children(at)) {
-      at = at->first;
-      continue;
-    }
-    while (at != root && is_last_child(at)) at = at->next;
-    if (at == root) return extent;
-    at = at->next;
   }
+  return extent;
 }
 
 static void copy_content(const JSON_Value *from, JSON_Value *to, json_room *room) {
@@ -226,7 +227,7 @@ bool json_is_utf8(const char *text) {
   const auto *at = reinterpret_cast<const uint8_t *>(text);
   const uint8_t *end = at + strlen(text);
   while (at != end) {
-    if (end - at >= 8 && (load_eight(reinterpret_cast<const char *>(at)) & kHighBits) == 0) {
+    if (end - at >= 8 && all_ascii(load_eight(reinterpret_cast<const char *>(at)))) {
       at += 8;
       continue;
     }

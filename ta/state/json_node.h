@@ -133,27 +133,45 @@ inline void append_child(JSON_Value *parent, JSON_Value *last, JSON_Value *child
 }
 
 // ---- Characters
+//
+// Texts are looked through eight characters at a time. Each has a byte of a number, in whatever
+// order, and the high bit of that byte is free for an answer.
 
-/// Eight characters at a time, whatever the byte order.
-constexpr uint64_t kEachByte = 0x0101010101010101;
 constexpr uint64_t kHighBits = 0x8080808080808080;
 
 inline uint64_t load_eight(const char *at) {
-  uint64_t word;
-  memcpy(&word, at, sizeof word);
-  return word;
+  uint64_t eight;
+  memcpy(&eight, at, sizeof eight);
+  return eight;
 }
 
-// x - 1 borrows into the high bit of a byte only when the byte, or one that precedes it, is zero.
-inline uint64_t zero_bytes(uint64_t word) {
-  return word - kEachByte;
+constexpr uint64_t eight_times(uint8_t c) {
+  return uint64_t{0x0101010101010101} * c;
 }
 
-/// Whether any of them is a control character, a quote or a backslash.
-inline bool any_special(uint64_t word) {
-  const uint64_t found = (word - kEachByte * 0x20) | zero_bytes(word ^ (kEachByte * '"')) |
-                         zero_bytes(word ^ (kEachByte * '\\'));
-  return (found & ~word & kHighBits) != 0;
+inline bool all_ascii(uint64_t eight) {
+  return (eight & kHighBits) == 0;
+}
+
+/// Candidates: the high bits of the characters that are less than `limit`, which is one of ASCII. A
+/// subtraction borrows from the byte above, so there may be more, but never without a true one.
+inline uint64_t less_than(uint64_t eight, uint8_t limit) {
+  return eight - eight_times(limit);
+}
+
+/// The same for those that are `c`.
+inline uint64_t same_as(uint64_t eight, char c) {
+  return less_than(eight ^ eight_times(static_cast<uint8_t>(c)), 1);
+}
+
+/// Whether there is one among the candidates; a character beyond ASCII is none.
+inline bool any_of(uint64_t eight, uint64_t candidates) {
+  return (candidates & ~eight & kHighBits) != 0;
+}
+
+/// Whether any is a control character, a quote or a backslash.
+inline bool any_special(uint64_t eight) {
+  return any_of(eight, less_than(eight, 0x20) | same_as(eight, '"') | same_as(eight, '\\'));
 }
 
 inline bool is_special(char c) {

@@ -43,8 +43,8 @@ static char escape_letter(char c) {
   return kEscapes.letters[static_cast<uint8_t>(c)];
 }
 
-static inline bool may_need_escapes(uint64_t word) {
-  return any_special(word) || (zero_bytes(word ^ (kEachByte * '/')) & ~word & kHighBits) != 0;
+static inline bool may_need_escapes(uint64_t eight) {
+  return any_special(eight) || any_of(eight, same_as(eight, '/'));
 }
 
 void text_counter::put_escaped(const char *text, uint32_t text_len) {
