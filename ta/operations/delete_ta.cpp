@@ -5,7 +5,6 @@
 #include "failure.h"
 #include "operations/exchange.h"
 #include "operations/operations.h"
-#include "operations/refresh_sd.h"
 #include "otrp_result.h"
 #include "platform.h"
 #include "state/dsi.h"

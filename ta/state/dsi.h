@@ -107,4 +107,10 @@ JSON_Value *construct_dsi();
 /// The same, but there need not be one.
 [[nodiscard]] TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname);
 
+/// Lets g_dsi show an SD as it is stored now: takes the entry out and makes a new one, the last,
+/// from the record. When that cannot be made the DSI is without the SD until the next instance.
+/// Logs under the name of the operation `as`.
+[[nodiscard]] TEE_Result refresh_sd_in_dsi(const char *sdname,
+                                           const char *as = __builtin_FUNCTION());
+
 #endif

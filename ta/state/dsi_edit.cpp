@@ -160,3 +160,11 @@ TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
       dsi, TEE_ERROR_OUT_OF_MEMORY,
       [=](dsi_t *working) { return remove_sd_if_there(working->sdl, sdname, as); }, as);
 }
+
+TEE_Result refresh_sd_in_dsi(const char *sdname, const char *as) {
+  TRY_LOG_AS(as, remove_g_dsi_sdl_item_by_sdname(sdname),
+             "remove_g_dsi_sdl_item_by_sdname fail error code: 0x%x");
+  TRY_LOG_AS(as, load_g_dsi_sdl_item_by_sdname(sdname),
+             "load_g_dsi_sdl_item_by_sdname fail error code: 0x%x");
+  return TEE_SUCCESS;
+}
