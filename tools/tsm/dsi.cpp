@@ -82,6 +82,16 @@ Node sp_node(const Json &document, const std::string &spid) {
 
 }  // namespace
 
+std::vector<Domain> domains_of(const Json &document) {
+  std::vector<Domain> domains;
+  for (const Json &sd : security_domains(document)) {
+    Domain domain = {text_of(sd, "name"), text_of(sd, "spid"), {}};
+    for (const Json &ta : list_of(&sd, "talist")) domain.tas.push_back(text_of(ta, "taid"));
+    domains.push_back(std::move(domain));
+  }
+  return domains;
+}
+
 std::string dsi_hash_of_text(std::string_view document_text) {
   return hex_encode(sha256(base64_encode(document_text)));
 }

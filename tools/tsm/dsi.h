@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "tsm/crypto.h"
 #include "tsm/json.h"
@@ -25,6 +26,16 @@ bool is_dsi_document(const Json &document);
 
 /// Reads a document as --dsi-out writes it; throws tools::UsageError.
 Json parse_dsi(std::string_view text);
+
+/// A security domain, and the TAs in it.
+struct Domain {
+  std::string name;
+  std::string spid;
+  std::vector<std::string> tas;  // their IDs
+};
+
+/// The domains in the order of the document.
+std::vector<Domain> domains_of(const Json &document);
 
 /// The AIK of a service provider; nothing when the device lists none, or no RSA key.
 std::optional<RsaKey> find_aik(const Json &document, std::string_view spid);

@@ -8,17 +8,11 @@
 
 #include "tsm/channel.h"
 #include "tsm/device_record.h"
-#include "tsm/request.h"
+#include "tsm/order.h"
 #include "tsm/response.h"
 #include "tsm/waiting.h"
 
 namespace tsm {
-
-/// A message that is to be sent, whatever the device.
-struct Order {
-  MessageId message;
-  RequestOptions options;
-};
 
 /// A verified response, and how it is known to answer what was asked.
 struct Exchange {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/image.h"
-
+#include "common/files.h"
 #include "tsm/crypto.h"
 
 namespace tsm {
@@ -27,6 +27,21 @@ std::optional<Image> parse_image(std::string_view image) {
                .payload = payload,
                .has_own_magic = image.starts_with(kMagic),
                .digest_matches = sha256(payload) == digest};
+}
+
+std::string read_image_file(const std::string &file) {
+  std::string image = tools::read_file(file);
+  const std::optional<Image> parsed = parse_image(image);
+  if (!parsed) {
+    throw tools::UsageError(file +
+                            " has no TA image header: expected an image made by `otrp-tsm image "
+                            "pack " +
+                            file + " -o IMAGE`");
+  }
+  if (parsed->has_own_magic && !parsed->digest_matches) {
+    throw tools::UsageError(file + " is damaged: its payload is not what its header says");
+  }
+  return image;
 }
 
 }  // namespace tsm

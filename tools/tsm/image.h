@@ -31,6 +31,9 @@ tools::Bytes pack_image(std::string_view payload);
 /// Nothing when there is no header: too short, or another digest length than 32.
 std::optional<Image> parse_image(std::string_view image);
 
+/// The image in a file; throws tools::UsageError for one without a header, or that is damaged.
+std::string read_image_file(const std::string &file);
+
 }  // namespace tsm
 
 #endif

@@ -12,21 +12,6 @@ namespace {
 
 using tools::UsageError;
 
-std::string read_image(const std::string &file) {
-  std::string image = tools::read_file(file);
-  const std::optional<Image> parsed = parse_image(image);
-  if (!parsed) {
-    throw UsageError(file +
-                     " has no TA image header: expected an image made by `otrp-tsm image "
-                     "pack " +
-                     file + " -o IMAGE`");
-  }
-  if (parsed->has_own_magic && !parsed->digest_matches) {
-    throw UsageError(file + " is damaged: its payload is not what its header says");
-  }
-  return image;
-}
-
 bool is_letter(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
@@ -61,7 +46,7 @@ std::string read_certificate(const std::string &value) {
 Order read_order(const Arguments &arguments) {
   Order order = {arguments.message, arguments.request};
   if (!arguments.spcert.empty()) order.options.spcert = read_certificate(arguments.spcert);
-  if (!arguments.image_file.empty()) order.options.image = read_image(arguments.image_file);
+  if (!arguments.image_file.empty()) order.options.image = read_image_file(arguments.image_file);
   return order;
 }
 
