@@ -24,12 +24,14 @@ enum class Fault {
   kTaCall,      // TEE_OpenTASession or TEE_InvokeTACommand fails
   kShortRead,   // TEE_ReadObjectData succeeds with half of the bytes
   kPowerCut,    // the n-th durable write and everything durable after it never happens
+  kFullHeap,    // TEE_Malloc returns NULL where more than n bytes of heap would be in use
 };
 
 /// Tells of the latest fault: what was hit, for messages of a failing sweep.
 struct FaultReport {
   bool fired = false;  // a plan has been carried out since the last was made
   std::string call;    // "TEE_WriteObjectData"; of a power cut what it met: "save ID", "remove ID"
+  uint32_t heap_in_use = 0;  // the most bytes that a kFullHeap plan has let be in use
 };
 
 /// What an image's header would say of a trusted application.
@@ -62,7 +64,8 @@ class Device {
 
   /// The `nth` call (1 is the next) of kind `fault` that instances of `uuid` make fails with
   /// `code` (0: the natural one of that kind); with `and_after` every later one, too. Replaces an
-  /// earlier plan of the same kind.
+  /// earlier plan of the same kind. A kFullHeap plan counts bytes and holds until it is dropped;
+  /// any limit from the report's `heap_in_use` up to its own would have done the same.
   void fail(const TEE_UUID &uuid, Fault fault, unsigned nth, bool and_after = false,
             TEE_Result code = 0);
 

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "faults.h"
 
+#include <algorithm>
+
 namespace tee {
 
 void FaultPlans::set(const UuidBytes &ta, test::Fault fault, unsigned nth, bool and_after,
@@ -32,13 +34,26 @@ bool FaultPlans::count(const UuidBytes &ta, test::Fault fault, const char *call,
     --plan->second.calls_left;
     return false;
   }
-  report_ = {true, call};
+  report_ = {true, call, 0};
   *code = plan->second.code != 0 ? plan->second.code : natural;
   if (!plan->second.and_after) {
     plans_.erase(plan);
     armed_ = !plans_.empty();
   }
   return true;
+}
+
+bool FaultPlans::exceeds_limit(const UuidBytes &ta, uint64_t bytes) {
+  const std::lock_guard guard(lock_);
+  const auto plan = plans_.find({ta, test::Fault::kFullHeap});
+  if (plan == plans_.end()) return false;
+  if (bytes > plan->second.calls_left) {
+    report_.fired = true;
+    report_.call = "TEE_Malloc";
+    return true;
+  }
+  report_.heap_in_use = std::max(report_.heap_in_use, static_cast<uint32_t>(bytes));
+  return false;
 }
 
 }  // namespace tee

@@ -27,15 +27,21 @@ class FaultPlans {
     return armed_.load(std::memory_order_relaxed) && count(ta, fault, call, natural, code);
   }
 
+  /// Whether a kFullHeap plan forbids an allocation of `ta`, with which `bytes` would be in use.
+  bool forbids(const UuidBytes &ta, uint64_t bytes) {
+    return armed_.load(std::memory_order_relaxed) && exceeds_limit(ta, bytes);
+  }
+
  private:
   struct Plan {
-    unsigned calls_left;  // 1: the next one is hit
+    unsigned calls_left;  // 1: the next one is hit; of kFullHeap the limit in bytes
     bool and_after;
     TEE_Result code;
   };
 
   bool count(const UuidBytes &ta, test::Fault fault, const char *call, TEE_Result natural,
              TEE_Result *code);
+  bool exceeds_limit(const UuidBytes &ta, uint64_t bytes);
 
   std::atomic<bool> armed_ = false;
   mutable std::mutex lock_;

@@ -21,8 +21,12 @@ Heap::~Heap() {
   for (size_t i = 0; i < num_slots_; ++i) std::free(slots_[i].block);
 }
 
+uint64_t Heap::charge_of(uint32_t len) {
+  return (uint64_t{len} + kAlignment - 1) / kAlignment * kAlignment + kHeaderLen;
+}
+
 void *Heap::allocate(uint32_t len) {
-  const uint64_t charge = (uint64_t{len} + kAlignment - 1) / kAlignment * kAlignment + kHeaderLen;
+  const uint64_t charge = charge_of(len);
   if (charge > size_ - in_use_) return nullptr;
   if (2 * (size_t{live_} + 1) > num_slots_ && !grow()) return nullptr;
   void *block = std::calloc(1, len);
@@ -95,7 +99,9 @@ void *TEE_Malloc(TEE_LengthType size, uint32_t) {
   if (fault_due(Fault::kAllocation, "TEE_Malloc", TEE_ERROR_OUT_OF_MEMORY, &ignored)) {
     return nullptr;
   }
-  return current_instance().heap.allocate(size);
+  Heap &heap = current_instance().heap;
+  if (heap_limit_reached(heap.in_use() + Heap::charge_of(size))) return nullptr;
+  return heap.allocate(size);
 }
 
 void TEE_Free(void *buffer) {

@@ -19,6 +19,9 @@ class Heap {
   Heap(const Heap &) = delete;
   Heap &operator=(const Heap &) = delete;
 
+  /// The bytes that a block of `len` bytes takes.
+  static uint64_t charge_of(uint32_t len);
+
   /// Zero-filled; NULL when the heap is full.
   void *allocate(uint32_t len);
 

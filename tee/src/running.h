@@ -53,6 +53,9 @@ OpenHandles &open_handles(Instance &instance);
 /// to return. `natural` is the result when the test named none.
 bool fault_due(Fault fault, const char *call, TEE_Result natural, TEE_Result *code);
 
+/// True when a test asked that this instance never have so many bytes of its heap in use.
+bool heap_limit_reached(uint64_t in_use);
+
 }  // namespace tee
 
 #endif

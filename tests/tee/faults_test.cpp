@@ -67,6 +67,16 @@ TEST(Faults, HitTheNthCallOnceOrFromThereOn) {
   EXPECT_EQ(device.fault_report().call, "TEE_Malloc");
   EXPECT_TRUE(allocates());
 
+  device.fail({}, Fault::kFullHeap, 40);
+  EXPECT_TRUE(allocates());  // 32 bytes, with what each block takes besides
+  void *block = TEE_Malloc(1, TEE_MALLOC_FILL_ZERO);
+  EXPECT_FALSE(device.fault_report().fired);
+  EXPECT_FALSE(allocates());
+  EXPECT_TRUE(device.fault_report().fired);
+  EXPECT_EQ(device.fault_report().heap_in_use, 32u);
+  TEE_Free(block);
+  EXPECT_TRUE(allocates());
+
   device.fail({}, Fault::kAllocation, 1, true);
   EXPECT_FALSE(allocates());
   EXPECT_FALSE(allocates());
