@@ -106,9 +106,9 @@ TEE_Result verify_encrypted_ta(const char *field, const char *spid, const jsmn_o
 
 TEE_Result hand_over_image(exchange *x, const char *taid, ta_register_operation operation_code,
                            secret_bytes *plain, ta_image *image) {
+  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
   image->len = plain->len;
   image->data = plain->release();
-  if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
   const uint8_t *with_header = image->len >= kTaImageHeaderLen ? image->data : nullptr;
   TRY_LOG_AS(x->form->process, save_ta_register_info(taid, with_header, operation_code),
              "save_ta_register_info fail error code: 0x%x");

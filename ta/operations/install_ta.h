@@ -19,8 +19,8 @@
                                              const jsmn_object *encrypted_ta, uint8_t **image,
                                              uint32_t *image_len, uint8_t **digest);
 
-/// Moves the decrypted image to where the pipeline takes it, names the TA in the response and
-/// changes its row of the register, which refuses an image that is too short to have a header.
+/// Names the TA in the response, moves the decrypted image to where the pipeline takes it and
+/// changes the TA's row of the register, which refuses an image that is too short to have a header.
 [[nodiscard]] TEE_Result hand_over_image(exchange *x, const char *taid,
                                          ta_register_operation operation_code, secret_bytes *plain,
                                          ta_image *image);
