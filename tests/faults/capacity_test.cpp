@@ -42,6 +42,7 @@ void add_tas(Snapshot &snapshot, size_t num_tas) {
 class Capacity : public testing::Test {
  protected:
   void SetUp() override {
+    scene.capacity = 4 << 20;
     scene.furnish();
     furnished = scene.device.snapshot();
   }

@@ -10,34 +10,48 @@ namespace otrp_test {
 namespace {
 
 using tee::test::Fault;
+using tee::test::FaultReport;
 using Records = std::map<std::string, std::string>;
 
-/// Payloads by ID; of an AIK that is not in `before` only counts that it is a new one. An object
-/// without a complete payload counts as one that is not there, as it does for the agent.
+/// Payloads by ID, but of a new AIK only that it is new. An object
+/// without a whole payload, which a cut may leave, has an empty one.
 Records records_of(const AgentDevice &device, const Records &before = {}) {
   Records records;
   for (const auto &[id, raw] : device.objects()) {
-    std::string text = device.record(id).value_or("");
-    if (text.empty()) continue;
+    std::string &text = records[id] = payload_of(raw).value_or("");
     const auto old = before.find(id);
     const bool is_new = old == before.end() || old->second != text;
-    if (!before.empty() && id.starts_with("SP_INFO_") && is_new) {
-      Json record = Json::parse(text);
-      record["aik"] = "new";
-      text = record.dump();
-    }
-    records[id] = text;
+    if (before.empty() || !id.starts_with("SP_INFO_") || text.empty() || !is_new) continue;
+    Json record = Json::parse(text);
+    record["aik"] = "new";
+    text = record.dump();
   }
   return records;
 }
 
-/// Objects that a cut has left without a payload.
-std::set<std::string> hollow_objects(const AgentDevice &device) {
-  std::set<std::string> ids;
-  for (const auto &[id, raw] : device.objects()) {
-    if (device.record(id).value_or("").empty()) ids.insert(id);
+/// What the agent sees of them.
+Records whole(Records records) {
+  std::erase_if(records, [](const auto &record) { return record.second.empty(); });
+  return records;
+}
+
+/// A stored record; without members when there is none.
+Json json_of(const AgentDevice &device, const std::string &id) {
+  const std::string text = device.record(id).value_or("");
+  return text.empty() ? Json::object() : Json::parse(text);
+}
+
+/// The public half of an SP's stored AIK, as device states show it; empty without one.
+std::string stored_aik(const AgentDevice &device, const std::string &spid) {
+  const std::string box =
+      tools::base64_decode(json_of(device, "SP_INFO_" + spid).value("aik", "")).value();
+  if (box.empty()) return "";
+  std::map<uint32_t, std::string> values;
+  for (size_t at = 0, len = 0; at < box.size(); at += 4 + len) {
+    len = word_at(box, at) >> 16;
+    values[word_at(box, at) & 0xFFFF] = box.substr(at + 4, len);
   }
-  return ids;
+  return tools::base64url_encode(stored(values[0x11]) + stored(values[0x12]));
 }
 
 /// The state without its order, and without the keys.
@@ -48,9 +62,11 @@ std::set<std::string> state_of(const Scene &scene) {
   return state;
 }
 
-class Sweep {
+}  // namespace
+
+class Sweep::Driver {
  public:
-  Sweep(const Scenario &scenario, const FaultKind &kind) : scenario_(scenario), kind_(kind) {
+  explicit Driver(const Scenario &scenario) : scenario_(scenario) {
     const tee::test::TraceSink log;
     scenario.prepare(origin_);
     // A new instance lists the SDs in another order, and the request is one for that.
@@ -65,10 +81,17 @@ class Sweep {
     learn_good_run();
   }
 
-  unsigned run() {
-    unsigned n = 1;
-    while (run_point(n) && !testing::Test::HasFailure()) ++n;
-    return n - 1;
+  unsigned run(const FaultKind &kind) {
+    const bool is_limit = kind.fault == Fault::kFullHeap;
+    unsigned num_points = 0;
+    unsigned n = is_limit ? UINT32_MAX : 1;
+    for (bool goes_on = true; goes_on && !testing::Test::HasFailure();) {
+      const FaultReport report = run_point(kind, n);
+      num_points += report.fired ? 1 : 0;
+      goes_on = is_limit ? report.heap_in_use != 0 : report.fired;
+      n = is_limit ? report.heap_in_use - 1 : n + kind.step;
+    }
+    return num_points;
   }
 
  private:
@@ -77,7 +100,7 @@ class Sweep {
     Scene good(origin_, snapshot_);
     good.device.open();
     perform(good);
-    orderly_.insert(records_of(good.device, before_));
+    orderly_.insert(whole(records_of(good.device, before_)));
     good.send(MessageId::kGetDeviceState, state_request_);
     final_ = state_of(good);
     for (unsigned n = 1;; ++n) {
@@ -87,16 +110,18 @@ class Sweep {
       perform(cut);
       if (!cut.device.host().fault_report().fired) return;
       cut.device.host().restore_power();
-      orderly_.insert(records_of(cut.device, before_));
+      orderly_.insert(whole(records_of(cut.device, before_)));
     }
   }
 
-  /// What the device is asked; checks the answer's form.
-  void perform(Scene &scene) {
+  /// What the device is asked; checks the answer's form. True when a message passed.
+  bool perform(Scene &scene) {
     if (scenario_.ask == Ask::kCreation) {
       scene.device.open();
     } else if (scenario_.ask == Ask::kMessage) {
-      check_frame(scene.send(scenario_.id, request_));
+      const Outcome outcome = scene.send(scenario_.id, request_);
+      check_frame(outcome);
+      return outcome.passed();
     } else {
       const bool is_query = scenario_.ask == Ask::kStatusQuery;
       const Answer answer = is_query ? scene.device.invoke(1, device::build_query(taid("ta1")), 57)
@@ -105,6 +130,7 @@ class Sweep {
       const bool fits = is_query ? answer.size <= 57 : answer.size == id_len;
       EXPECT_TRUE(answer.result != TEEC_SUCCESS || fits) << answer.size;
     }
+    return false;
   }
 
   /// Either a code and no response, or a response, which send() has verified.
@@ -122,51 +148,89 @@ class Sweep {
     // The size of an image is told even when it came to nothing.
     const size_t used = 8 + reply.response.size() + (reply.image ? 4 + reply.image->size() : 0);
     const size_t told = 8 + 4 + options_.image.size();
+    // A TA that is refused before it is recorded has no image.
+    const bool is_handed_over = outcome.response && reply.image;
+    EXPECT_TRUE(!is_handed_over || outcome.response->members.contains("taid"));
     EXPECT_TRUE(answer.size == used || (reply.status != 0 && answer.size == told)) << answer.size;
   }
 
-  bool run_point(unsigned n) {
-    SCOPED_TRACE(std::string(scenario_.name) + ", " + kind_.name + " " + std::to_string(n));
+  FaultReport run_point(const FaultKind &kind, unsigned n) {
+    SCOPED_TRACE(std::string(kind.name) + " " + std::to_string(n));
     const tee::test::TraceSink log;
     Scene scene(origin_, snapshot_);
     tee::test::Device &host = scene.device.host();
-    host.create_at_once(kind_.create_at_once);
+    host.create_at_once(kind.create_at_once);
     if (scenario_.ask != Ask::kCreation) scene.device.open();
-    host.fail(kAgentUuid, kind_.fault, n, kind_.and_after);
-    perform(scene);
-    const tee::test::FaultReport report = host.fault_report();
+    host.fail(kAgentUuid, kind.fault, n, kind.and_after, kind.code);
+    const bool passed = perform(scene);
+    const FaultReport report = host.fault_report();
     SCOPED_TRACE(report.call);
     host.clear_faults();
-    if (kind_.fault == Fault::kPowerCut) host.restore_power();
-    check_what_is_left(scene);
-    // How life goes on depends on what is stored alone.
-    const auto left = std::pair(records_of(scene.device, before_), hollow_objects(scene.device));
-    if (survived_.insert(left).second) check_life_goes_on(scene);
-    const bool was_cut = kind_.fault == Fault::kPowerCut && report.fired;
-    if (was_cut && lived_on_.insert(report.call).second) live_on(scene);
-    return report.fired;
+    const bool was_cut = kind.fault == Fault::kPowerCut && report.fired;
+    if (was_cut) host.restore_power();
+    const Records left = records_of(scene.device, before_);
+    check_what_is_left(scene, whole(left));
+    // How life goes on after a restart depends on what is stored alone.
+    const bool is_new_cut = was_cut && lived_on_.insert({report.call, left}).second;
+    if (survived_.insert(left).second || is_new_cut) {
+      Scene restarted(origin_, scene.device.snapshot());
+      check_life_goes_on(restarted);
+      if (is_new_cut) live_on(restarted);
+    }
+    if (!was_cut) check_instance(scene, left, passed);
+    return report;
   }
 
-  void check_what_is_left(Scene &scene) {
-    Records records = records_of(scene.device, before_);
+  void check_what_is_left(Scene &scene, const Records &left) {
     const bool orderly = std::ranges::any_of(orderly_, [&](Records state) {
       for (const std::string &id : scenario_.may_stay) {
-        if (records.contains(id)) state[id] = records[id];
+        if (left.contains(id)) state[id] = left.at(id);
       }
-      return state == records;
+      return state == left;
     });
-    EXPECT_TRUE(orderly) << testing::PrintToString(records);
+    EXPECT_TRUE(orderly) << testing::PrintToString(left);
     const bool created = scenario_.ask != Ask::kCreation || scene.device.open();
     EXPECT_TRUE(created);
     scene.device.expect_clean();
-    if (kind_.fault == Fault::kPowerCut) return;  // the instance died with its device
-    EXPECT_TRUE(scene.send(MessageId::kGetDeviceState, state_request_).response);
+  }
+
+  /// Without a restart: what is announced is what is stored, and no SD loses its SP.
+  void check_instance(Scene &scene, const Records &left, bool passed) {
+    const Reply reply = scene.device.send(1, state_request_, scene.capacity);
+    EXPECT_EQ(reply.status, 0u);
+    // Entries that got lost, or came too early, show in the length.
+    if (!went_on_.insert({left, reply.response.size() + (passed ? 1 : 0)}).second) return;
+    ASSERT_TRUE(scene.get_device_state().passed());
+    if (passed || scenario_.id != MessageId::kUpdateSd) expect_stored_aiks(scene, passed);
+    const bool asks = scenario_.ask == Ask::kMessage;
+    const bool is_done = asks && scene.run(scenario_.id, options_).passed();
+    ASSERT_TRUE(scene.get_device_state().passed());
+    if (is_done) expect_stored_aiks(scene, true);
+    const Records records = records_of(scene.device);
+    for (const std::string &name : scene.sd_names()) (void)scene.delete_sd(name, "false");
+    const Json list = json_of(scene.device, "SD_LIST_ID");
+    for (const Json &name : list.value("sd_list", Json::array())) {
+      const Json sd = json_of(scene.device, "SD_INFO_" + name.get<std::string>());
+      const std::string sp = "SP_INFO_" + sd.value("spid", "");
+      EXPECT_EQ(scene.device.record(sp).has_value(), records.contains(sp)) << sd;
+    }
+    scene.device.expect_clean();
+  }
+
+  /// An announced key that is not stored is a failure's; the next attempt puts its own there.
+  static void expect_stored_aiks(const Scene &scene, bool is_whole) {
+    for (const Json &aik : scene.aik_list()) {
+      const std::string stored = stored_aik(scene.device, aik.at("spid"));
+      if (!is_whole && stored.empty()) continue;
+      EXPECT_EQ(aik.at("spaik"), stored) << aik.at("spid");
+    }
   }
 
   /// After a restart the device tells its state, and the request can be made again or is done.
   void check_life_goes_on(Scene &scene) {
-    ASSERT_TRUE(scene.device.restart());
+    ASSERT_TRUE(scene.device.open());
     ASSERT_TRUE(scene.send(MessageId::kGetDeviceState, state_request_).response);
+    expect_stored_aiks(scene, true);
     if (scenario_.ask != Ask::kMessage) return;
     const Outcome again = scene.run(scenario_.id, options_);
     EXPECT_TRUE(again.passed() || scenario_.done_codes.contains(again.code()))
@@ -204,7 +268,6 @@ class Sweep {
   }
 
   const Scenario &scenario_;
-  const FaultKind &kind_;
   Scene origin_;
   tsm::RequestOptions options_;
   std::string request_;
@@ -212,17 +275,22 @@ class Sweep {
   Snapshot snapshot_;
   Records before_;
   std::set<Records> orderly_;
-  std::set<std::pair<Records, std::set<std::string>>> survived_;
-  std::set<std::string> lived_on_;  // what each cut met
+  std::set<Records> survived_;
+  std::set<std::pair<Records, size_t>> went_on_;        // and a length
+  std::set<std::pair<std::string, Records>> lived_on_;  // what a cut met, and left
   std::set<std::string> final_;
 };
 
-}  // namespace
-
-unsigned sweep(const Scenario &scenario, const FaultKind &kind) {
+Sweep::Sweep(const Scenario &scenario) {
   // Once: each call would begin with new keys.
   [[maybe_unused]] static const bool is_reusing = (tee::test::reuse_generated_keys(7), true);
-  return Sweep(scenario, kind).run();
+  driver_ = std::make_unique<Driver>(scenario);
+}
+
+Sweep::~Sweep() = default;
+
+unsigned Sweep::run(const FaultKind &kind) {
+  return driver_->run(kind);
 }
 
 }  // namespace otrp_test

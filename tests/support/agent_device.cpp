@@ -30,11 +30,15 @@ AgentDevice::AgentDevice(const Snapshot &snapshot) : AgentDevice() {
   for (const auto &[id, data] : snapshot.key_service) put_object(kCorvelUuid, id, data);
 }
 
+std::optional<std::string> payload_of(const std::string &raw) {
+  if (raw.size() < 4) return std::nullopt;
+  return raw.substr(4, word_at(raw, 0));
+}
+
 std::optional<std::string> AgentDevice::record(const std::string &id) const {
   const auto all = objects();
   const auto found = all.find(id);
-  if (found == all.end() || found->second.size() < 4) return std::nullopt;
-  return found->second.substr(4, word_at(found->second, 0));
+  return found != all.end() ? payload_of(found->second) : std::nullopt;
 }
 
 void AgentDevice::put_record(const std::string &id, const std::string &payload) {

@@ -19,6 +19,9 @@ extern const TEE_UUID kCorvelUuid;
 /// A raw data stream: the payload behind its length.
 std::string stored(const std::string &payload);
 
+/// The payload of a stored object: what follows its length prefix, as long as that says.
+std::optional<std::string> payload_of(const std::string &raw);
+
 /// A record of the boxes that keys are kept in.
 std::string box_record(uint16_t type, const std::string &value);
 
@@ -43,7 +46,7 @@ class AgentDevice : FindsImages, tee::test::Device, public ClientDevice {
 
   tee::test::Device &host() { return *this; }
 
-  /// The payload of a stored object: what follows its length prefix, as long as that says.
+  /// The payload of a stored object, if there is one.
   std::optional<std::string> record(const std::string &id) const;
   void put_record(const std::string &id, const std::string &payload);
   void remove_record(const std::string &id);

@@ -103,6 +103,7 @@ Manager::Manager(ClientDevice &device, const tsm::Identity &tsm)
 
 Manager::Manager(ClientDevice &device, const Manager &other)
     : info(other.info),
+      capacity(other.capacity),
       dsi_text(other.dsi_text),
       dsi(other.dsi),
       device_(device),
@@ -145,7 +146,7 @@ std::string Manager::request(MessageId id, RequestOptions options, const Edits &
 Outcome Manager::send(MessageId id, const std::string &text) {
   Outcome outcome = {.message = tsm::message_of(id).command};
   outcome.reply =
-      device_.send(static_cast<uint32_t>(id), text, std::max<size_t>(1 << 20, text.size()));
+      device_.send(static_cast<uint32_t>(id), text, std::max(capacity, 2 * text.size()));
   if (outcome.reply.response.empty()) return outcome;
   outcome.response = tsm::open_response(outcome.reply.response, {info.tee_key, tsm().key, &dsi});
   if (outcome.response->dsi_text) {

@@ -78,6 +78,9 @@ class Manager {
 
   const tsm::DeviceInfo info;
 
+  /// Bytes of the buffer for an answer: enough for a few SDs. A long request gets more.
+  size_t capacity = 1 << 15;
+
   /// The device state as the TSM knows it: its latest answer's.
   std::string dsi_text;
   Json dsi;
