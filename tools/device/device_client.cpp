@@ -275,6 +275,12 @@ Answer parse_answer(std::string_view buffer, size_t size) {
   return answer;
 }
 
+// The image of a TA comes out of its request, so an answer with it needs little more than both.
+uint32_t capacity_for(std::string_view request) {
+  constexpr size_t kMax = std::numeric_limits<uint32_t>::max();
+  return static_cast<uint32_t>(std::min(kDefaultCapacity + request.size(), kMax));
+}
+
 Answer send(Session &agent, const Message &message, std::string_view request, uint32_t capacity) {
   // The capacity is for the longest answer: most of it will not be used.
   Call call{.command_id = OTRP_COMMAND_MESSAGE,

@@ -164,6 +164,9 @@ Answer parse_answer(std::string_view buffer, size_t size);
 
 constexpr uint32_t kDefaultCapacity = 4 << 20;
 
+/// A capacity that any answer to `request` fits.
+uint32_t capacity_for(std::string_view request);
+
 /// Sends a signed request. A message that fails is an answer, see require_success(); a response
 /// that says "fail" is a success.
 Answer send(Session &agent, const Message &message, std::string_view request,

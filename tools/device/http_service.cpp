@@ -2,7 +2,6 @@
 #include "device/http_service.h"
 
 #include <algorithm>
-#include <limits>
 #include <nlohmann/json.hpp>
 
 #include "common/agent_codes.h"
@@ -84,12 +83,6 @@ http::Answer message_failure(const Message &message, std::string_view request, c
           : device_failure(Error(message.command, error.code(), error.origin(), flaw), 400);
   tell_verdict(answer, verdict_of_code(error.code()));
   return answer;
-}
-
-/// The image of a TA comes out of its request, so an answer with it needs little more than both.
-uint32_t capacity_for(std::string_view request) {
-  constexpr size_t kMax = std::numeric_limits<uint32_t>::max();
-  return static_cast<uint32_t>(std::min(kDefaultCapacity + request.size(), kMax));
 }
 
 }  // namespace

@@ -24,6 +24,12 @@ std::string shown(std::string_view text) {
   return text.size() > kMaxShownLen ? line + "..." : line;
 }
 
+double milliseconds_of(const LogEntry &entry) {
+  return static_cast<double>(entry.duration.count() / 100) / 10;
+}
+
+}  // namespace
+
 std::string time_text(std::chrono::system_clock::time_point time) {
   using namespace std::chrono;
   const auto milli = duration_cast<milliseconds>(time.time_since_epoch()).count();
@@ -35,12 +41,6 @@ std::string time_text(std::chrono::system_clock::time_point time) {
   snprintf(text + len, sizeof(text) - len, ".%03dZ", static_cast<int>(milli % 1000));
   return text;
 }
-
-double milliseconds_of(const LogEntry &entry) {
-  return static_cast<double>(entry.duration.count() / 100) / 10;
-}
-
-}  // namespace
 
 std::string log_text(const LogEntry &entry) {
   char duration[40];

@@ -21,6 +21,9 @@ struct LogEntry {
   std::string note = {};
 };
 
+/// 2026-11-25T09:30:00.123Z
+std::string time_text(std::chrono::system_clock::time_point time);
+
 /// 2026-11-25T09:30:00.123Z #12 127.0.0.1:40312 POST /otrp/create-sd 200 14.2 ms pass
 ///
 /// Bytes that are not printable ASCII, and the backslash, are \xNN; long targets are cut.
