@@ -200,4 +200,8 @@ void serve(const Arguments &arguments) {
   serve_device(arguments);
 }
 
+void connect(const Arguments &arguments) {
+  connect_device(arguments, arguments);
+}
+
 }  // namespace device

@@ -6,6 +6,7 @@
 
 #include <string>
 
+#include "device/connect.h"
 #include "device/serve.h"
 
 namespace device {
@@ -13,7 +14,7 @@ namespace device {
 constexpr const char *kProgram = "otrp-device";
 
 /// What the command line says, as it stands there.
-struct Arguments : ServeArguments {
+struct Arguments : ServeArguments, ConnectArguments {
   bool stats = false;
   std::string message;
   std::string request_file;
@@ -40,6 +41,7 @@ void remove_object(const Arguments &arguments);
 void invoke_once(const Arguments &arguments);
 void obey_session(const Arguments &arguments);
 void serve(const Arguments &arguments);
+void connect(const Arguments &arguments);
 
 }  // namespace device
 

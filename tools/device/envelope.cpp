@@ -146,6 +146,20 @@ std::string verdict_of_response(std::string_view response) {
   return verdict_of_code(reason == nullptr ? 0 : code_of(*reason));
 }
 
+std::string installed_ta(std::string_view response) {
+  const json document = parse(response);
+  const bool has_image =
+      member(document, tools::message_of(tools::MessageId::kInstallTa).response) ||
+      member(document, tools::message_of(tools::MessageId::kUpdateTa).response);
+  const json payload = payload_of(document);
+  const json &content = inside(payload);
+  const json *status = member(content, "status");
+  const json *taid = member(content, "taid");
+  const bool passed = status != nullptr && *status == "pass";
+  if (!has_image || !passed || taid == nullptr || !taid->is_string()) return "";
+  return taid->get<std::string>();
+}
+
 std::string flaw_of_request(std::string_view request) {
   const json document = parse(request);
   if (document.is_discarded()) return "the request is no JSON that can be read to its end";

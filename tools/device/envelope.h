@@ -24,6 +24,11 @@ const tools::Message &message_in(std::string_view request, const tools::Message 
 std::string verdict_of_response(std::string_view response);
 std::string verdict_of_code(uint32_t code);
 
+/// ID of the TA whose image belongs to this signed response: its message installed or updated it,
+/// and passed. Empty for any other response. Beside one that says "fail" there can be an image,
+/// too, and it is not to be loaded.
+std::string installed_ta(std::string_view response);
+
 /// What `request` has that no device can take: it is cut, or a public key is not encoded as devices
 /// read it. A sentence, or nothing where nothing of the kind is to be seen.
 std::string flaw_of_request(std::string_view request);

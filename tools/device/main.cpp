@@ -126,6 +126,30 @@ const Command kCommands[] = {
      "  GET /info     GET /query/TAID       GET /healthz\n"
      "Whoever reaches the address can use the device.\n",
      "serve --listen 127.0.0.1:8080"},
+    {"connect",
+     device::connect,
+     "Call the TSM and do what it asks, until it asks no more",
+     {{"URL", "", &Arguments::url, "Where the TSM is"},
+      {"--image-dir", "DIR", &Arguments::image_directory,
+       "Folder for the TA images, as TAID.img (default: they are dropped)"},
+      {"--every", "SECONDS", &Arguments::every, "Call again, for ever, and go on after failures"},
+      {"--ca-file", "PEM", &Arguments::ca_file,
+       "The only roots to trust for https (default: the system's)"},
+      {"--max-messages", "COUNT", &Arguments::max_messages,
+       "Most messages of a session (default: 64)"},
+      {"--max-body", "BYTES", &Arguments::max_reply,
+       "Longest request that is taken (default: 8 MiB)"},
+      {"--connect-time", "SECONDS", &Arguments::connect_time,
+       "Longest that connecting may take (default: 10)"},
+      {"--answer-time", "SECONDS", &Arguments::reply_time,
+       "Longest that an answer may take, from the connection on (default: 60)"},
+      {"--retries", "COUNT", &Arguments::retries,
+       "How often a call without an answer is begun anew (default: 4)"},
+      {"--first-pause", "MILLISECONDS", &Arguments::first_pause,
+       "Before the first of these, then twice as long each, up to a minute (default: 1000)"}},
+     "The address that is called ends in the device's ID: it is added, unless URL ends in it.\n"
+     "Each message is a line on standard error. SIGTERM and SIGINT end between two messages.\n",
+     "connect https://tsm.example/tam --image-dir images --every 3600"},
 };
 
 const Command kObjectCommands[] = {
