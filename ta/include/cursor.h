@@ -38,8 +38,8 @@ struct reader {
 [[nodiscard]] inline bool take_u32(reader *in, uint32_t *value) {
   const uint8_t *bytes = nullptr;
   if (!take(in, sizeof *value, &bytes)) return false;
-  *value = 0;
-  for (uint32_t i = sizeof *value; i-- > 0;) *value = *value << 8 | bytes[i];
+  *value = bytes[0] | static_cast<uint32_t>(bytes[1]) << 8 | static_cast<uint32_t>(bytes[2]) << 16 |
+           static_cast<uint32_t>(bytes[3]) << 24;
   return true;
 }
 
@@ -54,32 +54,32 @@ struct writer {
 };
 
 /// The bytes as they are.
-inline void put(writer *out, const data_part &bytes) {
-  if (bytes.len > out->left) *out = {nullptr, 0, false};
-  if (!out->ok || bytes.len == 0) return;
+inline void put(writer *out, data_part bytes) {
+  if (bytes.len == 0) return;
+  if (bytes.len > out->left) {
+    *out = {nullptr, 0, false};  // nor will anything fit that comes after it
+    return;
+  }
   memcpy(out->at, bytes.data, bytes.len);
   out->at += bytes.len;
   out->left -= bytes.len;
 }
 
-/// The low `n` bytes of a number.
-inline void put_number(writer *out, uint32_t value, uint32_t n) {
-  for (; n != 0; --n, value >>= 8) {
-    const auto low = static_cast<uint8_t>(value);
-    put(out, {&low, 1});
-  }
+/// A number as two bytes.
+inline void put_u16(writer *out, uint16_t value) {
+  const uint8_t bytes[] = {static_cast<uint8_t>(value), static_cast<uint8_t>(value >> 8)};
+  put(out, {bytes, sizeof bytes});
 }
 
-/// A number as two bytes, or as four.
-inline void put_u16(writer *out, uint16_t value) {
-  put_number(out, value, sizeof value);
-}
+/// A number as four bytes.
 inline void put_u32(writer *out, uint32_t value) {
-  put_number(out, value, sizeof value);
+  const uint8_t bytes[] = {static_cast<uint8_t>(value), static_cast<uint8_t>(value >> 8),
+                           static_cast<uint8_t>(value >> 16), static_cast<uint8_t>(value >> 24)};
+  put(out, {bytes, sizeof bytes});
 }
 
 /// The number of bytes, as four, and the bytes.
-inline void put_block(writer *out, const data_part &bytes) {
+inline void put_block(writer *out, data_part bytes) {
   put_u32(out, bytes.len);
   put(out, bytes);
 }
