@@ -13,6 +13,7 @@ struct text_counter {
   void put(char) { ++len; }
   void put_run(const char *, uint32_t run_len) { len += run_len; }
   void put_escaped(const char *text, uint32_t text_len);
+  void put_number(double value);
 };
 
 struct text_writer {
@@ -24,6 +25,7 @@ struct text_writer {
     at += run_len;
   }
   void put_escaped(const char *text, uint32_t text_len);
+  void put_number(double value);
 };
 
 // The letter that stands for a character behind a backslash; 0 when it stands for itself.
@@ -82,6 +84,21 @@ void text_writer::put_escaped(const char *text, uint32_t text_len) {
 
 // ---- Numbers
 
+namespace {
+
+// Numbers are few: the same code counts and writes them. `at` is NULL where they are only counted.
+struct number_sink {
+  char *at;
+  uint32_t len = 0;
+
+  void put_run(const char *run, uint32_t run_len) {
+    if (at != nullptr) memcpy(at + len, run, run_len);
+    len += run_len;
+  }
+};
+
+}  // namespace
+
 // `digits` ends at `end`; returns where it starts.
 static char *put_digits_before(char *end, uint64_t number, uint32_t min_digits) {
   for (; number != 0 || min_digits != 0; number /= 10) {
@@ -91,8 +108,7 @@ static char *put_digits_before(char *end, uint64_t number, uint32_t min_digits) 
   return end;
 }
 
-template <class Sink>
-static void put_digits(Sink *out, uint64_t number, uint32_t min_digits) {
+static void put_digits(number_sink *out, uint64_t number, uint32_t min_digits) {
   char digits[20];  // 2^64 has as many
   char *end = digits + sizeof digits;
   const char *start = put_digits_before(end, number, min_digits);
@@ -141,8 +157,7 @@ static uint32_t millionths(uint64_t fraction, int shift) {
   return quotient + (up ? 1 : 0);
 }
 
-template <class Sink>
-static void put_fraction(Sink *out, const binary_number &number) {
+static void put_fraction(number_sink *out, const binary_number &number) {
   const int shift = -number.exponent;
   uint64_t whole = shift < 64 ? number.mantissa >> shift : 0;
   const uint64_t fraction =
@@ -153,7 +168,7 @@ static void put_fraction(Sink *out, const binary_number &number) {
     parts = 0;
   }
   put_digits(out, whole, 1);
-  out->put('.');
+  out->put_run(".", 1);
   put_digits(out, parts, 6);
 }
 
@@ -162,8 +177,7 @@ static constexpr uint32_t kMaxBillions = 35;  // limbs of 2^1024
 
 // An integer of 2^63 or more, exactly, and six zeros: limbs of nine digits, doubled as often as it
 // takes.
-template <class Sink>
-static void put_large(Sink *out, const binary_number &number) {
+static void put_large(number_sink *out, const binary_number &number) {
   uint32_t limbs[kMaxBillions] = {};
   uint32_t num_limbs = 0;
   for (uint64_t rest = number.mantissa; rest != 0; rest /= kBillion) {
@@ -184,12 +198,11 @@ static void put_large(Sink *out, const binary_number &number) {
   out->put_run(".000000", 7);
 }
 
-template <class Sink>
-static void put_number(Sink *out, double value) {
+static void put_decimal(number_sink *out, double value) {
   constexpr double kInt64Limit = 9223372036854775808.0;
   const bool in_range = value >= -kInt64Limit && value < kInt64Limit;
   const bool integral = !in_range || static_cast<double>(static_cast<int64_t>(value)) == value;
-  if (value < 0) out->put('-');
+  if (value < 0) out->put_run("-", 1);
   if (!integral) {
     put_fraction(out, take_apart(value));
   } else if (in_range) {
@@ -198,6 +211,18 @@ static void put_number(Sink *out, double value) {
   } else {
     put_large(out, take_apart(value));
   }
+}
+
+void text_counter::put_number(double value) {
+  number_sink digits = {nullptr};
+  put_decimal(&digits, value);
+  len += digits.len;
+}
+
+void text_writer::put_number(double value) {
+  number_sink digits = {at};
+  put_decimal(&digits, value);
+  at += digits.len;
 }
 
 // ---- Documents
@@ -220,7 +245,7 @@ static void put_value(Sink *out, const JSON_Value *value) {
     case kJsonTrue:
       return out->put_run("true", 4);
     case kJsonNumber:
-      return put_number(out, value->number);
+      return out->put_number(value->number);
     case kJsonString:
       return put_string(out, value->text, value->count);
     case kJsonArray:
