@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/image.h"
+
 #include "common/files.h"
 #include "tsm/crypto.h"
 
