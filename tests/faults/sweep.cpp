@@ -13,12 +13,20 @@ using tee::test::Fault;
 using tee::test::FaultReport;
 using Records = std::map<std::string, std::string>;
 
-/// Payloads by ID, but of a new AIK only that it is new. An object
-/// without a whole payload, which a cut may leave, has an empty one.
+/// Adds white space to the payloads of all objects whose ID begins with `prefix`.
+void lengthen(Snapshot &snapshot, const std::string &prefix) {
+  for (auto &[id, raw] : snapshot.agent) {
+    if (id.starts_with(prefix)) raw = stored(*payload_of(raw) + std::string(30000, ' '));
+  }
+}
+
+/// Payloads by ID, but of a new AIK only that it is new. An object without a whole payload, which a
+/// cut may leave, has an empty one.
 Records records_of(const AgentDevice &device, const Records &before = {}) {
   Records records;
   for (const auto &[id, raw] : device.objects()) {
     std::string &text = records[id] = payload_of(raw).value_or("");
+    text.erase(text.find_last_not_of(' ') + 1);
     const auto old = before.find(id);
     const bool is_new = old == before.end() || old->second != text;
     if (before.empty() || !id.starts_with("SP_INFO_") || text.empty() || !is_new) continue;
@@ -82,6 +90,8 @@ class Sweep::Driver {
   }
 
   unsigned run(const FaultKind &kind) {
+    start_ = snapshot_;
+    if (kind.long_records != nullptr) lengthen(start_, kind.long_records);
     const bool is_limit = kind.fault == Fault::kFullHeap;
     unsigned num_points = 0;
     unsigned n = is_limit ? UINT32_MAX : 1;
@@ -157,7 +167,7 @@ class Sweep::Driver {
   FaultReport run_point(const FaultKind &kind, unsigned n) {
     SCOPED_TRACE(std::string(kind.name) + " " + std::to_string(n));
     const tee::test::TraceSink log;
-    Scene scene(origin_, snapshot_);
+    Scene scene(origin_, start_);
     tee::test::Device &host = scene.device.host();
     host.create_at_once(kind.create_at_once);
     if (scenario_.ask != Ask::kCreation) scene.device.open();
@@ -273,6 +283,7 @@ class Sweep::Driver {
   std::string request_;
   std::string state_request_;
   Snapshot snapshot_;
+  Snapshot start_;  // with records as long as a kind of fault wants them
   Records before_;
   std::set<Records> orderly_;
   std::set<Records> survived_;

@@ -45,6 +45,8 @@ struct FaultKind {
   bool create_at_once = false;  // on storage that makes each creation durable in its own call
   TEE_Result code = 0;          // in place of the natural one
   unsigned step = 1;            // from one point to the next
+  /// Records whose ID begins with this are so long that nothing takes more memory than to read one.
+  const char *long_records = nullptr;
 };
 
 class Sweep {
