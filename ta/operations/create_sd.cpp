@@ -116,9 +116,7 @@ static TEE_Result create_sd(const char *spid, const char *sdname, const char *sp
   return TEE_SUCCESS;
 }
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
+static TEE_Result carry_out(exchange *x) {
   TRY(add_ids(x));
   TRY(check_dsihash(*x));
   const JSON_Object *content = nullptr;
@@ -137,10 +135,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   return set_teespaik(x->content, pubkey.get(), pubkey_len, kForm.process);
 }
 
-TEE_Result createsd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
-                            const jsmn_object *) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs);
-  return close_response(&x, result, response);
+TEE_Result createsd_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                            ta_image *image, const jsmn_object *request) {
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }

@@ -118,9 +118,7 @@ static TEE_Result read_deleteta(const JSON_Object *content, bool *deleteta) {
   return *deleteta || keep ? TEE_SUCCESS : OTRP_BAD_REQUEST;
 }
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
+static TEE_Result carry_out(exchange *x) {
   TRY(add_ids(x));
   TRY(check_dsihash(*x));
   const JSON_Object *content = nullptr;
@@ -131,10 +129,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   return delete_sd(x->tsmid, json_object_get_string(content, "sdname"), deleteta);
 }
 
-TEE_Result deletesd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
-                            const jsmn_object *) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs);
-  return close_response(&x, result, response);
+TEE_Result deletesd_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                            ta_image *image, const jsmn_object *request) {
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }

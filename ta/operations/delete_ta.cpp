@@ -60,9 +60,7 @@ static TEE_Result delete_ta(const char *tsmid, const char *sdname, const char *t
   return refresh_sd_in_dsi(sdname);
 }
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
+static TEE_Result carry_out(exchange *x) {
   TRY(check_dsihash(*x));
   const JSON_Object *content = nullptr;
   TRY(decrypt_content(x, &content));
@@ -81,10 +79,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   return TEE_SUCCESS;
 }
 
-TEE_Result deleteta_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
-                            const jsmn_object *) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs);
-  return close_response(&x, result, response);
+TEE_Result deleteta_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                            ta_image *image, const jsmn_object *request) {
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }

@@ -17,14 +17,9 @@ const char kContentTemplate[] =
 
 }  // namespace
 
-tee_ptr<char> copy_member(const jsmn_object *from, const char *key) {
-  const slice_ptr slice(jsmn_object_get_string(from, key));
-  return tee_ptr<char>(slice ? jsmn_string_dup(slice->data, slice->len) : nullptr);
-}
-
 // ---- Opening
 
-TEE_Result check_input(const exchange_form &form, const jsmn_object *tbs, char **response) {
+static TEE_Result check_input(const exchange_form &form, const jsmn_object *tbs, char **response) {
   const bool complete = response != nullptr && (tbs != nullptr || !form.rules.needs_payload);
   CHECK_AS(form.process, complete, OTRP_MISSING, "%s input is NULL", form.process);
   *response = nullptr;
@@ -47,7 +42,8 @@ static TEE_Result check_objects(const exchange &x, const JSON_Object *root_objec
           static_cast<const void *>(x.content_value.get()));
 }
 
-TEE_Result open_response(exchange *x) {
+// After a failure there will be no response: close_response() finds that out.
+static TEE_Result open_response(exchange *x) {
   const exchange_form &form = *x->form;
   x->root.reset(json_value_init_object());
   x->content_value.reset(json_parse_string(kContentTemplate));
@@ -66,7 +62,7 @@ TEE_Result open_response(exchange *x) {
           static_cast<void *>(x->response));
 }
 
-TEE_Result open_request(exchange *x, const jsmn_object *tbs) {
+static TEE_Result open_request(exchange *x, const jsmn_object *tbs) {
   const exchange_form &form = *x->form;
   if (tbs != nullptr) x->request.reset(jsmn_object_get_object(tbs, form.tbs_request));
   CHECK_AS(form.process, x->request, OTRP_BAD_REQUEST, "%s", form.texts.no_request);
@@ -94,6 +90,11 @@ TEE_Result check_dsihash(const exchange &x) {
   FAIL_AS(form.process, result, "validate_dsihash fail error code: 0x%x", result);
 }
 
+static tee_ptr<char> copy_member(const jsmn_object *from, const char *key) {
+  const slice_ptr slice(jsmn_object_get_string(from, key));
+  return tee_ptr<char>(slice ? jsmn_string_dup(slice->data, slice->len) : nullptr);
+}
+
 TEE_Result decrypt_content(exchange *x, const JSON_Object **members) {
   const exchange_form &form = *x->form;
   *members = nullptr;
@@ -113,7 +114,8 @@ TEE_Result decrypt_content(exchange *x, const JSON_Object **members) {
 
 // ---- Closing
 
-TEE_Result close_response(exchange *x, TEE_Result result, char **response) {
+// TEE_SUCCESS when there is a response, be the outcome good or bad.
+static TEE_Result close_response(exchange *x, TEE_Result result, char **response) {
   const exchange_form &form = *x->form;
   TRY_LOG_AS(form.process,
              finish_tbs_msg_status(x->tsmid, result, x->response, x->content_value.get(), true),
@@ -122,5 +124,20 @@ TEE_Result close_response(exchange *x, TEE_Result result, char **response) {
   x->decrypted.reset();
   *response = json_serialize_to_string(x->root.get());
   CHECK_AS(form.process, *response != nullptr, OTRP_NO_MEMORY, "%s", form.texts.not_serialized);
+  return TEE_SUCCESS;
+}
+
+TEE_Result run_exchange(const exchange_form &form, TEE_Result (*carry_out)(exchange *x),
+                        const char *tsmid, const jsmn_object *tbs, char **response, ta_image *image,
+                        const jsmn_object *message) {
+  TRY(check_input(form, tbs, response));
+  exchange x(form, tsmid, message);
+  TEE_Result result = open_response(&x);
+  if (result == TEE_SUCCESS) result = open_request(&x, tbs);
+  if (result == TEE_SUCCESS) result = carry_out(&x);
+  TRY(close_response(&x, result, response));
+  if (x.image.data == nullptr) return TEE_SUCCESS;
+  image->len = x.image.len;
+  image->data = x.image.release();
   return TEE_SUCCESS;
 }

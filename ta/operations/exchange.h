@@ -1,15 +1,14 @@
 // SPDX-License-Identifier: BSD-2-Clause
-/// The frame that the six state-changing messages share. A handler is three stages:
-///
-///     open_response()      the response's objects
-///     the message's work   with the steps below, in its own order
-///     close_response()     the outcome, whatever it was, as a response text
+/// The frame that the six state-changing messages share. run_exchange() opens the response and the
+/// request, has the message do its work with the steps below, in its own order, and closes the
+/// response, whatever came of that.
 ///
 /// The steps are alike; what they insist on and what they say of a failure is not. Each message
 /// states its own in an `exchange_form`.
 #ifndef EXCHANGE_H
 #define EXCHANGE_H
 
+#include "message.h"
 #include "ownership.h"
 #include "platform.h"
 #include "state/json.h"
@@ -77,10 +76,12 @@ struct exchange_form {
 
 /// One message on its way through its handler.
 struct exchange {
-  exchange(const exchange_form &message, const char *sender) : form(&message), tsmid(sender) {}
+  exchange(const exchange_form &own, const char *sender, const jsmn_object *whole)
+      : form(&own), tsmid(sender), message(whole) {}
 
   const exchange_form *form;
-  const char *tsmid;  // for whom the response's content is encrypted: the sender, at first
+  const char *tsmid;           // for whom the response's content is encrypted: the sender, at first
+  const jsmn_object *message;  // all of it, with what stands beside the payload
 
   json_ptr root;                    // the response
   JSON_Object *response = nullptr;  // its object named tbs_response; NULL until it is there
@@ -89,19 +90,15 @@ struct exchange {
 
   token_object_ptr request;  // the to-be-signed request
   json_ptr decrypted;        // the request's content
+  secret_bytes image;        // a TA image that goes along with the response, if there is one
 };
 
-/// Checks the arguments of a process function and clears `*response`. OTRP_MISSING means that the
-/// process function returns that.
-[[nodiscard]] TEE_Result check_input(const exchange_form &form, const jsmn_object *tbs,
-                                     char **response);
-
-/// Makes the response's objects. After a failure there will be no response: close_response()
-/// finds that out.
-[[nodiscard]] TEE_Result open_response(exchange *x);
-
-/// Finds the to-be-signed request in the payload.
-[[nodiscard]] TEE_Result open_request(exchange *x, const jsmn_object *tbs);
+/// A process function (message.h) for messages of this form. `carry_out` does their work; its
+/// result is the outcome that the response tells.
+[[nodiscard]] TEE_Result run_exchange(const exchange_form &form,
+                                      TEE_Result (*carry_out)(exchange *x), const char *tsmid,
+                                      const jsmn_object *tbs, char **response, ta_image *image,
+                                      const jsmn_object *message);
 
 /// Echoes "ver", "rid" and "tid".
 [[nodiscard]] TEE_Result add_ids(exchange *x);
@@ -112,12 +109,5 @@ struct exchange {
 /// Decrypts the request's "content" with the TEE key. `*members` stays the exchange's; it is NULL
 /// when the content is no object and the message does not insist on one.
 [[nodiscard]] TEE_Result decrypt_content(exchange *x, const JSON_Object **members);
-
-/// Puts the outcome into the response and hands it out as a text. TEE_SUCCESS when there is a text,
-/// be the outcome good or bad.
-[[nodiscard]] TEE_Result close_response(exchange *x, TEE_Result result, char **response);
-
-/// A copy of the member `key` of the request, NULL when it has none.
-tee_ptr<char> copy_member(const jsmn_object *from, const char *key);
 
 #endif

@@ -105,25 +105,14 @@ TEE_Result verify_encrypted_ta(const char *field, const char *spid, const jsmn_o
 }
 
 TEE_Result hand_over_image(exchange *x, const char *taid, ta_register_operation operation_code,
-                           secret_bytes *plain, ta_image *image) {
+                           secret_bytes *plain) {
   if (json_object_set_string(x->response, "taid", taid) != JSONSuccess) return OTRP_NO_MEMORY;
-  image->len = plain->len;
-  image->data = plain->release();
-  const uint8_t *with_header = image->len >= kTaImageHeaderLen ? image->data : nullptr;
+  x->image.len = plain->len;
+  x->image.data = plain->release();
+  const uint8_t *with_header = x->image.len >= kTaImageHeaderLen ? x->image.data : nullptr;
   TRY_LOG_AS(x->form->process, save_ta_register_info(taid, with_header, operation_code),
              "save_ta_register_info fail error code: 0x%x");
   return TEE_SUCCESS;
-}
-
-TEE_Result close_with_image(exchange *x, TEE_Result result, char **response, ta_image *image) {
-  const TEE_Result closed = close_response(x, result, response);
-  if (closed != TEE_SUCCESS) {
-    secret_bytes dropped;
-    dropped.data = image->data;
-    dropped.len = image->len;
-    *image = {};
-  }
-  return closed;
 }
 
 // ---- The records
@@ -168,11 +157,8 @@ static TEE_Result install_ta(const char *sdname, const char *spid, const char *t
 
 // ---- The message
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
-                            ta_image *image) {
+static TEE_Result carry_out(exchange *x) {
   const char *as = kForm.process;
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
   TRY(add_ids(x));
   TRY(check_dsihash(*x));
   const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
@@ -184,7 +170,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   const char *sdname = json_object_get_string(content, "sdname");
   CHECK_AS(as, taid != nullptr, OTRP_MISSING, "install_ta fail input is null");
   const TEE_Result verified =
-      verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request);
+      verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, x->message);
   CHECK_AS(as, verified == TEE_SUCCESS, verified, "Failed to verify install TA request\n");
 
   secret_bytes plain;
@@ -196,13 +182,10 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   TRY_LOG_AS(as, install_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "install_ta error code 0x%x");
 
-  return hand_over_image(x, taid, kRegisterTa, &plain, image);
+  return hand_over_image(x, taid, kRegisterTa, &plain);
 }
 
 TEE_Result installta_process(const char *tsmid, const jsmn_object *tbs, char **response,
                              ta_image *image, const jsmn_object *request) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs, request, image);
-  return close_with_image(&x, result, response, image);
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }

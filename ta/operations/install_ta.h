@@ -5,7 +5,6 @@
 
 #include <stdint.h>
 
-#include "message.h"
 #include "operations/exchange.h"
 #include "ownership.h"
 #include "platform.h"
@@ -19,14 +18,9 @@
                                              const jsmn_object *encrypted_ta, uint8_t **image,
                                              uint32_t *image_len, uint8_t **digest);
 
-/// Names the TA in the response, moves the decrypted image to where the pipeline takes it and
-/// changes the TA's row of the register, which refuses an image that is too short to have a header.
+/// Names the TA in the response, lets the decrypted image go along with it and changes the TA's row
+/// of the register, which refuses an image that is too short to have a header.
 [[nodiscard]] TEE_Result hand_over_image(exchange *x, const char *taid,
-                                         ta_register_operation operation_code, secret_bytes *plain,
-                                         ta_image *image);
-
-/// close_response() for these messages: without a response there is no image either.
-[[nodiscard]] TEE_Result close_with_image(exchange *x, TEE_Result result, char **response,
-                                          ta_image *image);
+                                         ta_register_operation operation_code, secret_bytes *plain);
 
 #endif

@@ -83,9 +83,7 @@ static TEE_Result update_sd(const char *sdname, const char *spid, const char *ts
   return TEE_SUCCESS;
 }
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
+static TEE_Result carry_out(exchange *x) {
   TRY(check_dsihash(*x));
   const JSON_Object *content = nullptr;
   TRY(decrypt_content(x, &content));
@@ -108,10 +106,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs) {
   return set ? TEE_SUCCESS : OTRP_NO_MEMORY;
 }
 
-TEE_Result updatesd_process(const char *tsmid, const jsmn_object *tbs, char **response, ta_image *,
-                            const jsmn_object *) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs);
-  return close_response(&x, result, response);
+TEE_Result updatesd_process(const char *tsmid, const jsmn_object *tbs, char **response,
+                            ta_image *image, const jsmn_object *request) {
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }

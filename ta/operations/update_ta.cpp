@@ -39,11 +39,8 @@ static TEE_Result update_ta(const char *sdname, const char *spid, const char *ta
   return TEE_SUCCESS;
 }
 
-static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_object *request,
-                            ta_image *image) {
+static TEE_Result carry_out(exchange *x) {
   const char *as = kForm.process;
-  TRY(open_response(x));
-  TRY(open_request(x, tbs));
   TRY(check_dsihash(*x));
   const JSON_Object *content = nullptr;
   TRY(decrypt_content(x, &content));
@@ -51,7 +48,7 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   const char *taid = json_object_get_string(content, "taid");
   const char *sdname = json_object_get_string(content, "sdname");
   CHECK_AS(as, taid != nullptr, OTRP_MISSING, "update ta fail input is null");
-  TRY(verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, request));
+  TRY(verify_tsm_installta_updateta_signature(x->request.get(), x->tsmid, taid, x->message));
 
   const token_object_ptr encrypted_ta(jsmn_object_get_object(x->request.get(), "encrypted_ta"));
   CHECK_AS(as, encrypted_ta, OTRP_NO_MEMORY, "jsmn_object_get_object encrypted_ta_object is null");
@@ -65,13 +62,10 @@ static TEE_Result carry_out(exchange *x, const jsmn_object *tbs, const jsmn_obje
   TRY_LOG_AS(as, update_ta(sdname, spid, taid, json_object_get_string(content, "ta_version")),
              "update_ta error code 0x%x");
 
-  return hand_over_image(x, taid, kUpdateTa, &plain, image);
+  return hand_over_image(x, taid, kUpdateTa, &plain);
 }
 
 TEE_Result updateta_process(const char *tsmid, const jsmn_object *tbs, char **response,
                             ta_image *image, const jsmn_object *request) {
-  TRY(check_input(kForm, tbs, response));
-  exchange x(kForm, tsmid);
-  const TEE_Result result = carry_out(&x, tbs, request, image);
-  return close_with_image(&x, result, response, image);
+  return run_exchange(kForm, carry_out, tsmid, tbs, response, image, request);
 }
