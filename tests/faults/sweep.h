@@ -49,6 +49,9 @@ struct FaultKind {
   const char *long_records = nullptr;
 };
 
+/// The TSM manages the device as ever, and ends with one that holds nothing.
+void live_on(Scene &scene);
+
 class Sweep {
  public:
   explicit Sweep(const Scenario &scenario);

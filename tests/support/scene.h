@@ -14,6 +14,9 @@ class Scene : public Holds<AgentDevice>, public Manager {
   /// A device with its objects in a state directory.
   Scene(const std::string &tsmid, const std::string &state_directory)
       : Holds<AgentDevice>{AgentDevice(state_directory)}, Manager(device, tsmid) {}
+  /// A device that holds these objects.
+  explicit Scene(const Snapshot &snapshot)
+      : Holds<AgentDevice>{AgentDevice(snapshot)}, Manager(device) {}
   /// A device in the state of `other`, as its TSM knows it; no session is open yet.
   Scene(const Scene &other, const Snapshot &snapshot)
       : Holds<AgentDevice>{AgentDevice(snapshot)}, Manager(device, other) {}
