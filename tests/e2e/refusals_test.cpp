@@ -54,6 +54,7 @@ const RefusalCase kRefusals[] = {
     {"CreateNoHash", kCreate, kTbs, {{"dsihash", nullptr}}, kMismatch, kWithIds},
     {"CreateNoRid", kCreate, kTbs, {{"rid", nullptr}}, kBadRequest, kWithoutIds},
     {"CreateNoContent", kCreate, kTbs, {{"content", nullptr}}, kBadRequest, kWithIds},
+    {"CreateContentIsText", kCreate, kTbs, {{"content", "text"}}, kBadRequest, kWithIds},
     {"CreateGarbledContent", kCreate, kTbs, kGarbledContent, kBadRequest, kWithIds},
     {"CreateContentIsAnArray", kCreate, kContent, kNoObject, kMissing, kWithIds},
     {"CreateSameName", kCreate, kContent, {{"sdname", "sd1"}}, kSdExists, kWithIds},
@@ -77,6 +78,7 @@ const RefusalCase kRefusals[] = {
     {"UpdateSdControlCharacterInCert", kUpdate, kContent, kSpoiledCert, kNoMemory, kWithIds},
 
     {"DeleteSdStaleHash", kDelete, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithIds},
+    {"DeleteSdNoContent", kDelete, kTbs, {{"content", nullptr}}, kBadRequest, kWithIds},
     {"DeleteSdGarbledContent", kDelete, kTbs, kGarbledContent, kBadRequest, kWithIds},
     {"DeleteSdNotListed", kDelete, kContent, {{"sdname", "sd9"}}, kResponseFailed, kWithIds},
     {"DeleteSdOtherTsm", kDelete, kContent, {{"tsmid", "tsm2"}}, kMismatch, kWithIds},
@@ -114,6 +116,7 @@ const RefusalCase kRefusals[] = {
     {"UpdateTaNotListed", kUpdateTa, kTbs, {}, kNotFound, kWithIds, taid("ta9")},
 
     {"DeleteTaStaleHash", kDeleteTa, kTbs, {{"dsihash", kStaleHash}}, kMismatch, kWithoutIds},
+    {"DeleteTaNoContent", kDeleteTa, kTbs, {{"content", nullptr}}, kBadRequest, kWithoutIds},
     {"DeleteTaGarbledContent", kDeleteTa, kTbs, kGarbledContent, kBadRequest, kWithoutIds},
     {"DeleteTaContentIsAnArray", kDeleteTa, kContent, kNoObject, kMissing, kWithoutIds},
     {"DeleteTaOtherTsm", kDeleteTa, kContent, {{"tsmid", "tsm2"}}, kMismatch, kWithoutIds},
@@ -203,7 +206,13 @@ TEST_F(Refusals, AContentForAnUnknownTsmIsCarriedOutAndNotAnswered) {
   EXPECT_TRUE(scene.device.record("SD_INFO_sd4"));
 }
 
-// ---- The one message without a signature
+// ---- What is not signed
+
+TEST_F(Refusals, AQueryThatNamesNoTaIsNotFound) {
+  log.clear();
+  EXPECT_EQ(scene.device.invoke(1, word(0) + word(2) + "{}", 57).result, kNotFound);
+  EXPECT_EQ(said(log), row_of(log_rows, "QueryNoTaid"));
+}
 
 TEST_F(Refusals, GetTaInfoHasNoResponseThen) {
   const auto asked = [](const char *spid, const std::string &ta) {

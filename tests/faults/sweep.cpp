@@ -6,6 +6,8 @@
 #include <algorithm>
 #include <map>
 
+#include "support/log_rows.h"
+
 namespace otrp_test {
 namespace {
 
@@ -113,6 +115,8 @@ class Sweep::Driver {
     learn_good_run();
   }
 
+  const std::set<std::string> &log_rows() const { return said_; }
+
   unsigned run(const FaultKind &kind) {
     start_ = snapshot_;
     if (kind.long_records != nullptr) lengthen(start_, kind.long_records);
@@ -190,13 +194,15 @@ class Sweep::Driver {
 
   FaultReport run_point(const FaultKind &kind, unsigned n) {
     SCOPED_TRACE(std::string(kind.name) + " " + std::to_string(n));
-    const tee::test::TraceSink log;
+    tee::test::TraceSink log;
     Scene scene(origin_, start_);
     tee::test::Device &host = scene.device.host();
     host.create_at_once(kind.create_at_once);
     if (scenario_.ask != Ask::kCreation) scene.device.open();
     host.fail(kAgentUuid, kind.fault, n, kind.and_after, kind.code);
+    log.clear();
     const bool passed = perform(scene);
+    said_.insert(said(log));
     const FaultReport report = host.fault_report();
     SCOPED_TRACE(report.call);
     host.clear_faults();
@@ -313,6 +319,7 @@ class Sweep::Driver {
   std::set<Records> survived_;
   std::set<std::pair<Records, size_t>> went_on_;        // and a length
   std::set<std::pair<std::string, Records>> lived_on_;  // what a cut met, and left
+  std::set<std::string> said_;
   std::set<std::string> final_;
 };
 
@@ -326,6 +333,10 @@ Sweep::~Sweep() = default;
 
 unsigned Sweep::run(const FaultKind &kind) {
   return driver_->run(kind);
+}
+
+const std::set<std::string> &Sweep::log_rows() const {
+  return driver_->log_rows();
 }
 
 }  // namespace otrp_test

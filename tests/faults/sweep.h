@@ -60,6 +60,9 @@ class Sweep {
   /// Returns the number of points tried, and fails the test that calls it.
   unsigned run(const FaultKind &kind);
 
+  /// What the log said at one point or another, as rows of log_rows.txt.
+  const std::set<std::string> &log_rows() const;
+
  private:
   class Driver;
   std::unique_ptr<Driver> driver_;

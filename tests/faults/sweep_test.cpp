@@ -6,6 +6,8 @@
 
 #include <cstdio>
 
+#include "support/log_rows.h"
+
 namespace otrp_test {
 namespace {
 
@@ -110,6 +112,10 @@ TEST_P(FaultSweep, LeavesTheDeviceWhole) {
     const unsigned num_points = sweep.run(kind);
     std::printf("points tried: %-18s %-16s %5u\n", GetParam().name, kind.name, num_points);
     EXPECT_EQ(num_points == 0, GetParam().never.contains(kind.fault)) << kind.name;
+  }
+  for (const auto &[name, lines] : read_log_rows()) {
+    if (!name.starts_with(GetParam().name + std::string(" as a whole, "))) continue;
+    EXPECT_TRUE(sweep.log_rows().contains(lines)) << name;
   }
 }
 
