@@ -20,6 +20,9 @@ if(OTRP_SYSROOT)
   set(ENV{PKG_CONFIG_SYSROOT_DIR} ${OTRP_SYSROOT})
   set(CMAKE_C_FLAGS_INIT "-isystem ${OTRP_SYSROOT}/usr/include/${machine}")
   set(CMAKE_CXX_FLAGS_INIT "${CMAKE_C_FLAGS_INIT}")
-  # So that a program finds there what its libraries need, too.
-  set(CMAKE_EXE_LINKER_FLAGS_INIT "-Wl,--disable-new-dtags")
+  # What the libraries of a program need is found there, too, by the linker and when it runs; a
+  # program that is built as it is installed has no path there of its own.
+  set(CMAKE_EXE_LINKER_FLAGS_INIT "-Wl,-rpath-link,${OTRP_SYSROOT}/usr/lib/${machine}")
+  list(APPEND CMAKE_CROSSCOMPILING_EMULATOR
+    -E LD_LIBRARY_PATH=${OTRP_SYSROOT}/usr/lib/${machine})
 endif()
