@@ -198,7 +198,7 @@ TEST_F(DeviceProgram, FailedMessageLeavesNoFile) {
 TEST_F(DeviceProgram, MakesNoDeviceUnnoticed) {
   const Outcome refused = run("--existing info");
   EXPECT_EQ(refused.exit_code, 2);
-  EXPECT_THAT(refused.err, HasSubstr("otrp-device: no device in state"));
+  EXPECT_THAT(refused.err, HasSubstr("otrp-device: there is no device in state"));
   EXPECT_FALSE(std::filesystem::exists(path("state")));
   EXPECT_EQ(run("info").err, "note: made a new device in " + path("state") + "\n");
   EXPECT_EQ(run("--existing info").err, "");

@@ -178,6 +178,87 @@ class OverHttp(Operator):
         self.tsm("show", 0, f"TA {TAID}")
 
 
+class Fleet(Operator):
+    def setUp(self):
+        super().setUp()
+        self.tsm("device add d1 --state d")
+
+    def names(self):
+        return [line.split()[0] for line in self.tsm("device list").out.decode().splitlines()]
+
+    def test_a_name_is_one_device_and_its_key_the_one_that_was_told(self):
+        self.tsm("device add d1 --state e", 2, "d1 is another device")
+        self.tsm("device add d2 --state d", 2, "is called d1 already")
+        for name in ("all", "-x", "a/b", "a*", "x" * 65, ".", ""):
+            self.run_words(TSM + ["device", "add", "--state", "d", "--", name], 2, "bad device name")
+        self.tsm("device add d2", 2, "no device is named")
+        self.tsm("device add d2 --state missing --existing", 2)
+        self.tsm("device add d1 --device device.json")  # and no way to it any more
+        self.tsm("manage --on d1 get-device-state", 2, "no way to d1")
+        self.tsm("request --on d1 -o asked get-device-state")
+        self.send("get-device-state", "asked")
+        self.tsm("response asked.answer --on d1")
+        info = self.read("device.json")
+        stranger = self.run_words(DEVICE + ["--state", "e", "info"], 0).out
+        with serving(lambda call, body: (200, stranger, {})) as url:
+            self.tsm(f"device add web --url {url}", 0, "proves nothing")
+            self.tsm(f"device add d1 --url {url}", 2, "d1 is another device")
+        with serving(lambda call, body: (200, info, {})) as url:
+            self.assertEqual(self.tsm(f"device add d1 --url {url}/").err, "")
+        self.assertIn("its own word", self.tsm("device list web").out.decode())
+        self.tsm("device rm w*")
+        self.assertEqual((self.names(), len(os.listdir(self.path("tsm/devices")))), (["d1"], 1))
+        self.write("tsm/inventory.json", '{"devices": {"d1": {"key": "../x"}}}')
+        self.tsm("device list", 2, "inventory.json is damaged")
+
+    def test_several_devices_are_managed_at_once(self):
+        self.write("list", "# more\n\n" + "".join(f"d{i} --state more/{i}\n" for i in range(2, 6)))
+        self.assertEqual(self.tsm("device add --list list -j 3").out, b"4 added\n")
+        self.assertEqual(self.names(), ["d1", "d2", "d3", "d4", "d5"])
+        self.assertEqual(self.tsm("manage --on all -j 3 get-device-state").out, b"5 pass\n")
+        create = "create-sd --sp sp --sd sd --sp-cert text"
+        self.assertEqual(self.tsm(f"manage --on d[23] --on d2 -j 9 {create}").out, b"2 pass\n")
+        shutil.rmtree(self.path("more/5"))
+        mixed = self.tsm(f"manage --on d* -j 2 {create}", 2)
+        self.assertEqual(mixed.out, b"2 pass, 1 not asked: d5, 2 refused: OTRP_SD_EXISTS (d2, d3)\n")
+        self.assertEqual(sorted(line[:14] for line in mixed.err.splitlines()),
+                         ["otrp-tsm: d%d: " % i for i in (2, 3, 5)])
+        told = {row["device"]: row for row in json.loads(
+            self.tsm(f"manage --on d* --json {create}", 2).out)}
+        self.assertEqual(told["d2"]["answer"]["reason"]["code"], "0xdead0002")
+        self.assertEqual((told["d5"]["exit"], "answer" in told["d5"]), (2, False))
+        self.tsm(f"manage --on d1 {create}", 1, "the device refused create-sd")  # told in full
+        self.assertEqual(self.tsm("show --summary").out, b"5 devices\n     4  sp/sd  (d1, d2, d3, "
+                         b"d4)\n     1  no security domains  (d5)\n")
+        self.assertTrue(self.tsm("show --on d4").out.startswith(b"d4  device "))
+        for line in ("manage --on x* get-device-state", "manage --on d1 --state d get-device-state",
+                     "manage --on all --image-out x get-device-state", "show --on d1 --on dd",
+                     "request --on d* get-device-state", "manage --on all -j 0 get-device-state",
+                     "device add d9 --list list", "device rm d9"):
+            self.assertEqual(self.tsm(line, 2).out, b"", line)
+        for line in ("d9", "d9 --state", "d9 --what x", "a/b --state x", "d9 --state x --url y"):
+            self.write("list", "d8 --state more/8\n" + line)
+            self.tsm("device add --list list", 2, "list, line 2: ")
+        self.assertFalse(os.path.exists(self.path("more/8")))
+
+    def test_a_thousand_devices_are_shown_on_a_screen(self):
+        device, state = json.loads(self.read("device.json")), self.read(self.kept("dsi.json"))
+        entries = {}
+        for i in range(1000):
+            folder = f"tsm/devices/{i:016x}"
+            os.mkdir(self.path(folder))
+            self.write(f"{folder}/device.json", json.dumps({**device, "device_id": str(i)}))
+            sd = f'{{"name":"sd{i % 40}","spid":"sp","talist":[]}}'.encode()
+            self.write(f"{folder}/dsi.json", state.replace(b'"sd":[]', b'"sd":[' + sd + b"]"))
+            entries[f"n{i}"] = {"key": f"{i:016x}", "state": f"/nowhere/{i}"}
+        self.write("tsm/inventory.json", json.dumps({"devices": entries}))
+        lines = self.tsm("show --summary").out.decode().splitlines()
+        self.assertEqual((lines[0], lines[1].split()[0], lines[-1]),
+                         ("1001 devices", "25", "and 551 in other states"))
+        self.assertTrue(len(lines) < 24 and max(map(len, lines)) < 101, lines)
+        self.assertEqual(len(self.tsm("device list").out.splitlines()), 1000)
+
+
 class Answers(Operator):
     def delete_sd(self, name):
         self.request("delete-sd --sd sd --delete-ta true", name)

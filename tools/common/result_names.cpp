@@ -156,6 +156,11 @@ std::string code_text(uint32_t code) {
   return text;
 }
 
+std::string code_name(uint32_t code) {
+  const ResultName *result = find_result(code);
+  return result == nullptr ? code_text(code) : result->name;
+}
+
 std::string advice(const ResultName &result) {
   return result.meaning + std::string(*result.hint == '\0' ? "" : "; ") + result.hint;
 }

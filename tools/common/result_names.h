@@ -32,6 +32,9 @@ const ResultName *find_result_by_text(std::string_view text);
 /// `0xdead0002`.
 std::string code_text(uint32_t code);
 
+/// Its name, or `0xdead0002` for a code without one.
+std::string code_name(uint32_t code);
+
 /// `meaning; hint`.
 std::string advice(const ResultName &result);
 

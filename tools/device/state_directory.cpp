@@ -28,7 +28,7 @@ bool has_device(const std::string &directory) {
 bool makes_device(const std::string &directory, bool must_exist) {
   if (has_device(directory)) return false;
   if (!must_exist) return true;
-  throw tools::UsageError("no device in " + directory + ": expected one, as --existing says");
+  throw tools::UsageError("there is no device in " + directory + ": expected its state directory");
 }
 
 std::string absolute(const std::string &directory) {

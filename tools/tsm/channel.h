@@ -3,6 +3,7 @@
 #ifndef TSM_CHANNEL_H
 #define TSM_CHANNEL_H
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <stdexcept>
@@ -16,7 +17,13 @@ namespace tsm {
 /// The device did not answer, or only said that it failed. One line.
 class ChannelError : public std::runtime_error {
  public:
-  using std::runtime_error::runtime_error;
+  /// `code` is the result code that the device failed with; 0: it gave none.
+  explicit ChannelError(const std::string &text, uint32_t code = 0)
+      : std::runtime_error(text), code_(code) {}
+  uint32_t code() const { return code_; }
+
+ private:
+  uint32_t code_;
 };
 
 /// Nothing came back: nobody is there, or what was sent or answered is lost.
@@ -29,6 +36,7 @@ struct ChannelAnswer {
   std::string response;        // empty when the device only says that it failed
   std::optional<Bytes> image;  // that the device hands back
   std::string failure;         // what it failed with, also beside a response; or empty
+  uint32_t code = 0;           // of that, if it has one
 };
 
 /// Functions throw ChannelError.

@@ -20,7 +20,8 @@ namespace {
 
 constexpr char kProgram[] = "otrp-tsm";
 constexpr size_t kMaxNameLen = 56;  // with its prefix it is a storage object ID of 64 bytes
-constexpr size_t kTaidLen = 32;     // what the device's register of images takes
+constexpr unsigned kMaxJobs = 256;
+constexpr size_t kTaidLen = 32;  // what the device's register of images takes
 
 std::string check_name(const std::string &name) {
   const bool has_control = std::ranges::any_of(
@@ -138,10 +139,12 @@ void add_message_options(CLI::App *command, const MessageHelp &help, Arguments *
       ->check(validator(check_plain));
 }
 
-/// A positional word, which is required, or an option, whose name begins with a hyphen.
+/// A positional word, which is required unless it stands in brackets, or an option, whose name
+/// begins with a hyphen.
 struct Parameter {
   const char *names;
-  std::variant<std::string Arguments::*, std::vector<std::string> Arguments::*, bool Arguments::*>
+  std::variant<std::string Arguments::*, std::vector<std::string> Arguments::*, bool Arguments::*,
+               unsigned Arguments::*>
       value;
   const char *help;
   bool is_required = false;
@@ -159,7 +162,19 @@ struct Command {
 
 const Parameter kDevice = {"--device", &Arguments::device_file,
                            "Device file: what `otrp-device info` prints"};
-const Parameter kOneDevice = {kDevice.names, kDevice.value, kDevice.help, true};
+const Parameter kOn = {
+    "--on", &Arguments::on,
+    "Device of the inventory: a name, a pattern such as 'd*', or all; repeatable"};
+const Parameter kJobs = {"-j,--jobs", &Arguments::num_jobs,
+                         "How many devices at once (default: 1)"};
+const Parameter kState = {"--state", &Arguments::state_dir,
+                          "State directory of a device on this machine (default: $OTRP_STATE)"};
+const Parameter kUrl = {"--url", &Arguments::url,
+                        "Where a device is served: http://... or https://..."};
+const Parameter kCaFile = {"--ca-file", &Arguments::tls_ca_file,
+                           "PEM file of the only CAs to trust for https (default: the system's)"};
+const Parameter kExisting = {"--existing", &Arguments::must_exist,
+                             "Make no device where there is none"};
 const Parameter kDsi = {"--dsi", &Arguments::dsi_file,
                         "Device state document (default: the one kept in the home)"};
 const Parameter kDsiOut = {"--dsi-out", &Arguments::dsi_out_file,
@@ -180,6 +195,32 @@ const Command kImageCommands[] = {
      "image show app.img"},
 };
 
+const Command kDeviceCommands[] = {
+    {"add",
+     run_device_add,
+     "Give devices names, by which --on calls them",
+     {{"[NAME]", &Arguments::names, "Name of the device"},
+      kState,
+      kUrl,
+      {kDevice.names, kDevice.value,
+       "Device file: what `otrp-device info` prints; alone, or for the device at --url"},
+      kCaFile,
+      kExisting,
+      {"--list", &Arguments::list_file, "File with a line for each device: NAME --state DIR, ..."},
+      kJobs},
+     "device add kitchen --url https://10.0.0.7 --device kitchen.json"},
+    {"list",
+     run_device_list,
+     "Show names, TEE keys, and how devices are reached",
+     {{"[NAME]", &Arguments::names, "Names and patterns (default: all)"}, kJson},
+     "device list"},
+    {"rm",
+     run_device_remove,
+     "Forget devices: their names, keys and kept states",
+     {{"NAME", &Arguments::names, "Names and patterns"}},
+     "device rm kitchen"},
+};
+
 const Command kCommands[] = {
     {"init",
      run_init,
@@ -191,7 +232,10 @@ const Command kCommands[] = {
     {"request",
      run_request,
      "Write a signed request",
-     {kOneDevice, kDsi, {"-o,--output", &Arguments::output_file, "Where to write it (default: -)"}},
+     {kDevice,
+      kOn,
+      kDsi,
+      {"-o,--output", &Arguments::output_file, "Where to write it (default: -)"}},
      "request get-device-state --device device.json > request.json",
      {},
      "request --device device.json "},
@@ -199,7 +243,8 @@ const Command kCommands[] = {
      run_response,
      "Verify, decrypt and show a response, and keep the device state",
      {{"RESPONSE", &Arguments::response_file, "The device's response"},
-      kOneDevice,
+      kDevice,
+      kOn,
       {"--request", &Arguments::request_file,
        "The request that it answers (default: one of those that wait for an answer)"},
       {"--accept-old", &Arguments::accept_old,
@@ -208,18 +253,19 @@ const Command kCommands[] = {
       kDsiOut,
       kJson},
      "response response.json --device device.json --dsi-out dsi.json"},
+    {"device", nullptr, "Keep an inventory of devices", {}, "device list", kDeviceCommands},
     {"image", nullptr, "Pack and show TA images", {}, "image show app.img", kImageCommands},
     {"manage",
      run_manage,
      "Request, send and read the response",
-     {{"--state", &Arguments::state_dir,
-       "State directory of a device on this machine (default: $OTRP_STATE)"},
-      {"--url", &Arguments::url, "Where a device is served: http://... or https://..."},
+     {kOn,
+      kState,
+      kUrl,
       {kDevice.names, kDevice.value,
        "Device file that says who the device is (default: what this TSM knows of it)"},
-      {"--ca-file", &Arguments::tls_ca_file,
-       "PEM file of the only CAs to trust for https (default: the system's)"},
-      {"--existing", &Arguments::must_exist, "Make no device where there is none"},
+      kCaFile,
+      kExisting,
+      kJobs,
       {"--trace", &Arguments::trace,
        "Show all that the agent logs (else what it logs of a failure)"},
       kDsiOut,
@@ -232,7 +278,11 @@ const Command kCommands[] = {
     {"show",
      run_show,
      "Show the last known state of devices as a tree",
-     {kDevice, {"--dsi", &Arguments::dsi_file, "Show this device state document"}, kJson},
+     {kDevice,
+      kOn,
+      {"--dsi", &Arguments::dsi_file, "Show this device state document"},
+      {"--summary", &Arguments::summary, "Count the devices that hold the same"},
+      kJson},
      "show --device device.json"},
     {"inspect",
      run_inspect,
@@ -241,6 +291,7 @@ const Command kCommands[] = {
       {"--key", &Arguments::key_files,
        "PEM file of a key; tsm=, ca=, tee= or aik= before it says whose"},
       kDevice,
+      kOn,
       {"--dsi", &Arguments::dsi_file, "Device state document that requests were made for"},
       kJson},
      "inspect request.json --device device.json"},
@@ -261,19 +312,29 @@ CLI::App *add_command(CLI::App *parent, const std::string &name, const std::stri
   return command;
 }
 
-CLI::Option *add_value(CLI::App *app, const char *names, bool &value) {
+CLI::Option *add_value(CLI::App *app, const std::string &names, bool &value) {
   return app->add_flag(names, value);
 }
-template <class Value>
-CLI::Option *add_value(CLI::App *app, const char *names, Value &value) {
+CLI::Option *add_value(CLI::App *app, const std::string &names, unsigned &value) {
+  return app->add_option(names, value)->check(CLI::Range(1u, kMaxJobs));
+}
+CLI::Option *add_value(CLI::App *app, const std::string &names, std::string &value) {
   return app->add_option(names, value);
+}
+/// An option takes one value each time, so that what follows it is not taken for another.
+CLI::Option *add_value(CLI::App *app, const std::string &names, std::vector<std::string> &values) {
+  CLI::Option *option = app->add_option(names, values);
+  return names.starts_with('-') ? option->allow_extra_args(false) : option;
 }
 
 void add_parameter(CLI::App *app, const Parameter &parameter, Arguments *arguments) {
-  const auto add = [&](auto value) { return add_value(app, parameter.names, arguments->*value); };
+  std::string names = parameter.names;
+  const bool may_be_left_out = names.starts_with('[') || names.starts_with('-');
+  if (names.starts_with('[')) names = names.substr(1, names.size() - 2);
+  const auto add = [&](auto value) { return add_value(app, names, arguments->*value); };
   CLI::Option *option = std::visit(add, parameter.value);
   option->description(parameter.help);
-  option->required(parameter.is_required || *parameter.names != '-');
+  option->required(parameter.is_required || !may_be_left_out);
 }
 
 void add_messages(CLI::App *parent, const std::string &example_start, Arguments *arguments) {

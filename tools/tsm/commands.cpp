@@ -52,7 +52,7 @@ int run_request(const Arguments &arguments) {
   const Order order = read_order(arguments);
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
-  DeviceRecord record = home.open_record(read_device_file(arguments.device_file));
+  DeviceRecord record = home.open_record(named_device(arguments, home));
   const std::optional<Json> dsi = state_for(arguments.message, record, arguments.dsi_file);
   tools::OutputFile output(arguments.output_file);
   output.write(make_kept_request(order, tsm, dsi, &record).text);
@@ -68,7 +68,7 @@ int run_response(const Arguments &arguments) {
     policy.named = read_request(tools::read_file(arguments.request_file), tsm.key);
   }
 
-  DeviceRecord record = home.open_record(read_device_file(arguments.device_file));
+  DeviceRecord record = home.open_record(named_device(arguments, home));
   const std::optional<Json> dsi = state_for(
       parse_envelope(text).message->id == MessageId::kGetTaInfo ? MessageId::kGetTaInfo
                                                                 : MessageId::kGetDeviceState,
@@ -103,36 +103,6 @@ int run_image_show(const Arguments &arguments) {
           std::to_string(parsed->payload.size()) + " bytes, " +
           (parsed->digest_matches ? "digest matches" : "digest does not match") + "\n");
   }
-  return 0;
-}
-
-int run_show(const Arguments &arguments) {
-  if (!arguments.dsi_file.empty()) {
-    const Json dsi = parse_dsi(tools::read_file(arguments.dsi_file));
-    print(arguments.json ? dsi.dump(2) + "\n" : device_lines(nullptr, &dsi));
-    return 0;
-  }
-  const Home home(arguments.home);
-  std::vector<KnownDevice> devices = home.known_devices();
-  if (!arguments.device_file.empty()) {
-    const DeviceInfo device = read_device_file(arguments.device_file);
-    devices = {{device, home.folder_of(device)}};
-  }
-  if (devices.empty() && !arguments.json) {
-    print("no devices known in " + arguments.home + ": run get-device-state\n");
-  }
-
-  Json list = Json::array();
-  for (const KnownDevice &known : devices) {
-    const std::optional<Json> dsi = read_dsi(known.folder);
-    const Json *document = dsi ? &*dsi : nullptr;
-    if (arguments.json) {
-      list.push_back(device_json(known.device, document));
-    } else {
-      print(device_lines(&known.device, document));
-    }
-  }
-  if (arguments.json) print_json(list);
   return 0;
 }
 

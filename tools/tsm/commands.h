@@ -38,7 +38,12 @@ struct Arguments {
   std::vector<std::string> input_files;  // to inspect
   std::vector<std::string> key_files;
   bool json = false;
-  bool trace = false;  // show all that the device logs
+  bool trace = false;           // show all that the device logs
+  bool summary = false;         // instead of each device
+  std::vector<std::string> on;  // names of the inventory, and patterns
+  std::vector<std::string> names;
+  std::string list_file;
+  unsigned num_jobs = 1;  // at once
   MessageId message = MessageId::kGetDeviceState;
   RequestOptions request;
 };
@@ -50,6 +55,9 @@ int run_image_pack(const Arguments &arguments);
 int run_image_show(const Arguments &arguments);
 int run_manage(const Arguments &arguments);
 int run_show(const Arguments &arguments);
+int run_device_add(const Arguments &arguments);
+int run_device_list(const Arguments &arguments);
+int run_device_remove(const Arguments &arguments);
 
 }  // namespace tsm
 

@@ -41,6 +41,9 @@ class DeviceRecord {
   const DeviceInfo &device() const { return device_; }
   std::optional<Json> dsi() const { return read_dsi(folder_); }
 
+  /// Writes the device file: the device is known from then on.
+  void keep_device() const;
+
   /// Keeps what is about to be sent, until it is answered.
   void add(SentRequest request);
 
@@ -57,7 +60,6 @@ class DeviceRecord {
   std::string path(const char *name) const { return folder_ + "/" + name; }
   Requests load() const;
   void save(const Requests &requests) const;
-  void keep_device() const;
   Answered find(const Response &response, const Requests &requests,
                 const std::optional<SentRequest> &named) const;
   bool is_older(const Response &response, const SentRequest &request, uint64_t kept) const;

@@ -134,6 +134,22 @@ std::string dsi_tree(const Json &document) {
   return tree.empty() ? "`-- no service providers\n" : tree;
 }
 
+std::string dsi_line(const Json &document) {
+  std::vector<std::string> domains;
+  for (const Json &sd : security_domains(document)) {
+    std::string domain = printable(text_of(sd, "spid") + "/" + text_of(sd, "name"));
+    std::vector<std::string> tas;
+    for (const Json &ta : list_of(&sd, "talist")) tas.push_back(printable(text_of(ta, "taid")));
+    std::ranges::sort(tas);
+    for (const std::string &ta : tas) domain += (&ta == &tas.front() ? ": " : ", ") + ta;
+    domains.push_back(domain);
+  }
+  std::ranges::sort(domains);
+  std::string line;
+  for (const std::string &domain : domains) line += (line.empty() ? "" : "; ") + domain;
+  return line.empty() ? "no security domains" : line;
+}
+
 std::string printable(std::string_view text) {
   std::string shown;
   for (const char c : text) {

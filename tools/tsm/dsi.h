@@ -43,6 +43,9 @@ std::optional<RsaKey> find_aik(const Json &document, std::string_view spid);
 /// The document as a tree of lines: SPs, their AIK fingerprints, security domains, TAs.
 std::string dsi_tree(const Json &document);
 
+/// What the device holds, in one line: `bank/wallet: TA, TA; bank/cards`.
+std::string dsi_line(const Json &document);
+
 /// `text` fit for a terminal: control characters shown as `\xNN`.
 std::string printable(std::string_view text);
 

@@ -61,7 +61,7 @@ Exchange ask(const Order &order, const MadeRequest &request, const ResponseKeys 
              Outputs *outputs, Channel *channel, DeviceRecord *record) {
   const ChannelAnswer answer =
       channel->send(message_of(order.message), request.text, outputs->image.has_value());
-  if (answer.response.empty()) throw ChannelError(answer.failure);
+  if (answer.response.empty()) throw ChannelError(answer.failure, answer.code);
   Exchange done = {.response = open_response(answer.response, keys),
                    .tie = Tie::kUnchecked,
                    .failure = answer.failure,

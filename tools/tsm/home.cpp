@@ -15,6 +15,7 @@ using tools::UsageError;
 constexpr std::string_view kIdentityFile = "tsm.json";
 constexpr std::string_view kKeyFile = "tsm-key.pem";
 constexpr std::string_view kCaFile = "ca-tsm.pem";
+constexpr std::string_view kInventoryFile = "inventory.json";
 constexpr size_t kCaModulusLen = 256;
 constexpr size_t kMaxTsmidLen = 55;  // with its prefix it is a storage object ID of 64 bytes
 
@@ -117,6 +118,25 @@ Identity Home::load_identity() const {
 
 std::string Home::folder_of(const DeviceInfo &device) const {
   return path("devices/" + device.tee_key.fingerprint());
+}
+
+Inventory Home::inventory() const {
+  require_identity();
+  return Inventory(path(kInventoryFile));
+}
+
+void Home::change_inventory(const std::function<void(Inventory *)> &change) const {
+  require_identity();
+  tsm::change_inventory(path(kInventoryFile), change);
+}
+
+void Home::forget(const DeviceInfo &device) const {
+  const std::string folder = folder_of(device);
+  if (!tools::file_exists(folder)) return;
+  const tools::FileLock lock(folder + "/lock");  // whoever talks to it comes to an end before
+  std::error_code failure;
+  fs::remove_all(folder, failure);
+  if (failure) throw UsageError("cannot remove " + folder + ": " + failure.message());
 }
 
 std::optional<DeviceInfo> Home::find_device(const std::string &fingerprint) const {

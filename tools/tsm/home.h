@@ -4,6 +4,7 @@
 ///     tsm.json           tsmid and the key chain that admits this TSM's key
 ///     tsm-key.pem        its private key
 ///     ca-tsm.pem         the CA-TSM private key it was made with; needed only for TA images
+///     inventory.json     the names of devices: see inventory.h
 ///     devices/KEY/       one per device, named by its key's fingerprint: see device_record.h
 ///     lock               held while an identity is made
 ///
@@ -12,12 +13,14 @@
 #ifndef TSM_HOME_H
 #define TSM_HOME_H
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "tsm/device_record.h"
+#include "tsm/inventory.h"
 #include "tsm/parties.h"
 
 namespace tsm {
@@ -42,10 +45,16 @@ class Home {
   }
   std::string folder_of(const DeviceInfo &device) const;
 
-  /// The device whose key has this fingerprint, if something was ever sent to it.
+  Inventory inventory() const;
+  void change_inventory(const std::function<void(Inventory *)> &change) const;
+
+  /// Removes all that is kept of a device.
+  void forget(const DeviceInfo &device) const;
+
+  /// The device whose key has this fingerprint, if it has a record.
   std::optional<DeviceInfo> find_device(const std::string &fingerprint) const;
 
-  /// Those that have been sent something, by their IDs.
+  /// Those with a record, by their IDs.
   std::vector<KnownDevice> known_devices() const;
 
  private:

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: BSD-2-Clause
+#include <cstdlib>
 #include <utility>
 
 #include "common/error_line.h"
@@ -31,14 +32,21 @@ std::string base_of(std::string url) {
 }
 
 /// A device's failure says itself what failed; anything else is told with the address.
-std::string failure_of(const http::Reply &reply) {
+ChannelAnswer failure_of(const http::Reply &reply) {
   const std::optional<Json> body = parse_json(reply.body);
   const std::string *message = body ? find_string(*body, "message") : nullptr;
+  const std::string *code = body ? find_string(*body, "code") : nullptr;
   const std::string text = message == nullptr ? "" : message->substr(0, kMaxShownLen);
-  if (message != nullptr && find_string(*body, "code") != nullptr) return text;
-  return reply.url + ": " + std::to_string(reply.status) + " " +
-         std::string(http::reason_of(reply.status)) + ": " +
-         (text.empty() ? "expected the service of a device, as `otrp-device serve` is" : text);
+  if (message != nullptr && code != nullptr) {
+    const auto number = static_cast<uint32_t>(std::strtoul(code->c_str(), nullptr, 0));
+    return {.response = "", .image = {}, .failure = text, .code = number};
+  }
+  const std::string expected = "expected the service of a device, as `otrp-device serve` is";
+  return {.response = "",
+          .image = {},
+          .failure = reply.url + ": " + std::to_string(reply.status) + " " +
+                     std::string(http::reason_of(reply.status)) + ": " +
+                     (text.empty() ? expected : text)};
 }
 
 class HttpChannel : public Channel {
@@ -60,7 +68,7 @@ class HttpChannel : public Channel {
                                     .url = base_ + "/otrp",
                                     .headers = {{"Content-Type", kOtrpJson}, {"Accept", kOtrpJson}},
                                     .body = request});
-    if (reply.status != kOk) return {.response = "", .image = {}, .failure = failure_of(reply)};
+    if (reply.status != kOk) return failure_of(reply);
     if (reply.body.empty()) throw NoAnswer(reply.url + ": an answer without a response");
     ChannelAnswer answer = {.response = reply.body, .image = {}, .failure = ""};
     const std::string *path = http::find_header(reply.headers, kImageHeader);
@@ -72,7 +80,7 @@ class HttpChannel : public Channel {
  private:
   std::string get(const std::string &path) {
     http::Reply reply = call({.method = "GET", .url = base_ + path});
-    if (reply.status != kOk) throw ChannelError(failure_of(reply));
+    if (reply.status != kOk) throw ChannelError(failure_of(reply).failure);
     return std::move(reply.body);
   }
 

@@ -10,6 +10,7 @@
 #include "tsm/dsi.h"
 #include "tsm/home.h"
 #include "tsm/inspect_input.h"
+#include "tsm/target.h"
 
 namespace tsm {
 namespace {
@@ -100,16 +101,16 @@ void add_home(const Home &home, bool has_device, AtHand *at_hand) {
 AtHand read_at_hand(const Arguments &arguments) {
   AtHand at_hand;
   for (const std::string &file : arguments.key_files) add_key_file(file, &at_hand);
-  const bool has_device = !arguments.device_file.empty();
   const Home home(arguments.home);
+  const std::optional<DeviceInfo> named = find_named_device(arguments, home);
   const bool has_home = std::filesystem::exists(arguments.home + "/tsm.json");
-  if (has_device) {
-    const DeviceInfo device = parse_device_info(tools::read_file(arguments.device_file));
-    add_device(device, arguments.device_file, true, &at_hand);
+  if (named) {
+    const std::string name = arguments.on.empty() ? arguments.device_file : arguments.on.front();
+    add_device(*named, name, true, &at_hand);
     const std::optional<std::string> known =
-        has_home ? read_dsi_text(home.folder_of(device)) : std::nullopt;
+        has_home ? read_dsi_text(home.folder_of(*named)) : std::nullopt;
     if (known && arguments.dsi_file.empty()) {
-      at_hand.states.push_back({"the state of " + arguments.device_file + " in the home", *known});
+      at_hand.states.push_back({"the state of " + name + " in the home", *known});
     }
   }
   if (!arguments.dsi_file.empty()) {
@@ -117,7 +118,7 @@ AtHand read_at_hand(const Arguments &arguments) {
     (void)parse_dsi(text);  // throws when it is none
     at_hand.states.push_back({arguments.dsi_file, text});
   }
-  if (has_home) add_home(home, has_device, &at_hand);
+  if (has_home) add_home(home, named.has_value(), &at_hand);
   return at_hand;
 }
 

@@ -26,7 +26,7 @@ class LocalChannel : public Channel {
       device::Session agent(device_, device::kAgentUuid);
       device::Answer answer = device::send(agent, known, request);
       return ChannelAnswer{std::move(answer.response), std::move(answer.image),
-                           failure_of(known, answer)};
+                           failure_of(known, answer), answer.status};
     });
   }
 
@@ -43,7 +43,7 @@ class LocalChannel : public Channel {
       return result;
     } catch (const device::Error &error) {
       log_ += log.take();
-      throw ChannelError(error.what());
+      throw ChannelError(error.what(), error.code());
     }
   }
 

@@ -4,6 +4,7 @@
 #include <cstdio>
 
 #include "common/files.h"
+#include "common/result_names.h"
 #include "tsm/report.h"
 
 namespace tsm {
@@ -22,22 +23,29 @@ Outcome outcome_of(const Arguments &arguments, const Exchange &done) {
   for (const std::string &failure : {refusal, done.failure}) {
     if (!failure.empty()) outcome.errors.push_back(failure);
   }
-  outcome.exit_code = outcome.errors.empty() ? 0 : tools::kExitRefused;
+  if (outcome.errors.empty()) return outcome;
+  outcome.exit_code = tools::kExitRefused;
+  outcome.kind = refusal.empty() ? "incomplete" : "refused";
+  if (done.response.error_code) outcome.reason = tools::code_name(*done.response.error_code);
   return outcome;
 }
 
 Outcome outcome_of(const std::function<Outcome()> &step) {
-  const auto failed = [](int exit_code, const std::exception &error) {
-    return Outcome{.exit_code = exit_code, .errors = {error.what()}};
+  const auto failed = [](int exit_code, const char *kind, const std::exception &error) {
+    return Outcome{.exit_code = exit_code, .errors = {error.what()}, .kind = kind};
   };
   try {
     return step();
   } catch (const NotVerified &error) {
-    return failed(kExitNotVerified, error);
+    return failed(kExitNotVerified, "not verified", error);
+  } catch (const NoAnswer &error) {
+    return failed(tools::kExitRefused, "without an answer", error);
   } catch (const ChannelError &error) {
-    return failed(tools::kExitRefused, error);
+    Outcome outcome = failed(tools::kExitRefused, "refused", error);
+    if (error.code() != 0) outcome.reason = tools::code_name(error.code());
+    return outcome;
   } catch (const std::exception &error) {
-    return failed(tools::kExitUsage, error);
+    return failed(tools::kExitUsage, "not asked", error);
   }
 }
 

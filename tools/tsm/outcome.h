@@ -17,6 +17,8 @@ struct Outcome {
   std::string report = {};               // for standard output; JSON where that was asked for
   std::vector<std::string> errors = {};  // a line of standard error each
   std::string log = {};                  // what the device logged
+  std::string kind = {};                 // of failure, in a word or two: "refused"
+  std::string reason = {};               // name of a result code, where there is one
 };
 
 /// Of an answer that is verified and kept.
