@@ -8,11 +8,12 @@ set(otrp_cmake_dir ${CMAKE_INSTALL_LIBDIR}/cmake/otrp-tee)
 # Programs find the library beside them, wherever the whole was moved to; images are loaded by it. A
 # path of the build's own would end in an empty element, which is the current directory.
 file(RELATIVE_PATH bin_to_lib /bin /${CMAKE_INSTALL_LIBDIR})
-set_target_properties(otrp-device otrp-tsm PROPERTIES INSTALL_RPATH "$ORIGIN/${bin_to_lib}")
-set_target_properties(otrp-device otrp-tsm tee otrp_agent_image corvel_image PROPERTIES
+set(otrp_programs otrp-device otrp-fleet otrp-tsm)
+set_target_properties(${otrp_programs} PROPERTIES INSTALL_RPATH "$ORIGIN/${bin_to_lib}")
+set_target_properties(${otrp_programs} tee otrp_agent_image corvel_image PROPERTIES
   BUILD_WITH_INSTALL_RPATH ON)
 
-install(TARGETS otrp-device otrp-tsm RUNTIME)
+install(TARGETS ${otrp_programs} RUNTIME)
 install(TARGETS tee EXPORT otrp-tee LIBRARY)
 install(TARGETS otrp_agent_image corvel_image LIBRARY DESTINATION ${otrp_ta_dir})
 install(FILES tee/include/tee_client_api.h tee/include/tee_inspect.h
@@ -20,11 +21,11 @@ install(FILES tee/include/tee_client_api.h tee/include/tee_inspect.h
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/otrp)
 install(FILES keys/dev-ca-tsm.pem DESTINATION ${otrp_data_dir})
 
-install(FILES docs/man/otrp-device.1 docs/man/otrp-tsm.1
+install(FILES docs/man/otrp-device.1 docs/man/otrp-fleet.1 docs/man/otrp-tsm.1
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
 install(FILES docs/man/otrp-tee.3 DESTINATION ${CMAKE_INSTALL_MANDIR}/man3)
 install(FILES docs/man/otrp.7 DESTINATION ${CMAKE_INSTALL_MANDIR}/man7)
-foreach(program otrp-device otrp-tsm)
+foreach(program ${otrp_programs})
   install(FILES tools/completion/otrp.bash
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME ${program})
 endforeach()

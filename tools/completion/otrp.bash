@@ -1,5 +1,5 @@
 # SPDX-License-Identifier: BSD-2-Clause
-# Bash completion for otrp-device and otrp-tsm: what --help of the command at hand lists. -*- sh -*-
+# Bash completion for the programs: what --help of the command at hand lists. -*- sh -*-
 
 _otrp() {
   local program=${COMP_WORDS[0]} current=${COMP_WORDS[COMP_CWORD]} word
@@ -56,4 +56,4 @@ _otrp_words() {
     }' | tr " " "\n"
 }
 
-complete -o default -F _otrp otrp-device otrp-tsm
+complete -o default -F _otrp otrp-device otrp-fleet otrp-tsm

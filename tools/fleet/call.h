@@ -1,0 +1,29 @@
+// SPDX-License-Identifier: BSD-2-Clause
+/// One device calls its TSM.
+#ifndef FLEET_CALL_H
+#define FLEET_CALL_H
+
+#include <string>
+
+#include "device/broker/broker.h"
+#include "fleet/faults.h"
+#include "fleet/figures.h"
+#include "fleet/fleet.h"
+
+namespace fleet {
+
+struct CallOptions {
+  std::string tsm;  // URL, which the device's ID is added to
+  std::string ca_file;
+  broker::Policy policy;
+  Faults faults;
+};
+
+/// What happened is added to `figures`. Each call has a connection of its own. TA images are
+/// dropped.
+broker::Outcome call_tsm(const Member &member, const CallOptions &options, const broker::Stop &stop,
+                         Random &random, Figures &figures);
+
+}  // namespace fleet
+
+#endif
