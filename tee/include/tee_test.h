@@ -12,6 +12,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace tee::test {
@@ -77,6 +78,10 @@ class Device {
 
   /// After kPowerCut fired: gives back what storage really holds and lets writes happen again.
   void restore_power();
+
+  /// Shows `look` each block of heap that a trusted application gives back, with the bytes that are
+  /// in it then.
+  void watch_freed(std::function<void(std::string_view bytes)> look);
 
   /// Makes a creation without data durable in its own call, as many TEEs do. Otherwise it waits for
   /// the first write or the close of its handle.

@@ -31,25 +31,32 @@ void *Heap::allocate(uint32_t len) {
   if (2 * (size_t{live_} + 1) > num_slots_ && !grow()) return nullptr;
   void *block = std::calloc(1, len);
   if (block == nullptr) return nullptr;
-  insert({block, static_cast<uint32_t>(charge)});
+  insert({block, len});
   in_use_ += static_cast<uint32_t>(charge);
   peak_ = std::max(peak_, in_use_);
   peak_live_ = std::max(peak_live_, ++live_);
   return block;
 }
 
-bool Heap::release(void *block) {
-  if (live_ == 0) return false;
-  size_t slot = home(block);
-  while (slots_[slot].block != block) {
-    if (slots_[slot].block == nullptr) return false;
-    slot = next(slot);
-  }
-  in_use_ -= slots_[slot].charge;
+const uint32_t *Heap::length_of(const void *block) const {
+  if (live_ == 0) return nullptr;
+  const Slot &slot = slots_[find(block)];
+  return slot.block == block ? &slot.len : nullptr;
+}
+
+void Heap::release(void *block) {
+  const size_t slot = find(block);
+  in_use_ -= static_cast<uint32_t>(charge_of(slots_[slot].len));
   --live_;
   erase(slot);
   std::free(block);
-  return true;
+}
+
+// The slot of the block, or a free one.
+size_t Heap::find(const void *block) const {
+  size_t slot = home(block);
+  while (slots_[slot].block != block && slots_[slot].block != nullptr) slot = next(slot);
+  return slot;
 }
 
 // Neighbours in memory are neighbours in the table: allocations that follow each other share its
@@ -106,7 +113,9 @@ void *TEE_Malloc(TEE_LengthType size, uint32_t) {
 
 void TEE_Free(void *buffer) {
   if (buffer == nullptr) return;
-  if (!current_instance().heap.release(buffer)) {
-    panic("TEE_Free", "not a live block of this instance");
-  }
+  Heap &heap = current_instance().heap;
+  const uint32_t *len = heap.length_of(buffer);
+  if (len == nullptr) panic("TEE_Free", "not a live block of this instance");
+  show_freed({static_cast<const char *>(buffer), *len});
+  heap.release(buffer);
 }

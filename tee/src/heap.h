@@ -25,8 +25,11 @@ class Heap {
   /// Zero-filled; NULL when the heap is full.
   void *allocate(uint32_t len);
 
-  /// False when `block` is no live block of this heap.
-  bool release(void *block);
+  /// NULL unless `block` is a live block of this heap, otherwise its length.
+  const uint32_t *length_of(const void *block) const;
+
+  /// Gives a live block back.
+  void release(void *block);
 
   uint32_t size() const { return size_; }
   uint32_t in_use() const { return in_use_; }
@@ -37,10 +40,11 @@ class Heap {
  private:
   struct Slot {
     void *block;  // NULL: free
-    uint32_t charge;
+    uint32_t len;
   };
 
   size_t home(const void *block) const;
+  size_t find(const void *block) const;
   size_t next(size_t slot) const { return (slot + 1) & (num_slots_ - 1); }
   bool grow();
   void insert(Slot entry);

@@ -7,10 +7,12 @@
 #ifndef TEE_HOST_DEVICE_H
 #define TEE_HOST_DEVICE_H
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <string>
+#include <string_view>
 
 #include "faults.h"
 #include "persistent.h"
@@ -44,6 +46,7 @@ class HostDevice {
   FaultPlans faults;
   std::unique_ptr<Storage> storage;
   OpenObjects open_objects;
+  std::function<void(std::string_view)> watch_freed;  // for tests; empty: nobody does
   bool creates_at_once = false;  // a creation without data is stored like one with data
 
  private:

@@ -6,6 +6,7 @@
 #include <tee_internal_api.h>
 
 #include <algorithm>
+#include <string_view>
 #include <vector>
 
 #include "tee_test.h"
@@ -52,6 +53,9 @@ OpenHandles &open_handles(Instance &instance);
 /// True when a test asked that this call, one of kind `fault`, fail; `*code` is then the result
 /// to return. `natural` is the result when the test named none.
 bool fault_due(Fault fault, const char *call, TEE_Result natural, TEE_Result *code);
+
+/// Shows a block of heap that is given back to the test that watches, if one does.
+void show_freed(std::string_view bytes);
 
 /// True when a test asked that this instance never have so many bytes of its heap in use.
 bool heap_limit_reached(uint64_t in_use);

@@ -112,6 +112,11 @@ bool fault_due(Fault fault, const char *call, TEE_Result natural, TEE_Result *co
   return instance.device.faults.due(instance.uuid, fault, call, natural, code);
 }
 
+void show_freed(std::string_view bytes) {
+  const HostDevice &device = current_instance().device;
+  if (device.watch_freed) device.watch_freed(bytes);
+}
+
 bool heap_limit_reached(uint64_t in_use) {
   const Instance &instance = current_instance();
   return instance.device.faults.forbids(instance.uuid, in_use);

@@ -90,6 +90,11 @@ void Device::restore_power() {
   impl_->power->restore();
 }
 
+void Device::watch_freed(std::function<void(std::string_view bytes)> look) {
+  const std::lock_guard guard(impl_->device->lock);
+  impl_->device->watch_freed = std::move(look);
+}
+
 void Device::create_at_once(bool at_once) {
   const std::lock_guard guard(impl_->device->lock);
   impl_->device->creates_at_once = at_once;

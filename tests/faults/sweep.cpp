@@ -56,11 +56,7 @@ std::string stored_aik(const AgentDevice &device, const std::string &spid) {
   const std::string box =
       tools::base64_decode(json_of(device, "SP_INFO_" + spid).value("aik", "")).value();
   if (box.empty()) return "";
-  std::map<uint32_t, std::string> values;
-  for (size_t at = 0, len = 0; at < box.size(); at += 4 + len) {
-    len = word_at(box, at) >> 16;
-    values[word_at(box, at) & 0xFFFF] = box.substr(at + 4, len);
-  }
+  auto values = box_records(box);
   return tools::base64url_encode(stored(values[0x11]) + stored(values[0x12]));
 }
 

@@ -21,6 +21,15 @@ std::string box_record(uint16_t type, const std::string &value) {
   return tools::little_endian(type, 2) + tools::little_endian(value.size(), 2) + value;
 }
 
+std::map<uint32_t, std::string> box_records(const std::string &box) {
+  std::map<uint32_t, std::string> values;
+  for (size_t at = 0, len = 0; at < box.size(); at += 4 + len) {
+    len = word_at(box, at) >> 16;
+    values[word_at(box, at) & 0xFFFF] = box.substr(at + 4, len);
+  }
+  return values;
+}
+
 FindsImages::FindsImages() {
   tee::test::set_ta_directory(OTRP_TEST_TA_DIR);
 }

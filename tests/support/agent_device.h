@@ -25,6 +25,9 @@ std::optional<std::string> payload_of(const std::string &raw);
 /// A record of the boxes that keys are kept in.
 std::string box_record(uint16_t type, const std::string &value);
 
+/// The records of a box, values by type.
+std::map<uint32_t, std::string> box_records(const std::string &box);
+
 /// The TA images are those of this build.
 struct FindsImages {
   FindsImages();

@@ -1,13 +1,16 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // Signatures and encrypted contents against vectors of the standards, and what the agent refuses.
+#include "crypto/corvel_client.h"
 #include "crypto/rsa.h"
 #include "crypto/symmetric.h"
 #include "otrp_result.h"
 #include "security/jwe.h"
 #include "security/jws.h"
 #include "security/tsm_trust.h"
+#include "support/agent_device.h"
 #include "support/inside_agent.h"
 #include "support/published_vectors.h"
+#include "tsm/crypto.h"
 
 namespace otrp_test {
 namespace {
@@ -131,6 +134,22 @@ TEST_F(Security, ContentsOpenUnchangedOrNotAtAll) {
     }
   }
   EXPECT_EQ(encrypt_json(key.get(), secret.get(), "{}"), nullptr);
+}
+
+TEST_F(Security, ResponsesNameTheEndorsementKeyInModeTwoAlone) {
+  const FindsImages images;  // of the key service
+  std::string id(32, 0);
+  uint32_t id_len = 32;
+  ASSERT_EQ(corvel_get_device_id(id.data(), &id_len), TEE_SUCCESS);
+  const std::string ek_id = tools::hex_encode(tsm::sha256(id + "SP_EK_ID" + '\0'));
+  const std::string plain = R"({"header":{"deviceId":"test_device_id")";
+  for (const auto &[mode, expected] :
+       {std::pair(1u, plain + "}}"), std::pair(2u, plain + R"(,"spekid":")" + ek_id + "\"}}")}) {
+    const json_ptr envelope(json_value_init_object());
+    ASSERT_TRUE(add_signature_header(json_value_get_object(envelope.get()), mode));
+    const json_text text(json_serialize_to_string(envelope.get()));
+    EXPECT_EQ(text.get(), expected);
+  }
 }
 
 TEST_F(Security, EncodedPublicKeysMustHoldWhatTheyClaim) {
