@@ -158,31 +158,4 @@ TEST_F(Corvel, DamagedIdentityIsReportedAndLeftAlone) {
   }
 }
 
-// Whatever goes wrong at first use, the device works the next time, and what it has given out
-// stays true.
-TEST_F(Corvel, FirstUseMayFailAnywhere) {
-  reuse_generated_keys(7);
-  for (const Fault fault :
-       {Fault::kPowerCut, Fault::kAllocation, Fault::kStorage, Fault::kCrypto, Fault::kShortRead}) {
-    bool fired = true;
-    for (unsigned n = 1; fired; ++n) {
-      SCOPED_TRACE("fault " + std::to_string(static_cast<int>(fault)) + ", " + std::to_string(n));
-      CorvelDevice device;
-      device.fail(kCorvel, fault, n);
-      std::string first, next, last;
-      const bool passed = read_identity(device, &first) == TEE_SUCCESS;
-      fired = device.fault_report().fired;
-      EXPECT_TRUE(passed || fired);
-      const bool is_dead = fired && fault == Fault::kPowerCut;
-      device.clear_faults();
-      device.restore_power();
-      EXPECT_EQ(read_identity(device, &next), TEE_SUCCESS);
-      EXPECT_EQ(read_identity(device, &last), TEE_SUCCESS);
-      EXPECT_EQ(next, last);
-      EXPECT_TRUE(!passed || is_dead || first == last);
-    }
-  }
-  reuse_generated_keys(0);
-}
-
 }  // namespace
