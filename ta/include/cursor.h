@@ -48,9 +48,9 @@ struct reader {
 
 /// What is left to write to. The bytes stay their owner's.
 struct writer {
-  uint8_t *at;    // the next byte
-  uint32_t left;  // bytes
-  bool ok = true;
+  uint8_t *at;     // the next byte
+  uint32_t left;   // bytes
+  bool ok = true;  // nothing was left out so far
 };
 
 /// The bytes as they are.

@@ -20,17 +20,25 @@ inline uint8_t *allocate_bytes(uint32_t len) {
 template <class Handle, auto Free>
 class owned {
  public:
+  /// Owns nothing yet.
   owned() = default;
+  /// Takes over what it is given, or NULL, or what another owned, which owns nothing then.
+  /// @{
   explicit owned(Handle handle) : handle_(handle) {}
   owned(owned &&other) : handle_(other.release()) {}
   owned &operator=(owned &&other) {
     reset(other.release());
     return *this;
   }
+  /// @}
   ~owned() { reset(); }
 
+  /// What is held, which stays the owner's; NULL for nothing.
+  /// @{
   Handle get() const { return handle_; }
   Handle operator->() const { return handle_; }
+  /// @}
+  /// Whether anything is held.
   explicit operator bool() const { return handle_ != nullptr; }
 
   /// Frees what is held and holds `handle`.
