@@ -141,7 +141,7 @@ Work in_order(std::vector<Work> works) {
 
 // ---- RSA
 
-enum class Form { kPublic, kExponentsAlone, kWithPrimes };
+enum class Form { kPublic, kPair };
 
 /// The numbers of a key, in the byte order that OpenSSL imports.
 class KeyNumbers {
@@ -152,12 +152,12 @@ class KeyNumbers {
       Form first;  // the form that begins to have the number
     } numbers[] = {{OSSL_PKEY_PARAM_RSA_N, Form::kPublic},
                    {OSSL_PKEY_PARAM_RSA_E, Form::kPublic},
-                   {OSSL_PKEY_PARAM_RSA_D, Form::kExponentsAlone},
-                   {OSSL_PKEY_PARAM_RSA_FACTOR1, Form::kWithPrimes},
-                   {OSSL_PKEY_PARAM_RSA_FACTOR2, Form::kWithPrimes},
-                   {OSSL_PKEY_PARAM_RSA_EXPONENT1, Form::kWithPrimes},
-                   {OSSL_PKEY_PARAM_RSA_EXPONENT2, Form::kWithPrimes},
-                   {OSSL_PKEY_PARAM_RSA_COEFFICIENT1, Form::kWithPrimes}};
+                   {OSSL_PKEY_PARAM_RSA_D, Form::kPair},
+                   {OSSL_PKEY_PARAM_RSA_FACTOR1, Form::kPair},
+                   {OSSL_PKEY_PARAM_RSA_FACTOR2, Form::kPair},
+                   {OSSL_PKEY_PARAM_RSA_EXPONENT1, Form::kPair},
+                   {OSSL_PKEY_PARAM_RSA_EXPONENT2, Form::kPair},
+                   {OSSL_PKEY_PARAM_RSA_COEFFICIENT1, Form::kPair}};
     for (const auto &number : numbers) {
       if (number.first <= form) add(number.name);
     }
@@ -217,17 +217,17 @@ Work rsa_encrypt(Keys keys) {
   });
 }
 
-Work rsa_decrypt(Form form, Keys keys) {
+Work rsa_decrypt(Keys keys) {
   const std::string sealed =
       tsm::rsa1_5_encrypt(otrp_test::key_named("floor"), std::string(kCekLen, 'k'));
-  return rsa(form, keys, EVP_PKEY_decrypt_init, false, [=](EVP_PKEY_CTX *context) {
+  return rsa(Form::kPair, keys, EVP_PKEY_decrypt_init, false, [=](EVP_PKEY_CTX *context) {
     size_t len = kRsaLen;
     require(EVP_PKEY_decrypt(context, scratch().out.data(), &len, bytes_of(sealed), sealed.size()));
   });
 }
 
-Work rsa_sign(Form form, Keys keys) {
-  return rsa(form, keys, EVP_PKEY_sign_init, true, [](EVP_PKEY_CTX *context) {
+Work rsa_sign(Keys keys) {
+  return rsa(Form::kPair, keys, EVP_PKEY_sign_init, true, [](EVP_PKEY_CTX *context) {
     size_t len = kRsaLen;
     require(EVP_PKEY_sign(context, scratch().out.data(), &len, scratch().in.data(), kDigestLen));
   });
@@ -252,9 +252,19 @@ size_t bytes_in(size_t text_len) {
   return text_len * 3 / 4;
 }
 
+// What the CA signs of an entry of a key chain.
+size_t chain_block_len(const Json &entry) {
+  return kChainBlockLen + len_of(entry, "tsmid") + bytes_in(len_of(entry, "tsm_pub_key"));
+}
+
+// Of a JWE: its plaintext fills the last block, but for one byte at least.
+size_t plain_len(const Json &jwe) {
+  return bytes_in(len_of(jwe, "ciphertext")) - 1;
+}
+
 struct Floor {
   explicit Floor(Depth to)
-      : depth(to), keys(to == Depth::kCryptography ? Keys::kPrepared : Keys::kNew) {}
+      : depth(to), keys(to == Depth::kWithRules ? Keys::kNew : Keys::kPrepared) {}
 
   const Depth depth;
   const Keys keys;
@@ -268,7 +278,7 @@ struct Floor {
   void add_opening(const Json &jwe);
   void add_image(const Json &encrypted_ta, const char *image_name);
   void add_sealing(const Json &jwe);
-  void add_signing(const Json &envelope, Form form);
+  void add_signing(const Json &envelope);
 };
 
 void Floor::add_reading(const std::string &text) {
@@ -278,7 +288,7 @@ void Floor::add_reading(const std::string &text) {
 void Floor::add_payload(const std::string &text) {
   if (depth == Depth::kCryptography) return;
   add(move(text.size()));
-  add(reading_of(text));
+  add_reading(text);
   add(wipe_output(text.size()));
 }
 
@@ -292,7 +302,7 @@ void Floor::add_key_chain(const Json &chain) {
   for (const Json &entry : chain.at("tsm_list")) {
     add(decode(len_of(entry, "tsm_pub_key")));
     add(decode(len_of(entry, "signature")));
-    add(digest(kChainBlockLen + len_of(entry, "tsmid") + bytes_in(len_of(entry, "tsm_pub_key"))));
+    add(digest(chain_block_len(entry)));
     add(rsa_verify(keys));
   }
 }
@@ -301,7 +311,7 @@ void Floor::add_opening(const Json &jwe) {
   const size_t len = bytes_in(len_of(jwe, "ciphertext"));
   for (const char *name : {"protect", "iv", "ciphertext", "tag"}) add(decode(len_of(jwe, name)));
   add(decode(len_of(jwe.at("recipients").at(0), "encrypted_key")));
-  add(rsa_decrypt(Form::kExponentsAlone, keys));
+  add(rsa_decrypt(keys));
   add(hmac(len_of(jwe, "protect") + kAesBlockLen + len + kAlLen));
   add(aes(len, false));
 }
@@ -309,10 +319,10 @@ void Floor::add_opening(const Json &jwe) {
 void Floor::add_image(const Json &encrypted_ta, const char *image_name) {
   const size_t len = bytes_in(len_of(encrypted_ta, image_name));
   for (const char *name : {"key", "iv", image_name}) add(decode(len_of(encrypted_ta, name)));
-  add(rsa_decrypt(Form::kWithPrimes, keys));
-  add(depth == Depth::kWithRules ? decrypt_blocks(len) : aes(len, false));
+  add(rsa_decrypt(keys));
+  add(depth == Depth::kCryptography ? aes(len, false) : decrypt_blocks(len));
   add(digest(len));
-  if (depth == Depth::kWithRules) add(move(len));
+  if (depth != Depth::kCryptography) add(move(len));
 }
 
 void Floor::add_sealing(const Json &jwe) {
@@ -326,12 +336,12 @@ void Floor::add_sealing(const Json &jwe) {
   add(aes(len, true));
 }
 
-void Floor::add_signing(const Json &envelope, Form form) {
+void Floor::add_signing(const Json &envelope) {
   for (const char *name : {"payload", "protect", "signature"}) {
     add(encode(bytes_in(len_of(envelope, name))));
   }
   add(digest(len_of(envelope, "protect") + 1 + len_of(envelope, "payload")));
-  add(rsa_sign(form, keys));
+  add(rsa_sign(keys));
 }
 
 std::string payload_text(const Json &envelope) {
@@ -340,6 +350,13 @@ std::string payload_text(const Json &envelope) {
 
 Json payload_of(const Json &envelope) {
   return tsm::parse_json(payload_text(envelope)).value();
+}
+
+// The JWE in a response.
+Json sealed_part_of(const Json &answer) {
+  const Json payload = payload_of(answer);
+  const Json members = payload.size() == 1 ? payload.front() : payload;
+  return members.at(members.contains("edsi") ? "edsi" : "content");
 }
 
 }  // namespace
@@ -359,7 +376,7 @@ Work verification_of(size_t payload_len, Keys keys) {
 
 Work signing_of(size_t payload_len, Keys keys) {
   return in_order({encode(bytes_in(payload_len)), encode(kRsaLen),
-                   digest(kProtectLen + 1 + payload_len), rsa_sign(Form::kExponentsAlone, keys)});
+                   digest(kProtectLen + 1 + payload_len), rsa_sign(keys)});
 }
 
 Work work_of(const MessageCase &message, const std::string &request, const std::string &response,
@@ -368,7 +385,7 @@ Work work_of(const MessageCase &message, const std::string &request, const std::
   const Json answer = tsm::parse_json(response).value().front();
   floor.add_reading(request);
   if (message.id == MessageId::kGetTaInfo) {
-    floor.add_signing(answer, Form::kWithPrimes);
+    floor.add_signing(answer);
     return in_order(floor.works);
   }
 
@@ -389,11 +406,25 @@ Work work_of(const MessageCase &message, const std::string &request, const std::
     const std::string image_name(tsm::image_member(message.id));
     floor.add_image(tbs.at("encrypted_ta"), image_name.c_str());
   }
-  const Json payload = payload_of(answer);
-  const Json members = payload.size() == 1 ? payload.front() : payload;
-  floor.add_sealing(members.contains("edsi") ? members.at("edsi") : members.at("content"));
-  floor.add_signing(answer, Form::kExponentsAlone);
+  floor.add_sealing(sealed_part_of(answer));
+  floor.add_signing(answer);
   return in_order(floor.works);
+}
+
+JoseParts jose_parts_of(const std::string &request, const std::string &response) {
+  const Json envelope = tsm::parse_json(request).value().front();
+  const Json answer = tsm::parse_json(response).value().front();
+  const Json tbs = payload_of(envelope).front();
+  JoseParts parts = {.encrypted = plain_len(sealed_part_of(answer)),
+                     .signed_len = bytes_in(len_of(answer, "payload"))};
+  if (tbs.contains("tsm_key_chain")) {
+    for (const Json &entry : tbs.at("tsm_key_chain").at("tsm_list")) {
+      parts.verified.push_back(chain_block_len(entry));
+    }
+  }
+  parts.verified.push_back(bytes_in(len_of(envelope, "payload")));
+  if (tbs.contains("content")) parts.decrypted = plain_len(tbs.at("content"));
+  return parts;
 }
 
 }  // namespace bench

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// What is under an exchange: work that it cannot do without, straight in OpenSSL.
 ///
-/// The keys have the form of the real ones: the device's TEE key is modulus and exponents alone, an
-/// AIK has its primes. What is worked on has the lengths of the real texts, and other bytes.
+/// All private keys have their primes. What is worked on has the lengths of the real texts, and
+/// other bytes.
 #ifndef BENCH_FLOOR_H
 #define BENCH_FLOOR_H
 
@@ -24,8 +24,8 @@ enum class Keys {
 
 enum class Depth {
   kCryptography,  // and nothing else, all keys and contexts prepared
-  kWithRules,     // as the agent has to do it: with new keys, an image block by block, each text
-                  // tokenized once, and payload and image moved through the heap
+  kWithCopies,    // and an image block by block, payload and image moved through the heap
+  kWithRules,     // as the agent has to do it: also with new keys, and each text tokenized once
 };
 
 /// The work of an exchange that took place: of its request, its response, and the state document
@@ -35,6 +35,15 @@ Work work_of(const MessageCase &message, const std::string &request, const std::
 
 /// One pass of the tokenizer.
 Work reading_of(std::string text);
+
+/// Lengths of what an exchange verifies, decrypts, encrypts and signs.
+struct JoseParts {
+  std::vector<size_t> verified = {};
+  size_t decrypted = 0;  // 0: nothing
+  size_t encrypted = 0;
+  size_t signed_len = 0;
+};
+JoseParts jose_parts_of(const std::string &request, const std::string &response);
 
 /// Verifying and signing an envelope whose payload has so many characters in base64url.
 Work verification_of(size_t payload_len, Keys keys);

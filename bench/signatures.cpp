@@ -2,16 +2,13 @@
 // Verification of a request and signing of a response of 1.5 KiB against two JOSE libraries. The
 // bound is one pass of the tokenizer and the same in OpenSSL's EVP interface, which the host TEE
 // works with.
-#include <openssl/core_names.h>
-#include <openssl/evp.h>
-
 #include <memory>
 #include <stdexcept>
 
 #include "crypto/rsa.h"
 #include "floor.h"
 #include "inside.h"
-#include "libraries/libraries.h"
+#include "rivals.h"
 #include "security/jws.h"
 #include "state/object_store.h"
 #include "suite.h"
@@ -27,21 +24,6 @@ constexpr char kStoredKeyId[] = "TSM_INFO_tsm1";
 
 void require(bool passed, const char *what) {
   if (!passed) throw std::runtime_error(what);
-}
-
-RsaNumbers numbers_of(const tsm::RsaKey &key) {
-  const auto number = [&](const char *name) {
-    BIGNUM *value = nullptr;
-    if (EVP_PKEY_get_bn_param(key.get(), name, &value) != 1) {
-      throw std::runtime_error("a key lacks a number");
-    }
-    std::string bytes(static_cast<size_t>(BN_num_bytes(value)), 0);
-    BN_bn2bin(value, reinterpret_cast<uint8_t *>(bytes.data()));
-    BN_free(value);
-    return bytes;
-  };
-  return {number(OSSL_PKEY_PARAM_RSA_N), number(OSSL_PKEY_PARAM_RSA_E),
-          number(OSSL_PKEY_PARAM_RSA_D)};
 }
 
 key_object make_key(const RsaNumbers &numbers) {
@@ -91,7 +73,7 @@ struct Stage {
 
   Inside inside;
   const tsm::RsaKey &tsm_key = otrp_test::key_named("tsm");
-  const RsaNumbers numbers = numbers_of(tsm_key);
+  const RsaNumbers numbers = numbers_of(tsm_key, false);
   const Message message = make_message(tsm_key);
   const key_object key = make_key(numbers);
 };
@@ -123,74 +105,74 @@ void verify(const Stage &stage) {
       "the agent did not verify a message");
 }
 
-void sign(const Stage &stage) {
+void sign(const Stage &stage, TEE_ObjectHandle key) {
   const json_text text(construct_json_signature("DeleteTAResponse", stage.message.payload.c_str(),
-                                                JWS_HEADER_RS256, nullptr, stage.key.get()));
+                                                JWS_HEADER_RS256, nullptr, key));
   require(bool(text), "the agent did not sign a message");
 }
 
-/// A library with its form of the key.
-class Rival {
- public:
-  Rival(std::shared_ptr<const Stage> stage, const JoseLibrary &library)
-      : stage_(std::move(stage)), library_(library), key_(library.make_key(stage_->numbers)) {
-    require(key_ != nullptr, "a library refused a key");
-    stored_ = library.store_public_key(key_);
-  }
-  ~Rival() { library_.free_key(key_); }
-  Rival(const Rival &) = delete;
-  Rival &operator=(const Rival &) = delete;
+void sign_with_stored_key(const Stage &stage) {
+  sign(stage, make_key(stage.numbers).get());
+}
 
-  void verify_with_stored_key() const {
-    void *loaded = library_.load_key(stored_);
-    verify_with(loaded);
-    library_.free_key(loaded);
-  }
-  void verify() const { verify_with(key_); }
-  void sign() const {
-    require(!library_.sign(stage_->message.payload, key_).empty(),
-            "a library did not sign a message");
-  }
+void sign_with_key_at_hand(const Stage &stage) {
+  sign(stage, stage.key.get());
+}
 
- private:
-  void verify_with(void *key) const {
-    require(library_.verify(stage_->message.compact, key) == stage_->message.payload.size(),
-            "a library did not verify a message");
-  }
-
-  const std::shared_ptr<const Stage> stage_;
-  const JoseLibrary &library_;
-  void *key_;
-  std::string stored_;
+struct Case {
+  const char *name;
+  void (*ours)(const Stage &);
+  void (*theirs)(const Rival &, const Message &);
+  double JoseLibrary::*target;
+  Work (*bound)(size_t payload_len, Keys keys);
+  Keys keys;
 };
 
-void add(Suite &suite, const std::string &name, void (*ours)(const Stage &),
-         void (Rival::*theirs)() const, Work (*bound)(size_t payload_len, Keys keys), Keys keys) {
-  suite.compare("signatures/" + name, [=] {
-    const auto stage = std::make_shared<const Stage>();
-    Comparison comparison = {{{"agent", [=] { ours(*stage); }}}};
-    for (const JoseLibrary &library : known<JoseLibrary>()) {
-      const auto rival = std::make_shared<Rival>(stage, library);
-      comparison.contestants.push_back(
-          {.name = library.name, .run = [=] { (*rival.*theirs)(); }, .target = library.target});
-    }
-    const size_t payload_len = tsm::base64url_encode(stage->message.payload).size();
+// Libraries sign with a key that is ready, made of the same three numbers as the device's.
+const Case kCases[] = {
+    {"verify, stored key", verify_with_stored_key,
+     [](const Rival &rival, const Message &message) {
+       rival.verify_with_stored_key(message.compact, message.payload.size());
+     },
+     &JoseLibrary::verify_target, verification_of, Keys::kNew},
+    {"verify, key at hand", verify,
+     [](const Rival &rival, const Message &message) {
+       rival.verify(message.compact, message.payload.size());
+     },
+     &JoseLibrary::verify_target, verification_of, Keys::kAtHand},
+    {"sign, stored key", sign_with_stored_key,
+     [](const Rival &rival, const Message &message) { rival.sign(message.payload); },
+     &JoseLibrary::sign_target, signing_of, Keys::kNew},
+    {"sign, key at hand", sign_with_key_at_hand,
+     [](const Rival &rival, const Message &message) { rival.sign(message.payload); },
+     &JoseLibrary::sign_target, signing_of, Keys::kAtHand},
+};
+
+Comparison compare(const Case &c) {
+  const auto stage = std::make_shared<const Stage>();
+  Comparison comparison = {{{"agent", [&c, stage] { c.ours(*stage); }}}};
+  for (const JoseLibrary &library : known<JoseLibrary>()) {
+    const auto rival = std::make_shared<Rival>(library, stage->numbers);
     comparison.contestants.push_back(
-        {kBound, [work = bound(payload_len, keys), read = reading_of(stage->message.text)] {
-           read();
-           work();
-         }});
-    return comparison;
-  });
+        {.name = library.name,
+         .run = [&c, stage, rival] { c.theirs(*rival, stage->message); },
+         .target = library.*c.target});
+  }
+  const size_t payload_len = tsm::base64url_encode(stage->message.payload).size();
+  comparison.contestants.push_back(
+      {kBound, [work = c.bound(payload_len, c.keys), read = reading_of(stage->message.text)] {
+         read();
+         work();
+       }});
+  return comparison;
 }
 
 }  // namespace
 
 void add_signatures(Suite &suite) {
-  add(suite, "verify, stored key", verify_with_stored_key, &Rival::verify_with_stored_key,
-      verification_of, Keys::kNew);
-  add(suite, "verify, key at hand", verify, &Rival::verify, verification_of, Keys::kAtHand);
-  add(suite, "sign", sign, &Rival::sign, signing_of, Keys::kAtHand);
+  for (const Case &c : kCases) {
+    suite.compare(std::string("signatures/") + c.name, [&c] { return compare(c); });
+  }
 }
 
 }  // namespace bench

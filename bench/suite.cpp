@@ -42,12 +42,37 @@ double measure(const Contestant &contestant, benchmark::IterationCount num_runs,
   return (end - begin) / static_cast<double>(num_runs);
 }
 
-// The time of the contestant kBound, where there is one.
-std::optional<double> bound_of(const std::vector<Contestant> &contestants,
-                               const std::vector<double> &amounts) {
-  const auto bound = std::ranges::find(contestants, kBound, &Contestant::name);
-  if (bound == contestants.end()) return {};
-  return amounts[static_cast<size_t>(bound - contestants.begin())];
+size_t index_of(const std::vector<Contestant> &contestants, const std::string &name) {
+  const auto found = std::ranges::find(contestants, name, &Contestant::name);
+  return static_cast<size_t>(found - contestants.begin());
+}
+
+void count(const Comparison &comparison, const Remainder &remainder,
+           const std::vector<double> &amounts, benchmark::UserCounters &counters) {
+  for (size_t i = 0; i < amounts.size(); ++i) {
+    counters[comparison.contestants[i].name] = amounts[i];
+  }
+  const double rest = remainder.of(amounts);
+  counters[remainder.name] = rest;
+  const std::string &over = remainder.over;
+  counters[(over.empty() ? remainder.name : over) + " target"] = remainder.target;
+  if (over.empty()) return;
+  counters[remainder.name + " / " + over] = rest / amounts[index_of(comparison.contestants, over)];
+}
+
+void count(const std::vector<Contestant> &contestants, const std::vector<double> &amounts,
+           benchmark::UserCounters &counters) {
+  counters[contestants[0].name] = amounts[0];
+  const size_t bound = index_of(contestants, kBound);
+  for (size_t i = 1; i < contestants.size(); ++i) {
+    const std::string &name = contestants[i].name;
+    counters[name] = amounts[i];
+    counters[contestants[0].name + " / " + name] = amounts[0] / amounts[i];
+    if (contestants[i].target == 0) continue;
+    counters[name + " target"] = contestants[i].target;
+    const bool has_bound = bound != contestants.size() && bound != i;
+    if (has_bound) counters[name + " bound"] = amounts[bound] / amounts[i];
+  }
 }
 
 void run_round(benchmark::State &state, const Comparison &comparison, size_t round, Gauge gauge) {
@@ -63,15 +88,10 @@ void run_round(benchmark::State &state, const Comparison &comparison, size_t rou
     }
   }
   state.counters = comparison.counters;
-  state.counters[contestants[0].name] = amounts[0];
-  const std::optional<double> bound = bound_of(contestants, amounts);
-  for (size_t i = 1; i < contestants.size(); ++i) {
-    const std::string &name = contestants[i].name;
-    state.counters[name] = amounts[i];
-    state.counters[contestants[0].name + " / " + name] = amounts[0] / amounts[i];
-    if (contestants[i].target == 0) continue;
-    state.counters[name + " target"] = contestants[i].target;
-    if (bound) state.counters[name + " bound"] = *bound / amounts[i];
+  if (comparison.remainder) {
+    count(comparison, *comparison.remainder, amounts, state.counters);
+  } else {
+    count(contestants, amounts, state.counters);
   }
 }
 

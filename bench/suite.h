@@ -9,6 +9,8 @@
 ///     FIRST / NAME   what the first contestant takes as a part of that
 ///     NAME target    what this ratio is held to
 ///     NAME bound     what it would be if nothing were left but the contestant kBound
+///
+/// A remainder takes the place of the first contestant.
 #ifndef BENCH_SUITE_H
 #define BENCH_SUITE_H
 
@@ -33,9 +35,18 @@ struct Contestant {
 /// Name of the contestant that has to do what the first one cannot avoid, and nothing else.
 inline constexpr char kBound[] = "bound";
 
+/// What is judged where no contestant is judged as a whole.
+struct Remainder {
+  std::string name;
+  std::function<double(const std::vector<double> &amounts)> of;  // of the contestants, in order
+  std::string over = {};  // name of the contestant that it is a multiple of; empty: none
+  double target = 0;      // of this multiple; without one, of the remainder itself
+};
+
 struct Comparison {
   std::vector<Contestant> contestants;
   benchmark::UserCounters counters = {};  // what else is to be told
+  std::optional<Remainder> remainder = {};
 };
 
 enum class Gauge {

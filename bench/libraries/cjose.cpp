@@ -10,16 +10,20 @@ static cjose_jwk_t *jwk(void *key) {
 }
 
 static void *make_key(const bench::RsaNumbers &numbers) {
-  const auto bytes = [](const std::string &number) {
-    return reinterpret_cast<uint8_t *>(const_cast<char *>(number.data()));
-  };
   cjose_jwk_rsa_keyspec spec = {};
-  spec.n = bytes(numbers.n);
-  spec.nlen = numbers.n.size();
-  spec.e = bytes(numbers.e);
-  spec.elen = numbers.e.size();
-  spec.d = bytes(numbers.d);
-  spec.dlen = numbers.d.size();
+  const struct {
+    const std::string &number;
+    uint8_t *&bytes;
+    size_t &len;
+  } members[] = {{numbers.n, spec.n, spec.nlen},    {numbers.e, spec.e, spec.elen},
+                 {numbers.d, spec.d, spec.dlen},    {numbers.p, spec.p, spec.plen},
+                 {numbers.q, spec.q, spec.qlen},    {numbers.dp, spec.dp, spec.dplen},
+                 {numbers.dq, spec.dq, spec.dqlen}, {numbers.qi, spec.qi, spec.qilen}};
+  for (const auto &member : members) {
+    if (member.number.empty()) continue;
+    member.bytes = reinterpret_cast<uint8_t *>(const_cast<char *>(member.number.data()));
+    member.len = member.number.size();
+  }
   return cjose_jwk_create_RSA_spec(&spec, nullptr);
 }
 
@@ -57,13 +61,42 @@ static std::string sign(const std::string &payload, void *key) {
   return compact;
 }
 
+static size_t decrypt(const std::string &compact, void *key) {
+  cjose_jwe_t *jwe = cjose_jwe_import(compact.data(), compact.size(), nullptr);
+  size_t len = 0;
+  uint8_t *plain = jwe != nullptr ? cjose_jwe_decrypt(jwe, jwk(key), &len, nullptr) : nullptr;
+  const bool decrypted = plain != nullptr;
+  std::free(plain);
+  cjose_jwe_release(jwe);
+  return decrypted ? len : 0;
+}
+
+static std::string encrypt(const std::string &plain, void *key) {
+  cjose_header_t *header = cjose_header_new(nullptr);
+  cjose_header_set(header, CJOSE_HDR_ALG, CJOSE_HDR_ALG_RSA1_5, nullptr);
+  cjose_header_set(header, CJOSE_HDR_ENC, CJOSE_HDR_ENC_A128CBC_HS256, nullptr);
+  cjose_jwe_t *jwe = cjose_jwe_encrypt(
+      jwk(key), header, reinterpret_cast<const uint8_t *>(plain.data()), plain.size(), nullptr);
+  char *text = jwe != nullptr ? cjose_jwe_export(jwe, nullptr) : nullptr;
+  std::string compact;
+  if (text != nullptr) compact = text;
+  std::free(text);
+  cjose_jwe_release(jwe);
+  cjose_header_release(header);
+  return compact;
+}
+
 static const bench::Added<bench::JoseLibrary> added({
     .name = "libcjose",
-    .target = 1.05,
+    .verify_target = 1.05,
+    .sign_target = 0.45,
+    .exchange_target = 1.5,
     .make_key = make_key,
     .store_public_key = store_public_key,
     .load_key = load_key,
     .free_key = [](void *key) { cjose_jwk_release(jwk(key)); },
     .verify = verify,
     .sign = sign,
+    .decrypt = decrypt,
+    .encrypt = encrypt,
 });

@@ -20,16 +20,25 @@ struct JsonLibrary {
   void (*free)(void *document);
 };
 
+/// Of a key pair. The last five are all empty, or none is.
 struct RsaNumbers {
   std::string n;
   std::string e;
   std::string d;
+  std::string p = {};
+  std::string q = {};
+  std::string dp = {};
+  std::string dq = {};
+  std::string qi = {};
 };
 
-/// Compact serializations of RFC 7515, RS256.
+/// Compact serializations of RFC 7515 with RS256, and of RFC 7516 with RSA1_5 and A128CBC-HS256.
 struct JoseLibrary {
   const char *name;
-  double target;  // the agent's time as a part of this library's
+  // The agent's time as a part of this library's.
+  double verify_target;
+  double sign_target;
+  double exchange_target;
   /// A key for both directions; the library keeps it.
   void *(*make_key)(const RsaNumbers &numbers);
   /// A key as the library stores it, and back.
@@ -39,6 +48,9 @@ struct JoseLibrary {
   /// The length of the payload; 0 when the signature does not verify.
   size_t (*verify)(const std::string &compact, void *key);
   std::string (*sign)(const std::string &payload, void *key);
+  /// The length of the plaintext; 0 when it cannot be had.
+  size_t (*decrypt)(const std::string &compact, void *key);
+  std::string (*encrypt)(const std::string &plain, void *key);
 };
 
 template <class Library>
