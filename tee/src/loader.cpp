@@ -7,11 +7,12 @@
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <map>
 #include <mutex>
 #include <span>
 
 #include "error.h"
-#include "host_file.h"
+#include "loaded_image.h"
 
 namespace tee {
 
@@ -19,7 +20,7 @@ namespace fs = std::filesystem;
 
 namespace {
 
-std::mutex g_lock;  // of the variable below, and of "is it loaded? then load"
+std::mutex g_lock;  // of what is below, and of "is it loaded? then load"
 std::string g_test_directory;
 
 Error bad_image(const fs::path &file, const std::string &why) {
@@ -71,54 +72,37 @@ fs::path find_image(const TEE_UUID &ta) {
   throw Error{TEE_ERROR_ITEM_NOT_FOUND, "no TA image " + name + looked};
 }
 
-// ---- Loading
+// ---- Images that no instance uses
 
-// A shared object together with the copy it was loaded from: while that is open, no other copy
-// can have the same name, by which the dynamic linker would take one for the other.
-struct LoadedImage {
-  host::File copy;
-  void *handle = nullptr;
-
-  LoadedImage() = default;
-  LoadedImage(const LoadedImage &) = delete;
-  LoadedImage &operator=(const LoadedImage &) = delete;
-  ~LoadedImage() {
-    if (handle != nullptr) ::dlclose(handle);
-  }
-};
-
-bool is_loaded(const fs::path &file) {
-  void *handle = ::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD);
-  if (handle != nullptr) ::dlclose(handle);
-  return handle != nullptr;
+// Loading takes longer than most commands. So one image of each file, as it was when it had just
+// been loaded, waits here for the next instance. Never destroyed: the last instance may end with a
+// static object.
+using IdleImages = std::map<std::string, std::unique_ptr<LoadedImage>>;  // by file
+IdleImages &idle_images() {
+  static IdleImages *const images = new IdleImages;
+  return *images;
 }
 
-host::File copy_of(const fs::path &file) {
-  const host::File source = host::open_for_reading(file.c_str());
-  if (!source.valid()) throw system_error("cannot read " + file.string());
-  host::File copy = host::copy_in_memory(file.filename().c_str(), source);
-  if (!copy.valid()) throw system_error("cannot copy " + file.string());
-  return copy;
+std::unique_ptr<LoadedImage> take_or_load(const fs::path &file) {
+  std::unique_ptr<LoadedImage> idle = std::move(idle_images()[file.native()]);
+  if (idle && idle->is_up_to_date()) return idle;
+  idle.reset();
+  return LoadedImage::load(file);
 }
 
-std::shared_ptr<LoadedImage> load(const fs::path &file) {
-  auto image = std::make_shared<LoadedImage>();
-  std::string name = file.string();
-  if (is_loaded(file)) {
-    image->copy = copy_of(file);
-    name = "/proc/self/fd/" + std::to_string(image->copy.get());
-  }
-  image->handle = ::dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
-  if (image->handle == nullptr) throw bad_image(file, ::dlerror());
-  return image;
+// Without a word of what an instance has left in it.
+void give_back(LoadedImage *used) {
+  std::unique_ptr<LoadedImage> image(used);
+  const std::lock_guard guard(g_lock);
+  std::unique_ptr<LoadedImage> &idle = idle_images()[image->file().native()];
+  if (image->reset() && !idle) idle = std::move(image);
 }
 
 // ---- Checking
 
 const tee_ta_image &checked_header(const LoadedImage &image, const TEE_UUID &ta,
                                    const fs::path &file) {
-  const auto *header =
-      static_cast<const tee_ta_image *>(::dlsym(image.handle, TEE_TA_IMAGE_SYMBOL));
+  const auto *header = static_cast<const tee_ta_image *>(image.find(TEE_TA_IMAGE_SYMBOL));
   if (header == nullptr) throw bad_image(file, "has no " TEE_TA_IMAGE_SYMBOL);
   if (header->magic != TEE_TA_IMAGE_MAGIC || header->version != TEE_TA_IMAGE_VERSION) {
     throw bad_image(file, "header of another kind or version");
@@ -159,9 +143,10 @@ void check_lifecycle(const tee_ta_metadata &metadata, const fs::path &file) {
 }  // namespace
 
 Program load_program(const TEE_UUID &ta) {
-  const std::lock_guard guard(g_lock);
+  std::unique_lock guard(g_lock);
   const fs::path file = find_image(ta);
-  std::shared_ptr<LoadedImage> image = load(file);
+  std::unique_ptr<LoadedImage> image = take_or_load(file);
+  guard.unlock();
   const tee_ta_image &header = checked_header(*image, ta, file);
   check_lifecycle(*header.metadata, file);
   return {
@@ -170,7 +155,7 @@ Program load_program(const TEE_UUID &ta) {
       .trace_prefix = header.metadata->trace_prefix,
       .trace_level = header.metadata->trace_level,
       .entry_points = header.entry_points,
-      .image = std::move(image),
+      .image = std::shared_ptr<LoadedImage>(image.release(), give_back),
   };
 }
 

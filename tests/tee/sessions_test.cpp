@@ -12,12 +12,13 @@ namespace {
 
 // ---- Sessions of the normal world
 
+const std::filesystem::path kCorvelImage =
+    std::filesystem::read_symlink("/proc/self/exe").parent_path().parent_path() / "ta" /
+    OTRP_CORVEL_IMAGE;
+
 TEST(Loading, AMissingOrWrongImageIsNamed) {
   TemporaryFolder folder;
-  const std::filesystem::path images =
-      std::filesystem::read_symlink("/proc/self/exe").parent_path().parent_path() / "ta";
-  std::filesystem::copy(images / OTRP_CORVEL_IMAGE,
-                        folder.path / "00000002-0000-4000-8000-00000000000b.so");
+  std::filesystem::copy(kCorvelImage, folder.path / "00000002-0000-4000-8000-00000000000b.so");
   set_ta_directory(folder.path);
   Device device;
   Client client(device.name());
@@ -25,6 +26,36 @@ TEST(Loading, AMissingOrWrongImageIsNamed) {
   EXPECT_EQ(client.origin, TEEC_ORIGIN_TEE);
   EXPECT_NE(std::string(tee_inspect_last_error()).find(folder.path), std::string::npos);
   EXPECT_EQ(client.open(kTaB), TEEC_ERROR_BAD_FORMAT);
+  set_ta_directory("");
+}
+
+TEST(Loading, AnInstanceSharesNoVariableWithOthersOfItsImage) {
+  TemporaryFolder folder;
+  const std::filesystem::path image = folder.path / "00000001-0000-4000-8000-00000000000a.so";
+  std::filesystem::copy(OTRP_COUNTING_IMAGE, image);
+  set_ta_directory(folder.path);
+  const auto commands_of = [](Client &client) {
+    TEEC_Operation operation{};
+    operation.paramTypes = TEEC_VALUE_OUTPUT;
+    EXPECT_EQ(client.invoke(0, &operation), TEEC_SUCCESS);
+    return operation.params[0].value.a;
+  };
+  Device device, other_device;
+  Client client(device.name()), other(other_device.name());
+  for (int i = 0; i < 3; ++i) {
+    SCOPED_TRACE(i);
+    ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
+    EXPECT_EQ(commands_of(client), 1u);
+    ASSERT_EQ(other.open(kTaA), TEEC_SUCCESS);
+    EXPECT_EQ(commands_of(other), 1u);
+    EXPECT_EQ(commands_of(client), 101u);
+    (i == 1 ? other : client).close();
+    (i == 1 ? client : other).close();
+  }
+  std::filesystem::remove(image);
+  EXPECT_EQ(client.open(kTaA), TEEC_ERROR_ITEM_NOT_FOUND);
+  std::filesystem::copy(kCorvelImage, image);
+  EXPECT_EQ(client.open(kTaA), TEEC_ERROR_BAD_FORMAT);
   set_ta_directory("");
 }
 

@@ -1,0 +1,146 @@
+// SPDX-License-Identifier: BSD-2-Clause
+#include "loaded_image.h"
+
+#include <dlfcn.h>
+#include <link.h>
+#include <tee_internal_api.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <span>
+
+#include "error.h"
+
+namespace tee {
+
+namespace fs = std::filesystem;
+
+namespace {
+
+bool is_loaded(const fs::path &file) {
+  void *handle = ::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD);
+  if (handle != nullptr) ::dlclose(handle);
+  return handle != nullptr;
+}
+
+host::File copy_of(const fs::path &file) {
+  const host::File source = host::open_for_reading(file.c_str());
+  if (!source.valid()) throw system_error("cannot read " + file.string());
+  host::File copy = host::copy_in_memory(file.filename().c_str(), source);
+  if (!copy.valid()) throw system_error("cannot copy " + file.string());
+  return copy;
+}
+
+bool is_same_file(const struct stat &one, const struct stat &other) {
+  return one.st_dev == other.st_dev && one.st_ino == other.st_ino;
+}
+
+bool is_same_time(const timespec &one, const timespec &other) {
+  return one.tv_sec == other.tv_sec && one.tv_nsec == other.tv_nsec;
+}
+
+struct Segments {
+  uintptr_t base;
+  std::span<const ElfW(Phdr)> headers = {};
+};
+
+Segments segments_of(void *handle) {
+  link_map *map = nullptr;
+  ::dlinfo(handle, RTLD_DI_LINKMAP, &map);
+  Segments segments = {map->l_addr};
+  const auto find = [](dl_phdr_info *info, size_t, void *found) {
+    auto &wanted = *static_cast<Segments *>(found);
+    if (info->dlpi_addr != wanted.base) return 0;
+    wanted.headers = {info->dlpi_phdr, info->dlpi_phnum};
+    return 1;
+  };
+  ::dl_iterate_phdr(find, &segments);
+  return segments;
+}
+
+// Where the pages end that the dynamic linker has written and then closed.
+uintptr_t end_of_closed_pages(const Segments &segments) {
+  const auto closed =
+      std::ranges::find(segments.headers, ElfW(Word){PT_GNU_RELRO}, &ElfW(Phdr)::p_type);
+  if (closed == segments.headers.end()) return 0;
+  const auto page_len = static_cast<uintptr_t>(::sysconf(_SC_PAGESIZE));
+  return (segments.base + closed->p_vaddr + closed->p_memsz) / page_len * page_len;
+}
+
+// A sanitizer takes the gaps that it leaves between variables for nobody's.
+__attribute__((no_sanitize("address"))) void copy(const volatile uint8_t *from, size_t len,
+                                                  volatile uint8_t *to) {
+  for (size_t i = 0; i < len; ++i) to[i] = from[i];
+}
+
+}  // namespace
+
+std::unique_ptr<LoadedImage> LoadedImage::load(const fs::path &file) {
+  std::unique_ptr<LoadedImage> image(new LoadedImage(file));
+  image->open();
+  image->remember_variables();
+  return image;
+}
+
+LoadedImage::LoadedImage(const fs::path &file) : file_(file) {}
+
+// Unloading runs code of the image. Where the file was written over, so was that code.
+LoadedImage::~LoadedImage() {
+  if (handle_ != nullptr && !is_overwritten()) ::dlclose(handle_);
+}
+
+// The dynamic linker takes an object of the same name for the same. A copy in memory has a name
+// that no other one has while it is open.
+void LoadedImage::open() {
+  if (::stat(file_.c_str(), &status_) != 0) throw system_error("cannot read " + file_.string());
+  std::string name = file_.string();
+  if (is_loaded(file_)) {
+    copy_ = copy_of(file_);
+    name = "/proc/self/fd/" + std::to_string(copy_.get());
+  }
+  handle_ = ::dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
+  if (handle_ == nullptr) {
+    throw Error{TEE_ERROR_BAD_FORMAT, "TA image " + file_.string() + ": " + ::dlerror()};
+  }
+}
+
+void LoadedImage::remember_variables() {
+  const Segments segments = segments_of(handle_);
+  const uintptr_t closed = end_of_closed_pages(segments);
+  for (const ElfW(Phdr) & header : segments.headers) {
+    if (header.p_type == PT_TLS) has_other_variables_ = true;
+    if (header.p_type != PT_LOAD || (header.p_flags & PF_W) == 0) continue;
+    const uintptr_t begin = std::max(segments.base + header.p_vaddr, closed);
+    const uintptr_t end = segments.base + header.p_vaddr + header.p_memsz;
+    if (begin >= end) continue;
+    Variables &variables = variables_.emplace_back(reinterpret_cast<volatile uint8_t *>(begin),
+                                                   std::vector<uint8_t>(end - begin));
+    copy(variables.at, variables.initial.size(), variables.initial.data());
+  }
+}
+
+const void *LoadedImage::find(const char *symbol) const {
+  return ::dlsym(handle_, symbol);
+}
+
+bool LoadedImage::is_up_to_date() const {
+  struct stat now;
+  return ::stat(file_.c_str(), &now) == 0 && is_same_file(now, status_) &&
+         now.st_size == status_.st_size && is_same_time(now.st_mtim, status_.st_mtim) &&
+         is_same_time(now.st_ctim, status_.st_ctim);
+}
+
+bool LoadedImage::is_overwritten() const {
+  struct stat now;
+  return !copy_.valid() && ::stat(file_.c_str(), &now) == 0 && is_same_file(now, status_) &&
+         !is_up_to_date();
+}
+
+bool LoadedImage::reset() {
+  for (const Variables &variables : variables_) {
+    copy(variables.initial.data(), variables.initial.size(), variables.at);
+  }
+  return !has_other_variables_;
+}
+
+}  // namespace tee
