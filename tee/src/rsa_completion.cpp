@@ -3,10 +3,13 @@
 
 #include <tee_internal_api.h>
 
+#include <algorithm>
+#include <bit>
 #include <new>
 #include <optional>
 
 #include "evp.h"
+#include "inversion.h"
 
 namespace tee {
 
@@ -53,15 +56,22 @@ struct Primes {
   BIGNUM *q;
 };
 
-// By Newton's method. The first guess is right in its first bit, and each step doubles the bits
-// that are right; of a number that is no square the last may be wrong.
+// By Newton's method, which doubles the bits that are right in each step: so each works on no more
+// of the leading bits than it takes. Of a number that is no square the last bit may be wrong.
 BIGNUM *root_of(const BIGNUM *square, Scratch &scratch) {
-  BIGNUM *root = scratch.number(), *other = scratch.number();
-  require(BN_set_bit(root, (BN_num_bits(square) + 1) / 2));
-  for (int right = 1; right <= BN_num_bits(square); right *= 2) {
-    require(BN_div(other, nullptr, square, root, scratch.context()));
+  constexpr int kSpareBits = 3;
+  const int num_bits = (BN_num_bits(square) + 1) / 2;
+  BIGNUM *root = scratch.number(), *leading = scratch.number(), *other = scratch.number();
+  int known = kSpareBits;
+  require(BN_set_bit(root, known));
+  for (int halvings = std::bit_width(static_cast<unsigned>(num_bits)); halvings >= 0; --halvings) {
+    const int wanted = std::min((num_bits >> halvings) + kSpareBits, num_bits);
+    require(BN_lshift(root, root, wanted - known));
+    require(BN_rshift(leading, square, 2 * (num_bits - wanted)));
+    require(BN_div(other, nullptr, leading, root, scratch.context()));
     require(BN_add(root, root, other));
     require(BN_rshift1(root, root));
+    known = wanted;
   }
   return root;
 }
@@ -123,13 +133,11 @@ Attributes crt_part_of(const Attributes &key) {
   const auto primes = find_primes(n, e, d, scratch);
   if (!primes) return {};
 
-  // The flag chooses an inversion whose steps do not tell the numbers.
-  BN_set_flags(primes->p, BN_FLG_CONSTTIME);
-  const BIGNUM *coefficient =
-      BN_mod_inverse(scratch.number(), primes->q, primes->p, scratch.context());
+  BIGNUM *coefficient = scratch.number();
+  if (!invert(*primes->q, *primes->p, *coefficient)) return {};
   const BIGNUM *exponent1 = exponent_for(primes->p, d, scratch);
   const BIGNUM *exponent2 = exponent_for(primes->q, d, scratch);
-  if (coefficient == nullptr || BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
+  if (BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
 
   Attributes part;
   part.emplace(TEE_ATTR_RSA_PRIME1, value_of(*primes->p));
