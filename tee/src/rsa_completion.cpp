@@ -9,7 +9,6 @@
 #include <optional>
 
 #include "evp.h"
-#include "inversion.h"
 
 namespace tee {
 
@@ -133,11 +132,13 @@ Attributes crt_part_of(const Attributes &key) {
   const auto primes = find_primes(n, e, d, scratch);
   if (!primes) return {};
 
-  BIGNUM *coefficient = scratch.number();
-  if (!invert(*primes->q, *primes->p, *coefficient)) return {};
+  // The flag chooses an inversion whose steps do not tell the numbers.
+  BN_set_flags(primes->p, BN_FLG_CONSTTIME);
+  const BIGNUM *coefficient =
+      BN_mod_inverse(scratch.number(), primes->q, primes->p, scratch.context());
   const BIGNUM *exponent1 = exponent_for(primes->p, d, scratch);
   const BIGNUM *exponent2 = exponent_for(primes->q, d, scratch);
-  if (BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
+  if (coefficient == nullptr || BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
 
   Attributes part;
   part.emplace(TEE_ATTR_RSA_PRIME1, value_of(*primes->p));
