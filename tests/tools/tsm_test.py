@@ -259,6 +259,65 @@ class Fleet(Operator):
         self.assertEqual(len(self.tsm("device list").out.splitlines()), 1000)
 
 
+class Plans(Operator):
+    def setUp(self):
+        super().setUp()
+        self.write("payload", "app")
+        self.tsm("image pack payload -o app.img")
+        self.write("sp.pem", "certificate")
+        self.plan("1")
+
+    def plan(self, version, **more):
+        app = {"taid": TAID, "version": version, "image": "app.img"}
+        domain = {"sd": "wallet", "sp": "bank", "cert_file": "sp.pem", "apps": [app]}
+        self.write("plan.json", json.dumps({"domains": [domain], **more}))
+
+    def orders(self, line, code=0):
+        done = json.loads(self.tsm(line + " --json", code).out)
+        return [(step["message"], step.get("outcome")) for step in done["messages"]]
+
+    def test_a_device_is_brought_to_its_plan_and_then_left_alone(self):
+        self.manage("create-sd --sd old --sp else --sp-cert text:x")
+        new = ["create-sd", "install-ta"]
+        self.assertEqual(self.orders("plan plan.json --state d"), [(name, None) for name in new])
+        self.assertEqual(self.orders("apply plan.json --state d"), [(name, "pass") for name in new])
+        self.tsm("apply plan.json --state d", 0, "as planned")
+        self.assertEqual(self.orders("apply plan.json --state d"), [])
+        self.plan("2", others="delete")
+        self.assertEqual(self.orders("apply plan.json --state d"),
+                         [("delete-sd", "pass"), ("update-ta", "pass")])
+        self.tsm("device add d1 --state d")
+        self.tsm("apply plan.json --on all", 0, "1 as planned")
+        self.manage("create-sd --sd other --sp bank")
+        self.tsm("--home two init --tsmid tsm2")
+        self.plan("1")
+        self.tsm("--home two apply plan.json --state d", 1, '"wallet" is managed by another TSM')
+        self.tsm("plan plan.json", 2, "expected")
+        self.write("plan.json", "{")
+        self.tsm("apply plan.json --state d", 2, "plan.json:1: not JSON")
+
+    def test_what_a_lost_answer_left_is_found_by_the_next(self):
+        lost = []
+
+        def serve(call, body):
+            name = next(iter(json.loads(body)))
+            self.write("asked", body)
+            done = self.device("send asked")
+            if name in ("CreateSDRequest", "InstallTARequest") and name not in lost:
+                lost.append(name)
+                return None
+            return 200, done.out, {}
+
+        with serving(serve) as url:
+            for _ in range(6):
+                done = subprocess.run(TSM + ["apply", "plan.json", "--url", url, "--device",
+                                             "device.json"], cwd=self.folder, capture_output=True)
+                if done.returncode == 0:
+                    break
+            self.assertEqual((done.returncode, lost), (0, ["CreateSDRequest", "InstallTARequest"]), done.stderr)
+            self.assertEqual(self.orders(f"apply plan.json --url {url} --device device.json"), [])
+
+
 class Answers(Operator):
     def delete_sd(self, name):
         self.request("delete-sd --sd sd --delete-ta true", name)

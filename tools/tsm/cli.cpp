@@ -179,6 +179,12 @@ const Parameter kDsi = {"--dsi", &Arguments::dsi_file,
                         "Device state document (default: the one kept in the home)"};
 const Parameter kDsiOut = {"--dsi-out", &Arguments::dsi_out_file,
                            "Write the device state document here"};
+const Parameter kKnownDevice = {
+    "--device", &Arguments::device_file,
+    "Device file that says who the device is (default: what this TSM knows of it)"};
+const Parameter kTrace = {"--trace", &Arguments::trace,
+                          "Show all that the agent logs (else what it logs of a failure)"};
+const Parameter kPlan = {"PLAN", &Arguments::plan_file, "File that says what a device should hold"};
 const Parameter kJson = {"--json", &Arguments::json, "Print JSON"};
 
 const Command kImageCommands[] = {
@@ -261,13 +267,11 @@ const Command kCommands[] = {
      {kOn,
       kState,
       kUrl,
-      {kDevice.names, kDevice.value,
-       "Device file that says who the device is (default: what this TSM knows of it)"},
+      kKnownDevice,
       kCaFile,
       kExisting,
       kJobs,
-      {"--trace", &Arguments::trace,
-       "Show all that the agent logs (else what it logs of a failure)"},
+      kTrace,
       kDsiOut,
       {"--image-out", &Arguments::image_out_file,
        "Write the TA image that the device hands back here"},
@@ -275,6 +279,16 @@ const Command kCommands[] = {
      "manage --state ./device get-device-state",
      {},
      "manage --state ./device "},
+    {"plan",
+     run_plan,
+     "Say which messages would bring devices to a plan; change nothing",
+     {kPlan, kOn, kState, kUrl, kKnownDevice, kCaFile, kExisting, kJobs, kTrace, kJson},
+     "plan plan.json --on kitchen"},
+    {"apply",
+     run_apply,
+     "Bring devices to a plan: what they should hold",
+     {kPlan, kOn, kState, kUrl, kKnownDevice, kCaFile, kExisting, kJobs, kTrace, kJson},
+     "apply plan.json --on all -j 4"},
     {"show",
      run_show,
      "Show the last known state of devices as a tree",

@@ -29,6 +29,7 @@ struct Arguments {
   std::string output_file = "-";
   std::string image_file;
   std::string image_out_file;
+  std::string plan_file;
   std::string spcert;  // a file, or the certificate itself
   std::string state_dir;
   bool must_exist = false;  // the device in `state_dir`
@@ -55,6 +56,8 @@ int run_image_pack(const Arguments &arguments);
 int run_image_show(const Arguments &arguments);
 int run_manage(const Arguments &arguments);
 int run_show(const Arguments &arguments);
+int run_plan(const Arguments &arguments);
+int run_apply(const Arguments &arguments);
 int run_device_add(const Arguments &arguments);
 int run_device_list(const Arguments &arguments);
 int run_device_remove(const Arguments &arguments);

@@ -5,6 +5,7 @@
 ///     dsi.json        the last verified state document, as the device made it
 ///     requests.json   {"last", "kept", "waiting"}: the number of the last request that was made,
 ///                     of the one whose answer brought the kept state, and what waits for an answer
+///     plan.json       what is known on the way to a plan: see plan/progress.h
 ///     lock            held while a DeviceRecord lives
 ///
 /// Files are replaced as a whole. Functions throw tools::UsageError; one that finds a file damaged
@@ -39,6 +40,7 @@ class DeviceRecord {
   DeviceRecord(std::string folder, DeviceInfo device);
 
   const DeviceInfo &device() const { return device_; }
+  const std::string &folder() const { return folder_; }
   std::optional<Json> dsi() const { return read_dsi(folder_); }
 
   /// Writes the device file: the device is known from then on.
