@@ -236,7 +236,13 @@ class Fleet(Operator):
                      "request --on d* get-device-state", "manage --on all -j 0 get-device-state",
                      "device add d9 --list list", "device rm d9"):
             self.assertEqual(self.tsm(line, 2).out, b"", line)
-        for line in ("d9", "d9 --state", "d9 --what x", "a/b --state x", "d9 --state x --url y"):
+        told = {**json.loads(self.read("device.json")), "name": "d1"}
+        self.write("list", json.dumps(told))
+        self.tsm("device add --list list --url http://127.0.0.1:1", 2, "expected {name}")
+        self.tsm("device add --list list --url http://127.0.0.1:1/{name}/otrp", 0, "1 added")
+        self.tsm("manage --on d1 get-device-state", 1, "http://127.0.0.1:1/d1/otrp: no connection")
+        for line in ("d9", "d9 --state", "d9 --what x", "a/b --state x", "d9 --state x --url y",
+                     '{"name": "d9"}', json.dumps({**told, "name": "a/b"})):
             self.write("list", "d8 --state more/8\n" + line)
             self.tsm("device add --list list", 2, "list, line 2: ")
         self.assertFalse(os.path.exists(self.path("more/8")))

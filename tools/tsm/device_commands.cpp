@@ -13,14 +13,29 @@ namespace {
 
 using tools::UsageError;
 
+/// Those of a list; --url, with the name in the place of {name}, is the way to devices without one.
+std::vector<Target> listed_targets(const Arguments &arguments) {
+  constexpr std::string_view kName = "{name}";
+  if (!arguments.names.empty() || !arguments.state_dir.empty() || !arguments.device_file.empty()) {
+    throw UsageError("--list says which devices there are: expected no NAME, --state and --device");
+  }
+  const size_t place = arguments.url.find(kName);
+  if (!arguments.url.empty() && place == std::string::npos) {
+    throw UsageError("one --url for all of a list: expected {name} in it, for their names");
+  }
+  const std::string text = tools::read_file(arguments.list_file);
+  std::vector<Target> targets = parse_device_list(text, arguments.list_file);
+  for (Target &target : targets) {
+    if (arguments.url.empty() || !target.url.empty() || !target.state_dir.empty()) continue;
+    target.url = std::string(arguments.url).replace(place, kName.size(), target.name);
+    target.ca_file = arguments.tls_ca_file;
+  }
+  return targets;
+}
+
 /// The device of the command line, or those of a list.
 std::vector<Target> new_targets(const Arguments &arguments) {
-  if (!arguments.list_file.empty() && !arguments.names.empty()) {
-    throw UsageError("NAME and --list say twice what is to be added: expected one of them");
-  }
-  if (!arguments.list_file.empty()) {
-    return parse_device_list(tools::read_file(arguments.list_file), arguments.list_file);
-  }
+  if (!arguments.list_file.empty()) return listed_targets(arguments);
   if (arguments.names.size() != 1) throw UsageError("expected the NAME of one device, or --list");
   Target target = named_target(arguments);
   target.name = arguments.names.front();

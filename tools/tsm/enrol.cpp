@@ -28,8 +28,23 @@ void set_option(const std::string &option, const std::string &value, Target *tar
   }
 }
 
+/// A device file with more members.
+Target parse_object(const std::string &line) {
+  const std::optional<Json> object = parse_json(line);
+  const auto text = [&](const char *name) {
+    const std::string *member = object ? find_string(*object, name) : nullptr;
+    return member == nullptr ? "" : *member;
+  };
+  return {.name = text("name"),
+          .state_dir = text("state"),
+          .url = text("url"),
+          .ca_file = text("ca_file"),
+          .device = parse_device_info(line)};
+}
+
 /// Nothing for a line without words.
 std::optional<Target> parse_line(const std::string &line) {
+  if (line.starts_with("{")) return parse_object(line);
   std::istringstream words(line);
   Target target;
   if (!(words >> target.name) || target.name.front() == '#') return std::nullopt;
@@ -86,7 +101,7 @@ std::vector<Target> parse_device_list(const std::string &text, const std::string
     } catch (const UsageError &error) {
       throw UsageError(file + ", line " + std::to_string(number) + ": " + error.what() +
                        "; expected \"NAME --state DIR\", \"NAME --url URL\" or \"NAME --device "
-                       "FILE\"");
+                       "FILE\", or a device file in one line with a \"name\"");
     }
   }
   return targets;

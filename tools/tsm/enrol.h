@@ -12,8 +12,9 @@
 namespace tsm {
 
 /// Reads a list of devices: a line for each, "NAME --state DIR", "NAME --url URL [--device FILE]
-/// [--ca-file PEM]" or "NAME --device FILE"; empty lines and those that begin with # are passed
-/// over. Throws tools::UsageError, which names `file` and the line.
+/// [--ca-file PEM]" or "NAME --device FILE", or a device file that has a "name" and may have
+/// "state", "url" and "ca_file" as well; empty lines and those that begin with # are passed over.
+/// Throws tools::UsageError, which names `file` and the line.
 std::vector<Target> parse_device_list(const std::string &text, const std::string &file);
 
 struct Enrolled {
