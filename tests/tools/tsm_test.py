@@ -192,6 +192,7 @@ class Fleet(Operator):
         for name in ("all", "-x", "a/b", "a*", "x" * 65, ".", ""):
             self.run_words(TSM + ["device", "add", "--state", "d", "--", name], 2, "bad device name")
         self.tsm("device add d2", 2, "no device is named")
+        self.tsm("manage --on d get-device-state", 2, "did you mean d1?")
         self.tsm("device add d2 --state missing --existing", 2)
         self.tsm("device add d1 --device device.json")  # and no way to it any more
         self.tsm("manage --on d1 get-device-state", 2, "no way to d1")

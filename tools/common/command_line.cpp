@@ -2,12 +2,11 @@
 #include "common/command_line.h"
 
 #include <algorithm>
-#include <numeric>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "common/files.h"
+#include "common/near_miss.h"
 
 namespace tools {
 namespace {
@@ -56,21 +55,6 @@ Words commands_first(const CLI::App &app, std::span<char *> words) {
   return commands;
 }
 
-/// How many letters are to be added, taken away or replaced to make one word of the other.
-size_t distance(std::string_view one, std::string_view other) {
-  std::vector<size_t> row(other.size() + 1);
-  std::iota(row.begin(), row.end(), size_t{0});
-  for (size_t i = 0; i < one.size(); ++i) {
-    size_t diagonal = row[0]++;
-    for (size_t j = 0; j < other.size(); ++j) {
-      const size_t replaced = diagonal + (one[i] == other[j] ? 0 : 1);
-      diagonal = row[j + 1];
-      row[j + 1] = std::min({replaced, row[j] + 1, row[j + 1] + 1});
-    }
-  }
-  return row.back();
-}
-
 /// What the words of a command line have named so far, outermost first.
 std::vector<const CLI::App *> named_commands(const CLI::App &app) {
   std::vector<const CLI::App *> named = {&app};
@@ -108,12 +92,9 @@ std::string unknown_text(const CLI::App &app, const std::string &word) {
   if (names.empty()) return "\"" + word + "\" is not expected here";
   const std::string unknown =
       (is_option ? "unknown option \"" : "unknown command \"") + word + "\": ";
-  const auto near = std::ranges::min_element(
-      names, {}, [&](const std::string &name) { return distance(word, name); });
-  if (distance(word, *near) <= std::max<size_t>(1, near->size() / 3)) {
-    return unknown + "did you mean " + *near + "?";
-  }
-  return unknown + "expected " + (is_option ? "one of those in the help" : listed(names));
+  return unknown + suggestion(word, names,
+                              std::string("expected ") +
+                                  (is_option ? "one of those in the help" : listed(names)));
 }
 
 /// A word that has no place says more than what is missing because of it.

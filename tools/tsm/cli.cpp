@@ -160,24 +160,24 @@ struct Command {
   const char *message_example = nullptr;  // what its messages' examples begin with, if it has any
 };
 
-const Parameter kDevice = {"--device", &Arguments::device_file,
+const Parameter kDevice = {"--device FILE", &Arguments::device_file,
                            "Device file: what `otrp-device info` prints"};
 const Parameter kOn = {
-    "--on", &Arguments::on,
+    "--on NAME", &Arguments::on,
     "Device of the inventory: a name, a pattern such as 'd*', or all; repeatable"};
-const Parameter kJobs = {"-j,--jobs", &Arguments::num_jobs,
+const Parameter kJobs = {"-j,--jobs N", &Arguments::num_jobs,
                          "How many devices at once (default: 1)"};
-const Parameter kState = {"--state", &Arguments::state_dir,
-                          "State directory of a device on this machine (default: $OTRP_STATE)"};
-const Parameter kUrl = {"--url", &Arguments::url,
+const Parameter kState = {"--state DIR", &Arguments::state_dir,
+                          "State directory of a device on this machine"};
+const Parameter kUrl = {"--url URL", &Arguments::url,
                         "Where a device is served: http://... or https://..."};
-const Parameter kCaFile = {"--ca-file", &Arguments::tls_ca_file,
+const Parameter kCaFile = {"--ca-file PEM", &Arguments::tls_ca_file,
                            "PEM file of the only CAs to trust for https (default: the system's)"};
 const Parameter kExisting = {"--existing", &Arguments::must_exist,
                              "Make no device where there is none"};
-const Parameter kDsi = {"--dsi", &Arguments::dsi_file,
+const Parameter kDsi = {"--dsi FILE", &Arguments::dsi_file,
                         "Device state document (default: the one kept in the home)"};
-const Parameter kDsiOut = {"--dsi-out", &Arguments::dsi_out_file,
+const Parameter kDsiOut = {"--dsi-out FILE", &Arguments::dsi_out_file,
                            "Write the device state document here"};
 const Parameter kKnownDevice = {
     "--device", &Arguments::device_file,
@@ -192,7 +192,7 @@ const Command kImageCommands[] = {
      run_image_pack,
      "Put a TA image header before any file",
      {{"FILE", &Arguments::input_file, "The file to wrap"},
-      {"-o,--output", &Arguments::output_file, "The image", true}},
+      {"-o,--output FILE", &Arguments::output_file, "The image", true}},
      "image pack app.ta -o app.img"},
     {"show",
      run_image_show,
@@ -212,7 +212,8 @@ const Command kDeviceCommands[] = {
        "Device file: what `otrp-device info` prints; alone, or for the device at --url"},
       kCaFile,
       kExisting,
-      {"--list", &Arguments::list_file, "File with a line for each device: NAME --state DIR, ..."},
+      {"--list FILE", &Arguments::list_file,
+       "File with a line for each device: NAME --state DIR, ..."},
       kJobs},
      "device add kitchen --url https://10.0.0.7 --device kitchen.json"},
     {"list",
@@ -231,8 +232,8 @@ const Command kCommands[] = {
     {"init",
      run_init,
      "Make this TSM: its key, admitted by the CA-TSM",
-     {{"--tsmid", &Arguments::tsmid, "This TSM's ID (default: a random one)"},
-      {"--ca", &Arguments::ca_file,
+     {{"--tsmid ID", &Arguments::tsmid, "This TSM's ID (default: a random one)"},
+      {"--ca PEM", &Arguments::ca_file,
        "PEM file of the CA-TSM's private key (default: the development key)"}},
      "init --tsmid tsm1"},
     {"request",
@@ -241,7 +242,7 @@ const Command kCommands[] = {
      {kDevice,
       kOn,
       kDsi,
-      {"-o,--output", &Arguments::output_file, "Where to write it (default: -)"}},
+      {"-o,--output FILE", &Arguments::output_file, "Where to write it (default: -)"}},
      "request get-device-state --device device.json > request.json",
      {},
      "request --device device.json "},
@@ -251,7 +252,7 @@ const Command kCommands[] = {
      {{"RESPONSE", &Arguments::response_file, "The device's response"},
       kDevice,
       kOn,
-      {"--request", &Arguments::request_file,
+      {"--request FILE", &Arguments::request_file,
        "The request that it answers (default: one of those that wait for an answer)"},
       {"--accept-old", &Arguments::accept_old,
        "Take a response that was not asked for, or that brings an older state"},
@@ -265,7 +266,8 @@ const Command kCommands[] = {
      run_manage,
      "Request, send and read the response",
      {kOn,
-      kState,
+      {kState.names, kState.value,
+       "State directory of a device on this machine (default: $OTRP_STATE)"},
       kUrl,
       kKnownDevice,
       kCaFile,
@@ -273,7 +275,7 @@ const Command kCommands[] = {
       kJobs,
       kTrace,
       kDsiOut,
-      {"--image-out", &Arguments::image_out_file,
+      {"--image-out FILE", &Arguments::image_out_file,
        "Write the TA image that the device hands back here"},
       kJson},
      "manage --state ./device get-device-state",
@@ -294,7 +296,7 @@ const Command kCommands[] = {
      "Show the last known state of devices as a tree",
      {kDevice,
       kOn,
-      {"--dsi", &Arguments::dsi_file, "Show this device state document"},
+      {"--dsi FILE", &Arguments::dsi_file, "Show this device state document"},
       {"--summary", &Arguments::summary, "Count the devices that hold the same"},
       kJson},
      "show --device device.json"},
@@ -302,11 +304,11 @@ const Command kCommands[] = {
      run_inspect,
      "Say what messages are, check by check, with the keys there are",
      {{"FILE", &Arguments::input_files, "A message, a frame, or an exchange of docs/examples"},
-      {"--key", &Arguments::key_files,
+      {"--key FILE", &Arguments::key_files,
        "PEM file of a key; tsm=, ca=, tee= or aik= before it says whose"},
       kDevice,
       kOn,
-      {"--dsi", &Arguments::dsi_file, "Device state document that requests were made for"},
+      {"--dsi FILE", &Arguments::dsi_file, "Device state document that requests were made for"},
       kJson},
      "inspect request.json --device device.json"},
     {"explain",
@@ -343,11 +345,14 @@ CLI::Option *add_value(CLI::App *app, const std::string &names, std::vector<std:
 
 void add_parameter(CLI::App *app, const Parameter &parameter, Arguments *arguments) {
   std::string names = parameter.names;
+  const size_t blank = names.find(' ');
+  const std::string kind = blank == std::string::npos ? "" : names.substr(blank + 1);
+  names.resize(std::min(blank, names.size()));
   const bool may_be_left_out = names.starts_with('[') || names.starts_with('-');
   if (names.starts_with('[')) names = names.substr(1, names.size() - 2);
   const auto add = [&](auto value) { return add_value(app, names, arguments->*value); };
   CLI::Option *option = std::visit(add, parameter.value);
-  option->description(parameter.help);
+  option->description(parameter.help)->type_name(kind);
   option->required(parameter.is_required || !may_be_left_out);
 }
 
@@ -386,6 +391,7 @@ int parse_and_run(std::span<char *> words) {
   Arguments arguments;
   app.set_version_flag("--version", std::string(kProgram) + " " + OTRP_VERSION);
   app.add_option("--home", arguments.home, "This TSM's home directory")
+      ->type_name("DIR")
       ->capture_default_str()
       ->envname("OTRP_HOME");
   const Command *chosen = nullptr;

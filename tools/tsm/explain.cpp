@@ -2,6 +2,7 @@
 #include "tsm/explain.h"
 
 #include "common/files.h"
+#include "common/near_miss.h"
 #include "common/result_names.h"
 #include "tsm/json.h"
 
@@ -13,9 +14,13 @@ using tools::ResultName;
 const ResultName &find_code(const std::string &text) {
   const ResultName *result = tools::find_result_by_text(text);
   if (result != nullptr) return *result;
-  throw tools::UsageError("no result code is called \"" + text +
-                          "\": expected a number such as 0xdead0001 or 3735879681, a name such as "
-                          "OTRP_DSI_MISMATCH, or all");
+  std::vector<std::string> names;
+  for (const ResultName &known : tools::result_names()) names.emplace_back(known.name);
+  throw tools::UsageError(
+      "no result code is called \"" + text + "\": " +
+      tools::suggestion(text, names,
+                        "expected a number such as 0xdead0001 or 3735879681, a name such as "
+                        "OTRP_DSI_MISMATCH, or all"));
 }
 
 std::vector<ResultName> find_codes(const std::vector<std::string> &texts) {

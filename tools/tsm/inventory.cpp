@@ -6,6 +6,7 @@
 #include <algorithm>
 
 #include "common/files.h"
+#include "common/near_miss.h"
 
 namespace tsm {
 namespace {
@@ -53,6 +54,12 @@ std::vector<InventoryEntry> values_of(const Entries &entries) {
   std::vector<InventoryEntry> values;
   for (const auto &[name, entry] : entries) values.push_back(entry);
   return values;
+}
+
+std::vector<std::string> names_of(const Entries &entries) {
+  std::vector<std::string> names;
+  for (const auto &[name, entry] : entries) names.push_back(name);
+  return names;
 }
 
 }  // namespace
@@ -121,8 +128,9 @@ std::vector<InventoryEntry> Inventory::select(const std::vector<std::string> &pa
     }
     if (is_met) continue;
     throw UsageError("no device is called \"" + pattern + "\"" +
-                     (is_pattern(pattern) ? " or alike" : "") +
-                     ": expected a name that `otrp-tsm device list` shows");
+                     (is_pattern(pattern) ? " or alike" : "") + ": " +
+                     tools::suggestion(pattern, names_of(entries_),
+                                       "expected a name that `otrp-tsm device list` shows"));
   }
   return values_of(selected);
 }
