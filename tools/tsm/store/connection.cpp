@@ -1,0 +1,77 @@
+// SPDX-License-Identifier: BSD-2-Clause
+#include "tsm/store/connection.h"
+
+namespace tsm {
+
+using soci::into;
+using soci::use;
+
+void Connection::prepare() {
+  StoredDevice &d = device_;
+  find_ = std::make_unique<soci::statement>(
+      (sql.prepare << "SELECT d.tee_key, d.device_group, COALESCE(g.plan, ''), d.version, d.state, "
+                      "d.progress, d.outcome, d.outcome_plan, d.reason, d.seen, d.open_message, "
+                      "d.open_request, d.deadline FROM devices d "
+                      "LEFT JOIN device_groups g ON g.name = d.device_group "
+                      "WHERE d.device_id = :device_id",
+       use(d.device_id, "device_id"), into(d.key), into(d.group), into(d.plan), into(version_),
+       into(d.state), into(d.progress), into(d.outcome), into(d.outcome_plan), into(d.reason),
+       into(seen_), into(d.open_message), into(d.open_request), into(deadline_)));
+  update_ = std::make_unique<soci::statement>(
+      (sql.prepare << "UPDATE devices SET version = version + 1, state = :state, "
+                      "progress = :progress, outcome = :outcome, outcome_plan = :outcome_plan, "
+                      "reason = :reason, seen = :seen, open_message = :open_message, "
+                      "open_request = :open_request, deadline = :deadline "
+                      "WHERE device_id = :device_id AND version = :version",
+       use(d.state, "state"), use(d.progress, "progress"), use(d.outcome, "outcome"),
+       use(d.outcome_plan, "outcome_plan"), use(d.reason, "reason"), use(seen_, "seen"),
+       use(d.open_message, "open_message"), use(d.open_request, "open_request"),
+       use(deadline_, "deadline"), use(d.device_id, "device_id"), use(version_, "version")));
+  insert_ = std::make_unique<soci::statement>(
+      (sql.prepare << "INSERT INTO events (device_id, number, time, message, outcome, reason, "
+                      "next_message) VALUES (:device_id, :number, :time, :message, :outcome, "
+                      ":reason, :next_message)",
+       use(event_.device_id, "device_id"), use(number_, "number"), use(time_, "time"),
+       use(event_.message, "message"), use(event_.outcome, "outcome"), use(event_.reason, "reason"),
+       use(event_.next, "next_message")));
+  prune_ = std::make_unique<soci::statement>(
+      (sql.prepare << "DELETE FROM events WHERE device_id = :device_id AND number <= :number",
+       use(event_.device_id, "device_id"), use(number_, "number")));
+}
+
+bool Connection::find(const std::string &device_id, StoredDevice *device) {
+  device_.device_id = device_id;
+  if (!find_->execute(true)) return false;
+  *device = device_;
+  device->version = version_;
+  device->seen = seen_;
+  device->deadline = deadline_;
+  // To its end: a query that is left half way would hold its view of the database.
+  while (find_->fetch()) {
+  }
+  return true;
+}
+
+bool Connection::update(const StoredDevice &device) {
+  device_ = device;
+  version_ = device.version;
+  seen_ = device.seen;
+  deadline_ = device.deadline;
+  update_->execute(true);
+  return update_->get_affected_rows() == 1;
+}
+
+void Connection::insert(const Event &event) {
+  event_ = event;
+  number_ = event.number;
+  time_ = event.time;
+  insert_->execute(true);
+}
+
+void Connection::prune_events(const std::string &device_id, int64_t last_number) {
+  event_.device_id = device_id;
+  number_ = last_number;
+  prune_->execute(true);
+}
+
+}  // namespace tsm

@@ -1,0 +1,50 @@
+// SPDX-License-Identifier: BSD-2-Clause
+/// What each exchange does, prepared once for each connection.
+#ifndef TSM_STORE_CONNECTION_H
+#define TSM_STORE_CONNECTION_H
+
+#include <soci/soci.h>
+
+#include <memory>
+#include <string>
+
+#include "tsm/store/store.h"
+
+namespace tsm {
+
+class Connection {
+ public:
+  Connection() = default;
+  Connection(const Connection &) = delete;
+  Connection &operator=(const Connection &) = delete;
+
+  soci::session sql;
+
+  /// Once `sql` is open.
+  void prepare();
+
+  bool find(const std::string &device_id, StoredDevice *device);
+
+  /// Inside a transaction; false when the row has another version by now.
+  bool update(const StoredDevice &device);
+  void insert(const Event &event);
+  void prune_events(const std::string &device_id, int64_t last_number);
+
+ private:
+  // Statements are bound to these, and a connection is used by one thread at a time.
+  StoredDevice device_;
+  Event event_;
+  long long version_ = 0;
+  long long number_ = 0;
+  long long seen_ = 0;
+  long long deadline_ = 0;
+  long long time_ = 0;
+  std::unique_ptr<soci::statement> find_;
+  std::unique_ptr<soci::statement> update_;
+  std::unique_ptr<soci::statement> insert_;
+  std::unique_ptr<soci::statement> prune_;
+};
+
+}  // namespace tsm
+
+#endif

@@ -1,0 +1,60 @@
+// SPDX-License-Identifier: BSD-2-Clause
+/// The tables, in the SQL that both databases know.
+#ifndef TSM_STORE_SCHEMA_H
+#define TSM_STORE_SCHEMA_H
+
+namespace tsm {
+
+constexpr int kSchemaFormat = 1;
+
+constexpr const char *kSchema[] = {
+    "CREATE TABLE IF NOT EXISTS store_format ("
+    "  only_one INTEGER PRIMARY KEY,"
+    "  format INTEGER NOT NULL)",
+
+    "CREATE TABLE IF NOT EXISTS plans ("
+    "  digest TEXT PRIMARY KEY,"
+    "  document TEXT NOT NULL)",
+
+    "CREATE TABLE IF NOT EXISTS images ("
+    "  digest TEXT PRIMARY KEY,"
+    "  base64 TEXT NOT NULL)",
+
+    "CREATE TABLE IF NOT EXISTS device_groups ("
+    "  name TEXT PRIMARY KEY,"
+    "  plan TEXT NOT NULL)",
+
+    "CREATE TABLE IF NOT EXISTS devices ("
+    "  device_id TEXT PRIMARY KEY,"
+    "  tee_key TEXT NOT NULL,"
+    "  device_group TEXT NOT NULL,"
+    "  version BIGINT NOT NULL DEFAULT 0,"
+    "  state TEXT NOT NULL DEFAULT '',"
+    "  progress TEXT NOT NULL DEFAULT '',"
+    "  outcome TEXT NOT NULL DEFAULT '',"
+    "  outcome_plan TEXT NOT NULL DEFAULT '',"
+    "  reason TEXT NOT NULL DEFAULT '',"
+    "  seen BIGINT NOT NULL DEFAULT 0,"
+    "  open_message TEXT NOT NULL DEFAULT '',"
+    "  open_request TEXT NOT NULL DEFAULT '',"
+    "  deadline BIGINT NOT NULL DEFAULT 0)",
+
+    // For counting: neither reads a row of a device.
+    "CREATE INDEX IF NOT EXISTS devices_by_outcome"
+    "  ON devices (device_group, outcome, outcome_plan)",
+    "CREATE INDEX IF NOT EXISTS devices_that_owe ON devices (deadline) WHERE deadline > 0",
+
+    "CREATE TABLE IF NOT EXISTS events ("
+    "  device_id TEXT NOT NULL,"
+    "  number BIGINT NOT NULL,"
+    "  time BIGINT NOT NULL,"
+    "  message TEXT NOT NULL,"
+    "  outcome TEXT NOT NULL,"
+    "  reason TEXT NOT NULL,"
+    "  next_message TEXT NOT NULL,"
+    "  PRIMARY KEY (device_id, number))",
+};
+
+}  // namespace tsm
+
+#endif
