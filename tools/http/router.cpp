@@ -18,6 +18,12 @@ bool has_type(const Request &request, const std::vector<std::string> &types) {
   return std::ranges::any_of(types, [&](const std::string &t) { return same_word(t, name); });
 }
 
+bool is_empty(const Request &request) {
+  const std::string *len = find_header(request.headers, "Content-Length");
+  const bool has_len = len != nullptr && len->find_first_not_of('0') != len->npos;
+  return !has_len && find_header(request.headers, "Transfer-Encoding") == nullptr;
+}
+
 /// What is compressed would not tell its length before it is read.
 bool is_plain(const Request &request) {
   const std::string *coding = find_header(request.headers, "Content-Encoding");
@@ -76,7 +82,8 @@ std::optional<Answer> Router::answer_early(const Request &head) {
   Captures captures;
   const Route *route = find(head, captures);
   if (route == nullptr) return unknown(head);
-  if (!route->types.empty() && !(has_type(head, route->types) && is_plain(head))) {
+  const bool needs_type = !route->types.empty() && !(route->may_be_empty && is_empty(head));
+  if (needs_type && !(has_type(head, route->types) && is_plain(head))) {
     return wrong_type(*route);
   }
   if (route->is_early) return route->answer(head, captures);

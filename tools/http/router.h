@@ -26,6 +26,7 @@ struct Route {
   /// Media types of the body. Without any, a body is not read. Those that a web page can send to
   /// any address without being asked (text/plain, forms) should not be among them.
   std::vector<std::string> types = {};
+  bool may_be_empty = false;  // no body needs no type
   /// Answers as Handler::answer_early does, not by a worker.
   bool is_early = false;
   std::function<Answer(const Request &, const Captures &)> answer;
