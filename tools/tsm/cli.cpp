@@ -144,7 +144,8 @@ void add_message_options(CLI::App *command, const MessageHelp &help, Arguments *
 struct Parameter {
   const char *names;
   std::variant<std::string Arguments::*, std::vector<std::string> Arguments::*, bool Arguments::*,
-               unsigned Arguments::*>
+               unsigned Arguments::*, std::string ServeArguments::*,
+               std::vector<std::string> ServeArguments::*>
       value;
   const char *help;
   bool is_required = false;
@@ -180,11 +181,15 @@ const Parameter kDsi = {"--dsi FILE", &Arguments::dsi_file,
 const Parameter kDsiOut = {"--dsi-out FILE", &Arguments::dsi_out_file,
                            "Write the device state document here"};
 const Parameter kKnownDevice = {
-    "--device", &Arguments::device_file,
+    "--device FILE", &Arguments::device_file,
     "Device file that says who the device is (default: what this TSM knows of it)"};
 const Parameter kTrace = {"--trace", &Arguments::trace,
                           "Show all that the agent logs (else what it logs of a failure)"};
 const Parameter kPlan = {"PLAN", &Arguments::plan_file, "File that says what a device should hold"};
+const Parameter kStore = {
+    "--store URI", &Arguments::store,
+    "Database of the fleet: sqlite:FILE or postgresql://... (default: sqlite:HOME/fleet.db)"};
+const Parameter kGroup = {"--group NAME", &Arguments::group, "Group of devices (default: default)"};
 const Parameter kJson = {"--json", &Arguments::json, "Print JSON"};
 
 const Command kImageCommands[] = {
@@ -318,6 +323,42 @@ const Command kCommands[] = {
        "0xdead0001, 3735879681, OTRP_DSI_MISMATCH, dsi_mismatch; or all"},
       kJson},
      "explain 0xdead0001"},
+    {"enrol",
+     run_enrol,
+     "Let devices call this TSM's servers",
+     {{"FILE", &Arguments::input_files, "A device file, or a file with one in each line"},
+      kGroup,
+      kStore},
+     "enrol device.json"},
+    {"assign",
+     run_assign,
+     "Say what the devices of a group should hold",
+     {{"PLAN", &Arguments::input_file, "The plan"}, kGroup, kStore},
+     "assign plan.json --group shop"},
+    {"serve",
+     run_serve,
+     "Answer devices that call, until SIGTERM or SIGINT",
+     {{"--listen ADDRESS:PORT", &ServeArguments::listen,
+       "Where to listen (default: 127.0.0.1:8090; port 0: any that is free)"},
+      {"--plan FILE", &ServeArguments::plan,
+       "Plan of the devices of no other group, as if assigned now"},
+      kStore,
+      {"--allow-host HOST", &ServeArguments::allowed_hosts,
+       "Serve requests to this host, too; repeatable (always: localhost and the address itself)"},
+      {"--tls-cert FILE", &ServeArguments::tls_cert,
+       "Serve https, with this certificate and chain"},
+      {"--tls-key FILE", &ServeArguments::tls_key, "Key of the certificate"},
+      {"--deadline SECONDS", &ServeArguments::deadline,
+       "When an answer comes too late (default: 600)"},
+      {"--max-body BYTES", &ServeArguments::max_body, "The longest answer (default: 8 MiB)"},
+      {"--max-connections N", &ServeArguments::max_connections, "Most connections (default: 1000)"},
+      {"--max-per-address N", &ServeArguments::max_per_address,
+       "Most connections from one address, a proxy's, say (default: 250)"},
+      {"--workers N", &ServeArguments::workers,
+       "Devices that are answered at once (default: the number of processors)"},
+      {"--log FORMAT", &ServeArguments::log,
+       "A line for each request, text or json (default: text)"}},
+     "serve --plan plan.json"},
 };
 
 CLI::App *add_command(CLI::App *parent, const std::string &name, const std::string &description,
@@ -343,6 +384,15 @@ CLI::Option *add_value(CLI::App *app, const std::string &names, std::vector<std:
   return names.starts_with('-') ? option->allow_extra_args(false) : option;
 }
 
+template <class Value>
+Value &member_of(Arguments *arguments, Value Arguments::*member) {
+  return arguments->*member;
+}
+template <class Value>
+Value &member_of(Arguments *arguments, Value ServeArguments::*member) {
+  return arguments->serve.*member;
+}
+
 void add_parameter(CLI::App *app, const Parameter &parameter, Arguments *arguments) {
   std::string names = parameter.names;
   const size_t blank = names.find(' ');
@@ -350,7 +400,7 @@ void add_parameter(CLI::App *app, const Parameter &parameter, Arguments *argumen
   names.resize(std::min(blank, names.size()));
   const bool may_be_left_out = names.starts_with('[') || names.starts_with('-');
   if (names.starts_with('[')) names = names.substr(1, names.size() - 2);
-  const auto add = [&](auto value) { return add_value(app, names, arguments->*value); };
+  const auto add = [&](auto value) { return add_value(app, names, member_of(arguments, value)); };
   CLI::Option *option = std::visit(add, parameter.value);
   option->description(parameter.help)->type_name(kind);
   option->required(parameter.is_required || !may_be_left_out);

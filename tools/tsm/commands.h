@@ -14,6 +14,21 @@ namespace tsm {
 
 constexpr int kExitNotVerified = 3;
 
+/// How devices that call are served. Numbers are texts; empty: the default.
+struct ServeArguments {
+  std::string listen = "127.0.0.1:8090";
+  std::string plan;
+  std::string tls_cert;
+  std::string tls_key;
+  std::vector<std::string> allowed_hosts;
+  std::string deadline;
+  std::string workers;
+  std::string max_body;
+  std::string max_connections;
+  std::string max_per_address;
+  std::string log = "text";
+};
+
 /// The command line, read. Files are named by path, "-" for a standard stream.
 struct Arguments {
   std::string home = "./tsm";
@@ -47,6 +62,9 @@ struct Arguments {
   unsigned num_jobs = 1;  // at once
   MessageId message = MessageId::kGetDeviceState;
   RequestOptions request;
+  std::string store;  // of a fleet; empty: in the home
+  std::string group;
+  ServeArguments serve;
 };
 
 int run_init(const Arguments &arguments);
@@ -61,6 +79,9 @@ int run_apply(const Arguments &arguments);
 int run_device_add(const Arguments &arguments);
 int run_device_list(const Arguments &arguments);
 int run_device_remove(const Arguments &arguments);
+int run_enrol(const Arguments &arguments);
+int run_assign(const Arguments &arguments);
+int run_serve(const Arguments &arguments);
 
 }  // namespace tsm
 
