@@ -43,7 +43,7 @@ TEST(Wiping, NoSecretIsLeftInMemoryThatIsGivenBack) {
     EXPECT_GT(num_blocks, 100u);
     device.device.close();
   }
-  tee::test::reuse_generated_keys(0);
+  tee::test::reuse_generated_keys(8);
 }
 
 }  // namespace

@@ -65,13 +65,11 @@ std::map<std::string, std::string> any_box() {
 class StoredState : public testing::Test {
  protected:
   void SetUp() override {
-    tee::test::reuse_generated_keys(7);
     scene.furnish();
     ASSERT_TRUE(scene.device.restart());
     ASSERT_TRUE(scene.get_device_state().passed());
     snapshot = scene.device.snapshot();
   }
-  void TearDown() override { tee::test::reuse_generated_keys(0); }
 
   /// Spoils one record and asks everything, each on a device of its own.
   void try_all(const std::string &id, const std::string &name, const std::string &data) {

@@ -319,11 +319,7 @@ class Sweep::Driver {
   std::set<std::string> final_;
 };
 
-Sweep::Sweep(const Scenario &scenario) {
-  // Once: each call would begin with new keys.
-  [[maybe_unused]] static const bool is_reusing = (tee::test::reuse_generated_keys(7), true);
-  driver_ = std::make_unique<Driver>(scenario);
-}
+Sweep::Sweep(const Scenario &scenario) : driver_(std::make_unique<Driver>(scenario)) {}
 
 Sweep::~Sweep() = default;
 

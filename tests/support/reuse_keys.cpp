@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: BSD-2-Clause
-// Linked into test programs that are emulated: finding RSA keys would be most of their work. More
-// keys than a test has at a time, so that those which it compares still differ.
+// Linked into test programs: finding RSA keys would be most of their work. More keys than a test
+// compares, so that those still differ.
 #include <tee_test.h>
 
-[[maybe_unused]] static const bool is_reusing = (tee::test::reuse_generated_keys(16), true);
+[[maybe_unused]] static const bool is_reusing = (tee::test::reuse_generated_keys(8), true);
