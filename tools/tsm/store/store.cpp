@@ -23,22 +23,36 @@ std::optional<std::string> find_text(Database *database, const char *query,
   });
 }
 
-/// Inside a transaction.
-void enrol_one(soci::session &sql, const EnrolledDevice &device, const std::string &group) {
-  soci::statement insert =
-      (sql.prepare << "INSERT INTO devices (device_id, tee_key, device_group) "
-                      "VALUES (:id, :key, :device_group) ON CONFLICT (device_id) DO NOTHING",
-       use(device.device_id, "id"), use(device.key, "key"), use(group, "device_group"));
-  insert.execute(true);
-  if (insert.get_affected_rows() == 1) return;
-  soci::statement update =
-      (sql.prepare << "UPDATE devices SET device_group = :device_group "
-                      "WHERE device_id = :id AND tee_key = :key",
-       use(group, "device_group"), use(device.device_id, "id"), use(device.key, "key"));
-  update.execute(true);
-  if (update.get_affected_rows() == 1) return;
-  throw tools::UsageError("device \"" + device.device_id + "\" is enrolled with another key");
-}
+/// Inside a transaction, one device after the other.
+class Enrolment {
+ public:
+  Enrolment(soci::session &sql, const std::string &group)
+      : insert_((sql.prepare << "INSERT INTO devices (device_id, tee_key, device_group) "
+                                "VALUES (:id, :key, :device_group) "
+                                "ON CONFLICT (device_id) DO NOTHING",
+                 use(device_.device_id, "id"), use(device_.key, "key"),
+                 use(group, "device_group"))),
+        update_((sql.prepare << "UPDATE devices SET device_group = :device_group "
+                                "WHERE device_id = :id AND tee_key = :key",
+                 use(group, "device_group"), use(device_.device_id, "id"),
+                 use(device_.key, "key"))) {}
+  Enrolment(const Enrolment &) = delete;
+  Enrolment &operator=(const Enrolment &) = delete;
+
+  void add(const EnrolledDevice &device) {
+    device_ = device;
+    insert_.execute(true);
+    if (insert_.get_affected_rows() == 1) return;
+    update_.execute(true);
+    if (update_.get_affected_rows() == 1) return;
+    throw tools::UsageError("device \"" + device.device_id + "\" is enrolled with another key");
+  }
+
+ private:
+  EnrolledDevice device_;  // the statements are bound to it
+  soci::statement insert_;
+  soci::statement update_;
+};
 
 }  // namespace
 
@@ -60,7 +74,8 @@ bool Store::save(const StoredDevice &device, Event event) {
     soci::transaction transaction(connection.sql);
     if (!connection.update(device)) return false;  // rolled back
     connection.insert(event);
-    connection.prune_events(device.device_id, event.number - int64_t{kNumKeptEvents});
+    const int64_t last_number = event.number - int64_t{kNumKeptEvents};
+    if (last_number > 0) connection.prune_events(device.device_id, last_number);
     transaction.commit();
     return true;
   });
@@ -91,7 +106,8 @@ void Store::enrol(const std::vector<EnrolledDevice> &devices, const std::string 
   const auto turn = database_->writers_turn();
   database_->with([&](Connection &connection) {
     soci::transaction transaction(connection.sql);
-    for (const EnrolledDevice &device : devices) enrol_one(connection.sql, device, group);
+    Enrolment enrolment(connection.sql, group);
+    for (const EnrolledDevice &device : devices) enrolment.add(device);
     transaction.commit();
     return true;
   });
