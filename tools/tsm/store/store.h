@@ -2,8 +2,7 @@
 /// What servers know of a fleet, in a database that any number of them share.
 ///
 ///     devices        one row a device: who it is, what it holds, how far it is, and the one
-///     message
-///                    that waits for its answer
+///                    message that waits for its answer
 ///     events         the last things that happened to a device, numbered by its versions
 ///     device_groups  which plan the devices of a group are to be brought to
 ///     plans, images  by their SHA-256 digests, whole, so that each server has them
