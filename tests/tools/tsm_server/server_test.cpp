@@ -36,10 +36,10 @@ const otrp_test::Snapshot &new_device() {
 }
 
 Plan usual_plan(const std::string &version = "1") {
-  const auto app = [&](const char *name) {
-    return PlannedApp{otrp_test::taid(name), version, make_image(3000)};
+  const auto app = [](const char *name, const std::string &its_version) {
+    return PlannedApp{otrp_test::taid(name), its_version, make_image(3000)};
   };
-  return {.domains = {{"wallet", "bank", "cert", {app("pay"), app("save")}},
+  return {.domains = {{"wallet", "bank", "cert", {app("pay", version), app("save", "1")}},
                       {"tickets", "bank", "cert", {}}}};
 }
 
@@ -147,7 +147,8 @@ TEST(TsmServer, ADeviceIsBroughtToItsPlanByServersInTurn) {
   fleet.stores[0].assign(stored_plan(usual_plan("2")), kDefaultGroup);
   EXPECT_THAT(fleet.metrics(), HasSubstr("otrp_devices{state=\"behind\"} 1\n"));
   EXPECT_EQ(fleet.call().reason, "");
-  EXPECT_EQ(fleet.executed["update-ta pass"], 2);
+  EXPECT_EQ(fleet.executed["update-ta pass"], 1);
+  EXPECT_EQ(fleet.executed["get-device-state pass"], 3) << "once before, and twice now";
   EXPECT_EQ(fleet.row().outcome, "current");
   EXPECT_EQ(fleet.row().plan, fleet.row().outcome_plan);
 
