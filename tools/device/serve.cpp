@@ -73,6 +73,7 @@ http::ListenOptions listen_options(const ServeArguments &arguments) {
 void serve_device(const ServeArguments &arguments) {
   const http::Endpoint endpoint = http::parse_endpoint(arguments.listen);
   http::ListenOptions options = listen_options(arguments);
+  http::check_tls(options);
   http::Server server(server_options(arguments));
   StateDevice device(arguments.state_directory, arguments.must_exist);
   HttpService service(device, arguments.state_directory, arguments.trace);

@@ -688,6 +688,10 @@ void Server::Loop::stop() {
   asio::post(io_, [this] { end(); });
 }
 
+void check_tls(const ListenOptions &options) {
+  (void)make_tls(options);
+}
+
 Server::Server(ServerOptions options) : loop_(std::make_unique<Loop>(std::move(options))) {}
 Server::~Server() = default;
 

@@ -66,6 +66,10 @@ struct ListenOptions {
   bool allows_own_pages = false;                // requests whose Origin is their Host
 };
 
+/// Throws tools::UsageError for TLS files that listen() could not use: for whoever does something
+/// before that which wrong files should not begin.
+void check_tls(const ListenOptions &options);
+
 class Server {
  public:
   explicit Server(ServerOptions options);
