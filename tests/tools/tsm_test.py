@@ -10,7 +10,9 @@ import hashlib
 import http.server
 import json
 import os
+import resource
 import shutil
+import signal
 import subprocess
 import tempfile
 import threading
@@ -518,6 +520,24 @@ class Streams(Operator):
         self.assertEqual([name for name in os.listdir(self.path("d")) if b"OTrP" in self.read("d/" + name)
                           or b"device_id" in self.read("d/" + name)], [])
         self.manage("get-device-state")
+
+    def test_no_core_is_dumped_with_keys_in_it(self):
+        def dumps_core(words):
+            unlimited = (resource.RLIM_INFINITY, resource.RLIM_INFINITY)
+            with subprocess.Popen(
+                    words, cwd=self.folder, stdin=subprocess.PIPE, stdout=subprocess.PIPE,
+                    env=os.environ | {"ASAN_OPTIONS": "disable_coredump=0"},
+                    preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_CORE, unlimited)) as process:
+                process.stdin.write(b"reopen\n")
+                process.stdin.flush()
+                process.stdout.readline()
+                os.kill(process.pid, signal.SIGQUIT)
+                _, status = os.waitpid(process.pid, 0)
+                process.returncode = os.waitstatus_to_exitcode(status)
+            return os.WCOREDUMP(status)
+        if len(DEVICE) > 1 or not dumps_core(["cat"]):  # the emulator is no program of ours
+            self.skipTest("nothing dumps core here")
+        self.assertFalse(dumps_core(DEVICE + ["--state", "d", "session"]))
 
     def test_no_answer_is_lost(self):
         for name in ("one", "two"):
