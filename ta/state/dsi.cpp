@@ -252,46 +252,50 @@ dsi_json_str_t *init_dsi() {
 
 // ---- The document
 
-// A copy of `list` as a member of `into`; `-1`, the setter's status, when it cannot be set.
-static TEE_Result set_copy(JSON_Object *into, const char *key, const JSON_Value *list,
-                           const char *no_memory, const char *as = __builtin_FUNCTION()) {
-  json_ptr copy(json_value_deep_copy(list));
-  CHECK_AS(as, copy, TEE_ERROR_OUT_OF_MEMORY, "%s", no_memory);
-  return static_cast<TEE_Result>(json_object_take(into, key, &copy));
+// Makes `*list` a member of `into`; the setter's status when it cannot.
+static TEE_Result hand_over(JSON_Object *into, const char *key, JSON_Value **list) {
+  const JSON_Status set = json_object_set_value(into, key, *list);
+  if (set == JSONSuccess) *list = nullptr;
+  return static_cast<TEE_Result>(set);
 }
 
-static TEE_Result fill_sdlist_info(JSON_Object *tee, const JSON_Value *sdl) {
+static TEE_Result fill_sdlist_info(JSON_Object *tee, JSON_Value **sdl) {
   JSON_Object *sdlist = json_object_get_object(tee, "sdlist");
-  const size_t num_sds = json_array_get_count(json_value_get_array(sdl));
+  const size_t num_sds = json_array_get_count(json_value_get_array(*sdl));
   const JSON_Status set = json_object_set_number(sdlist, "cnt", static_cast<double>(num_sds));
   if (set != JSONSuccess) return static_cast<TEE_Result>(set);
-  return set_copy(sdlist, "sd", sdl, "No memory for dsi_sdl_copy");
+  return hand_over(sdlist, "sd", sdl);
 }
 
-static TEE_Result fill_teeaiklist_info(JSON_Object *tee, const JSON_Value *spl) {
-  const TEE_Result result =
-      set_copy(tee, "teeaiklist", spl, "fill_teeaiklist_info json_value_deep_copy fail");
-  CHECK(result == TEE_SUCCESS || result == TEE_ERROR_OUT_OF_MEMORY, TEE_ERROR_OUT_OF_MEMORY,
+static TEE_Result fill_teeaiklist_info(JSON_Object *tee, JSON_Value **spl) {
+  CHECK(hand_over(tee, "teeaiklist", spl) == TEE_SUCCESS, TEE_ERROR_OUT_OF_MEMORY,
         "fill_teeaiklist_info json_object_set_value teeaiklist fail");
-  return result;
+  return TEE_SUCCESS;
+}
+
+// The document gets the lists themselves.
+static JSON_Value *make_document(dsi_t *lists, const char *as = __builtin_FUNCTION()) {
+  json_ptr document(json_parse_string(kDsiTemplate));
+  JSON_Object *object = json_value_get_object(document.get());
+  CHECK_AS(as, document && object != nullptr && lists != nullptr, nullptr,
+           "malloc dsi_value %p dsi_object %p dsi %p\n", static_cast<void *>(document.get()),
+           static_cast<void *>(object), static_cast<void *>(lists));
+
+  JSON_Object *tee = json_object_get_object(json_object_get_object(object, "dsi"), "tee");
+  TEE_Result result = fill_sdlist_info(tee, &lists->sdl);
+  CHECK_AS(as, result == TEE_SUCCESS, nullptr, "fill_sdlist_info faill 0x%x", result);
+  result = fill_teeaiklist_info(tee, &lists->spl);
+  CHECK_AS(as, result == TEE_SUCCESS, nullptr, "fill_teeaiklist_info faill 0x%x", result);
+  return document.release();
 }
 
 JSON_Value *dsi_get_json_dsi(const dsi_json_str_t *dsi) {
-  json_ptr document(json_parse_string(kDsiTemplate));
-  JSON_Object *object = json_value_get_object(document.get());
   const dsi_ptr working(allocate_zeroed<dsi_t>());
-  CHECK(document && object != nullptr && working, nullptr,
-        "malloc dsi_value %p dsi_object %p dsi %p\n", static_cast<void *>(document.get()),
-        static_cast<void *>(object), static_cast<void *>(working.get()));
-  TEE_Result result = dsi_json_str_2_dsi(dsi, working.get());
-  CHECK(result == TEE_SUCCESS, nullptr, "dsi_json_str_2_dsi error code: 0x%x", result);
-
-  JSON_Object *tee = json_object_get_object(json_object_get_object(object, "dsi"), "tee");
-  result = fill_sdlist_info(tee, working->sdl);
-  CHECK(result == TEE_SUCCESS, nullptr, "fill_sdlist_info faill 0x%x", result);
-  result = fill_teeaiklist_info(tee, working->spl);
-  CHECK(result == TEE_SUCCESS, nullptr, "fill_teeaiklist_info faill 0x%x", result);
-  return document.release();
+  if (working) {
+    const TEE_Result result = dsi_json_str_2_dsi(dsi, working.get());
+    CHECK(result == TEE_SUCCESS, nullptr, "dsi_json_str_2_dsi error code: 0x%x", result);
+  }
+  return make_document(working.get());
 }
 
 JSON_Value *construct_dsi() {
@@ -306,8 +310,8 @@ JSON_Value *construct_dsi() {
 
 // ---- Its hash
 
-static char *dsi_serialize_to_json() {
-  const json_ptr document(dsi_get_json_dsi(g_dsi));
+static char *dsi_serialize_to_json(dsi_t *lists) {
+  const json_ptr document(make_document(lists, "dsi_get_json_dsi"));
   CHECK(document, nullptr, "dsi_get_json_dsi error");
   return json_serialize_to_string(document.get());
 }
@@ -321,9 +325,9 @@ static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
 }
 
 // What a TSM hashes is what it got: the document in base64.
-static TEE_Result digest_dsi(uint8_t *digest, uint32_t digest_len,
+static TEE_Result digest_dsi(dsi_t *lists, uint8_t *digest, uint32_t digest_len,
                              const char *as = __builtin_FUNCTION()) {
-  const json_text text(dsi_serialize_to_json());
+  const json_text text(dsi_serialize_to_json(lists));
   CHECK_AS(as, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");
   const tee_ptr<char> encoded(base64EncodeAddEndZero(reinterpret_cast<const uint8_t *>(text.get()),
                                                      static_cast<uint32_t>(strlen(text.get()))));
@@ -335,11 +339,10 @@ static TEE_Result digest_dsi(uint8_t *digest, uint32_t digest_len,
 TEE_Result dsi_validate_dsi_hash(const dsi_json_str_t *dsi, const char *hash) {
   dsi_ptr working;
   TRY(open_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
-  working.reset();  // it was only to be seen that the texts parse
 
   const tee_ptr<uint8_t> digest(allocate_bytes(kSha256Len));
   CHECK(digest, TEE_ERROR_OUT_OF_MEMORY, "no memory for now_dsi_hash");
-  TRY(digest_dsi(digest.get(), kSha256Len));
+  TRY(digest_dsi(working.get(), digest.get(), kSha256Len));
   const tee_ptr<uint8_t> now(allocate_bytes(kHashTextLen));
   CHECK(now, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero now_dsi_hash error");
   write_hex(digest.get(), kSha256Len, reinterpret_cast<char *>(now.get()));
