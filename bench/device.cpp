@@ -116,6 +116,7 @@ Snapshot filled(const Snapshot &first, size_t num_sds) {
 
 std::shared_ptr<Scene> start(const Scene &first, const Snapshot &snapshot) {
   const auto scene = std::make_shared<Scene>(first, snapshot);
+  scene->capacity = kOutputLen;
   const bool started =
       scene->device.open() && Exchange(scene, message_case(MessageId::kGetDeviceState)).try_once();
   return started ? scene : nullptr;

@@ -1,40 +1,26 @@
 // SPDX-License-Identifier: BSD-2-Clause
 /// What is under an exchange: work that it cannot do without, straight in OpenSSL.
-///
-/// All private keys have their primes. What is worked on has the lengths of the real texts, and
-/// other bytes.
 #ifndef BENCH_FLOOR_H
 #define BENCH_FLOOR_H
 
-#include <functional>
 #include <string>
 #include <vector>
 
 #include "device.h"
+#include "rsa_works.h"
 
 namespace bench {
-
-using Work = std::function<void()>;
-
-enum class Keys {
-  kPrepared,  // with their contexts
-  kAtHand,    // a context is made for each operation
-  kNew,       // so is the key, of its numbers, as by a device that keeps none
-};
 
 enum class Depth {
   kCryptography,  // and nothing else, all keys and contexts prepared
   kWithCopies,    // and an image block by block, payload and image moved through the heap
-  kWithRules,     // as the agent has to do it: also with new keys, and each text tokenized once
+  kWithRules,     // as the agent has to do it: also with new keys, and each text read once
 };
 
 /// The work of an exchange that took place: of its request, its response, and the state document
 /// whose hash the request has.
 Work work_of(const MessageCase &message, const std::string &request, const std::string &response,
              size_t dsi_len, Depth depth);
-
-/// One pass of the tokenizer.
-Work reading_of(std::string text);
 
 /// Lengths of what an exchange verifies, decrypts, encrypts and signs.
 struct JoseParts {
