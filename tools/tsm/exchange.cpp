@@ -2,7 +2,6 @@
 #include "tsm/exchange.h"
 
 #include "common/files.h"
-#include "common/result_names.h"
 #include "tsm/dsi.h"
 
 namespace tsm {
@@ -23,10 +22,6 @@ struct Outputs {
   std::optional<tools::OutputFile> dsi;
   std::optional<tools::OutputFile> image;
 };
-
-bool quotes_dsi(MessageId id) {
-  return id != MessageId::kGetDeviceState && id != MessageId::kGetTaInfo;
-}
 
 void check_certificate(const Order &order, const std::optional<Json> &dsi) {
   const RequestOptions &options = order.options;
@@ -122,12 +117,6 @@ Exchange exchange(const Order &order, const Identity &tsm, Channel *channel, Dev
   }
   if (files.image) keep_image(order, &*files.image, &*done);
   return *done;
-}
-
-std::string refusal_of(const Response &response) {
-  if (!response.error_code) return "";
-  return "the device refused " + std::string(response.message->command) + ": " +
-         tools::describe_result(*response.error_code);
 }
 
 }  // namespace tsm

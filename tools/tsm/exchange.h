@@ -49,9 +49,6 @@ struct OutputNames {
 Exchange exchange(const Order &order, const Identity &tsm, Channel *channel, DeviceRecord *record,
                   const OutputNames &outputs = {});
 
-/// Why a verified response is a refusal, with its code; empty when it is none.
-std::string refusal_of(const Response &response);
-
 }  // namespace tsm
 
 #endif

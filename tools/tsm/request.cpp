@@ -49,6 +49,10 @@ std::string random_id() {
   return hex_encode(random_bytes(8));
 }
 
+bool quotes_dsi(MessageId id) {
+  return id != MessageId::kGetDeviceState && id != MessageId::kGetTaInfo;
+}
+
 Json request_content(MessageId id, const RequestOptions &options, std::string_view tsmid) {
   switch (id) {
     case MessageId::kInstallTa:

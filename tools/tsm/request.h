@@ -38,6 +38,9 @@ struct RequestOptions {
 /// For "rid" and "tid": 16 hex digits.
 std::string random_id();
 
+/// Whether a message is made for one state of the device, whose hash it carries.
+bool quotes_dsi(MessageId id);
+
 /// The members of the encrypted "content"; null for the messages that have none.
 Json request_content(MessageId id, const RequestOptions &options, std::string_view tsmid);
 

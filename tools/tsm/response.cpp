@@ -2,6 +2,7 @@
 #include "tsm/response.h"
 
 #include "common/error_line.h"
+#include "common/result_names.h"
 #include "tsm/dsi.h"
 #include "tsm/jwe.h"
 
@@ -135,6 +136,12 @@ Response open_response(std::string_view text, const ResponseKeys &keys) {
     reject("its status is neither pass nor fail");
   }
   return response;
+}
+
+std::string refusal_of(const Response &response) {
+  if (!response.error_code) return "";
+  return "the device refused " + std::string(response.message->command) + ": " +
+         tools::describe_result(*response.error_code);
 }
 
 }  // namespace tsm

@@ -2,22 +2,11 @@
 #include "tsm/server/visit.h"
 
 #include "common/error_line.h"
-#include "common/result_names.h"
 #include "tsm/dsi.h"
 #include "tsm/server/stored_progress.h"
 
 namespace tsm {
 namespace {
-
-bool quotes_state(MessageId id) {
-  return id != MessageId::kGetDeviceState && id != MessageId::kGetTaInfo;
-}
-
-std::string refusal_in(const Response &response) {
-  if (!response.error_code) return "";
-  return "the device refused " + std::string(response.message->command) + ": " +
-         tools::describe_result(*response.error_code);
-}
 
 std::string joined(const std::vector<std::string> &lines) {
   std::string text;
@@ -92,7 +81,7 @@ void Visit::hear(const std::string &body) {
                       "): expected its rid and tid");
   }
   event_.message = row_.open_message;
-  event_.reason = refusal_in(response);
+  event_.reason = refusal_of(response);
   event_.outcome = event_.reason.empty() ? "pass" : "fail";
   learn(open.order, response, event_.reason, &progress_);
   if (response.dsi_text && progress_.state) row_.state = progress_.state->dump();
@@ -146,7 +135,7 @@ std::string Visit::send(Order order) {
   options.rid = random_id();
   options.tid = random_id();
   const Json *state = progress_.state ? &*progress_.state : nullptr;
-  if (quotes_state(order.message)) options.dsihash = dsi_hash(*state);
+  if (quotes_dsi(order.message)) options.dsihash = dsi_hash(*state);
   std::string text = make_request(order.message, options, tsm_, stored_device_info(row_), state);
   row_.open_message = message_of(order.message).command;
   row_.open_request = open_request_text({.order = order, .sent = sent_request(order)});
