@@ -10,7 +10,7 @@
 #include "inside.h"
 #include "ownership.h"
 #include "suite.h"
-#include "tsm/crypto.h"
+#include "tsm/protocol/crypto.h"
 
 namespace bench {
 namespace {

@@ -4,7 +4,7 @@
 #include <cstring>
 #include <stdexcept>
 
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 
 namespace bench {
 

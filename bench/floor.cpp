@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "floor.h"
 
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 
 namespace bench {
 namespace {

@@ -8,8 +8,8 @@
 #include "inside.h"
 #include "libraries/libraries.h"
 #include "suite.h"
-#include "tsm/crypto.h"
-#include "tsm/json.h"
+#include "tsm/protocol/crypto.h"
+#include "tsm/protocol/json.h"
 
 namespace bench {
 namespace {

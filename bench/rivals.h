@@ -9,7 +9,7 @@
 
 #include "floor.h"
 #include "libraries/libraries.h"
-#include "tsm/crypto.h"
+#include "tsm/protocol/crypto.h"
 
 namespace bench {
 

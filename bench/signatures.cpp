@@ -13,7 +13,7 @@
 #include "state/object_store.h"
 #include "suite.h"
 #include "support/scene.h"
-#include "tsm/request.h"
+#include "tsm/protocol/request.h"
 
 namespace bench {
 namespace {

@@ -3,8 +3,8 @@
 // changed inside, and closed again.
 #include "support/mutation.h"
 #include "support/sealed_request.h"
-#include "tsm/dsi.h"
-#include "tsm/jwe.h"
+#include "tsm/protocol/dsi.h"
+#include "tsm/protocol/jwe.h"
 
 namespace fuzz {
 

@@ -7,7 +7,7 @@
 
 #include "state/json.h"
 #include "support/inside.h"
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 
 namespace fuzz {
 

@@ -5,7 +5,7 @@
 #include "security/jwe.h"
 #include "support/inside.h"
 #include "support/stored_device.h"
-#include "tsm/jwe.h"
+#include "tsm/protocol/jwe.h"
 
 namespace fuzz {
 

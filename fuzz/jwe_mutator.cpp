@@ -6,7 +6,7 @@
 
 #include "support/mutation.h"
 #include "support/stored_device.h"
-#include "tsm/jwe.h"
+#include "tsm/protocol/jwe.h"
 
 namespace fuzz {
 

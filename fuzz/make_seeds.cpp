@@ -10,8 +10,8 @@
 #include "common/files.h"
 #include "support/manager.h"
 #include "support/target_device.h"
-#include "tsm/image.h"
-#include "tsm/jwe.h"
+#include "tsm/protocol/image.h"
+#include "tsm/protocol/jwe.h"
 
 namespace fuzz {
 

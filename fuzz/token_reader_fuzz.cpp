@@ -5,7 +5,7 @@
 //     key, up to a line feed | text
 #include "state/token_reader.h"
 #include "support/inside.h"
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 
 namespace fuzz {
 

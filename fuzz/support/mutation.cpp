@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "tsm/crypto.h"
+#include "tsm/protocol/crypto.h"
 
 extern "C" size_t LLVMFuzzerMutate(uint8_t *data, size_t size, size_t max_size);
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 
 namespace fuzz {
 

@@ -2,9 +2,9 @@
 #include "support/sealed_request.h"
 
 #include "support/manager.h"
-#include "tsm/dsi.h"
-#include "tsm/jwe.h"
-#include "tsm/trust.h"
+#include "tsm/protocol/dsi.h"
+#include "tsm/protocol/jwe.h"
+#include "tsm/protocol/trust.h"
 
 namespace fuzz {
 

@@ -7,7 +7,7 @@
 #include <string_view>
 
 #include "support/stored_device.h"
-#include "tsm/request.h"
+#include "tsm/protocol/request.h"
 
 namespace fuzz {
 

@@ -10,7 +10,7 @@
 #include <map>
 #include <string>
 
-#include "tsm/parties.h"
+#include "tsm/protocol/parties.h"
 
 namespace fuzz {
 

@@ -7,7 +7,7 @@
 #include <cstring>
 
 #include "state/dsi.h"
-#include "tsm/response.h"
+#include "tsm/protocol/response.h"
 
 // The key service's entry points under names of their own: the agent's are in the same program.
 extern "C" {

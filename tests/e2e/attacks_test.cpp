@@ -8,8 +8,8 @@
 
 #include "support/log_rows.h"
 #include "support/scene.h"
-#include "tsm/jwe.h"
-#include "tsm/trust.h"
+#include "tsm/protocol/jwe.h"
+#include "tsm/protocol/trust.h"
 
 namespace otrp_test {
 namespace {

@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "support/scene.h"
-#include "tsm/trust.h"
+#include "tsm/protocol/trust.h"
 
 namespace otrp_test {
 namespace {

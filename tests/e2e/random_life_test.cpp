@@ -6,7 +6,7 @@
 #include <random>
 
 #include "support/scene.h"
-#include "tsm/image.h"
+#include "tsm/protocol/image.h"
 
 namespace otrp_test {
 namespace {

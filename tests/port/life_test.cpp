@@ -3,7 +3,7 @@
 #include <gmock/gmock.h>
 
 #include "port/any_scene.h"
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 
 namespace otrp_test {
 namespace {

@@ -7,7 +7,7 @@
 #include <filesystem>
 
 #include "device/inspect.h"
-#include "tsm/request.h"
+#include "tsm/protocol/request.h"
 
 namespace {
 

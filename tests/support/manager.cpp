@@ -6,10 +6,10 @@
 #include <map>
 
 #include "common/files.h"
-#include "tsm/dsi.h"
-#include "tsm/image.h"
-#include "tsm/jwe.h"
-#include "tsm/trust.h"
+#include "tsm/protocol/dsi.h"
+#include "tsm/protocol/image.h"
+#include "tsm/protocol/jwe.h"
+#include "tsm/protocol/trust.h"
 
 namespace otrp_test {
 

@@ -11,9 +11,9 @@
 #include <vector>
 
 #include "support/client_device.h"
-#include "tsm/parties.h"
-#include "tsm/request.h"
-#include "tsm/response.h"
+#include "tsm/protocol/parties.h"
+#include "tsm/protocol/request.h"
+#include "tsm/protocol/response.h"
 
 namespace otrp_test {
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include <gtest/gtest.h>
 
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 #include "tsm_fake_device.h"
 
 namespace tsm {

@@ -5,9 +5,9 @@
 
 #include <string>
 
-#include "tsm/jwe.h"
-#include "tsm/messages.h"
-#include "tsm/parties.h"
+#include "tsm/protocol/jwe.h"
+#include "tsm/protocol/messages.h"
+#include "tsm/protocol/parties.h"
 
 namespace tsm {
 

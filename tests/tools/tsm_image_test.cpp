@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include <gtest/gtest.h>
 
-#include "tsm/image.h"
+#include "tsm/protocol/image.h"
 
 namespace tsm {
 namespace {

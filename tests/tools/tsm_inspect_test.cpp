@@ -7,11 +7,11 @@
 
 #include "common/result_names.h"
 #include "program.h"
-#include "tsm/dsi.h"
-#include "tsm/image.h"
-#include "tsm/inspect_input.h"
-#include "tsm/request.h"
-#include "tsm/trust.h"
+#include "tsm/inspect/input.h"
+#include "tsm/protocol/dsi.h"
+#include "tsm/protocol/image.h"
+#include "tsm/protocol/request.h"
+#include "tsm/protocol/trust.h"
 #include "tsm_fake_device.h"
 
 namespace tsm {

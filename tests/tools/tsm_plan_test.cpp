@@ -8,9 +8,9 @@
 #include "common/agent_codes.h"
 #include "common/error_line.h"
 #include "support/temporary_folder.h"
-#include "tsm/dsi.h"
-#include "tsm/image.h"
 #include "tsm/plan/decision.h"
+#include "tsm/protocol/dsi.h"
+#include "tsm/protocol/image.h"
 #include "tsm_fake_device.h"
 
 namespace tsm {

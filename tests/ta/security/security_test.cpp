@@ -10,7 +10,7 @@
 #include "support/agent_device.h"
 #include "support/inside_agent.h"
 #include "support/published_vectors.h"
-#include "tsm/crypto.h"
+#include "tsm/protocol/crypto.h"
 
 namespace otrp_test {
 namespace {

@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 
 namespace tsm {
 namespace {

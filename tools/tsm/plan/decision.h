@@ -12,9 +12,9 @@
 #include <string>
 #include <vector>
 
-#include "tsm/order.h"
 #include "tsm/plan/plan.h"
 #include "tsm/plan/progress.h"
+#include "tsm/protocol/order.h"
 
 namespace tsm {
 

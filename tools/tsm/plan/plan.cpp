@@ -7,8 +7,8 @@
 #include <map>
 
 #include "common/files.h"
-#include "tsm/image.h"
 #include "tsm/plan/located_json.h"
+#include "tsm/protocol/image.h"
 
 namespace tsm {
 namespace {

@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "tsm/crypto.h"
+#include "tsm/protocol/crypto.h"
 
 namespace tsm {
 

@@ -4,7 +4,7 @@
 #include <algorithm>
 
 #include "common/agent_codes.h"
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 
 namespace tsm {
 namespace {

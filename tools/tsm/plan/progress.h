@@ -11,8 +11,8 @@
 #include <set>
 #include <string>
 
-#include "tsm/order.h"
-#include "tsm/response.h"
+#include "tsm/protocol/order.h"
+#include "tsm/protocol/response.h"
 
 namespace tsm {
 

@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 #include "tsm/server/visit.h"
 
 namespace tsm {

@@ -6,7 +6,7 @@
 #include <chrono>
 #include <string>
 
-#include "tsm/parties.h"
+#include "tsm/protocol/parties.h"
 #include "tsm/server/plan_shelf.h"
 #include "tsm/store/store.h"
 

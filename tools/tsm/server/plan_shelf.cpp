@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <stdexcept>
 
-#include "tsm/json.h"
+#include "tsm/protocol/json.h"
 
 namespace tsm {
 namespace {

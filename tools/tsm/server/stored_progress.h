@@ -6,11 +6,11 @@
 
 #include <string>
 
-#include "tsm/order.h"
-#include "tsm/parties.h"
 #include "tsm/plan/progress.h"
+#include "tsm/protocol/order.h"
+#include "tsm/protocol/parties.h"
+#include "tsm/protocol/waiting.h"
 #include "tsm/store/store.h"
-#include "tsm/waiting.h"
 
 namespace tsm {
 

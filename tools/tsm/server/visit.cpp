@@ -2,7 +2,7 @@
 #include "tsm/server/visit.h"
 
 #include "common/error_line.h"
-#include "tsm/dsi.h"
+#include "tsm/protocol/dsi.h"
 #include "tsm/server/stored_progress.h"
 
 namespace tsm {

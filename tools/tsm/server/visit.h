@@ -13,10 +13,10 @@
 #include <stdexcept>
 #include <string>
 
-#include "tsm/parties.h"
 #include "tsm/plan/decision.h"
+#include "tsm/protocol/parties.h"
+#include "tsm/protocol/waiting.h"
 #include "tsm/store/store.h"
-#include "tsm/waiting.h"
 
 namespace tsm {
 
