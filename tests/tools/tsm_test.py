@@ -553,7 +553,7 @@ class Streams(Operator):
 
     def test_an_image_that_is_too_large_is_called_so(self):
         self.manage("create-sd --sp sp --sd sd --sp-cert text")
-        self.write("file", bytes(3_000_000))
+        self.write("file", bytes(1_600_000))
         self.tsm("image pack file -o image")
         line = f"install-ta --sp sp --sd sd --ta {TAID} --ta-version 1 --image image"
         self.manage(line, 1, "image is too large")

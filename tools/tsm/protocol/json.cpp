@@ -4,6 +4,8 @@
 #include <cmath>
 #include <cstdio>
 
+template class nlohmann::basic_json<nlohmann::ordered_map>;
+
 namespace tsm {
 namespace {
 

@@ -33,4 +33,7 @@ const std::string *find_string(const Json &value, std::string_view name);
 
 }  // namespace tsm
 
+/// Compiled once, in json.cpp, and not in each source that reads JSON.
+extern template class nlohmann::basic_json<nlohmann::ordered_map>;
+
 #endif
