@@ -82,7 +82,8 @@ void count_end(const broker::Outcome &outcome, Figures &figures) {
 }  // namespace
 
 broker::Outcome call_tsm(const Member &member, const CallOptions &options, const broker::Stop &stop,
-                         Random &random, Figures &figures) {
+                         Random &random, Figures &figures,
+                         const std::function<void()> &on_message) {
   const Clock::time_point start = Clock::now();
   device::AgentLog log(false);
   http::Client client({.ca_file = options.ca_file, .user_agent = kProgram});
@@ -95,6 +96,7 @@ broker::Outcome call_tsm(const Member &member, const CallOptions &options, const
   ends.on_exchange = [&](const broker::Exchange &exchange) {
     figures.agents.add(exchange.agent_time);
     ++figures.messages[std::string(exchange.message->command) + " " + exchange.verdict];
+    if (on_message) on_message();
   };
   ++figures.num_calls;
   ++figures.num_sessions;

@@ -3,6 +3,7 @@
 #ifndef FLEET_CALL_H
 #define FLEET_CALL_H
 
+#include <functional>
 #include <string>
 
 #include "device/broker/broker.h"
@@ -20,9 +21,11 @@ struct CallOptions {
 };
 
 /// What happened is added to `figures`. Each call has a connection of its own. TA images are
-/// dropped.
+/// dropped. `on_message`, where given, is called when the device has carried out a message, before
+/// the TSM hears of it.
 broker::Outcome call_tsm(const Member &member, const CallOptions &options, const broker::Stop &stop,
-                         Random &random, Figures &figures);
+                         Random &random, Figures &figures,
+                         const std::function<void()> &on_message = {});
 
 }  // namespace fleet
 

@@ -4,6 +4,7 @@
 #include <mutex>
 #include <optional>
 #include <thread>
+#include <utility>
 
 #include "common/error_line.h"
 #include "fleet/child.h"
@@ -19,38 +20,65 @@ constexpr milliseconds kLook(5);           // how often a child is looked at
 constexpr milliseconds kLongestLife(400);  // of a device that is killed in a call
 constexpr std::chrono::seconds kServerStart(30);
 
-/// The TSM, where it is ours to run.
+/// The TSM, where it is ours to run. It is killed after counted events, so that it is killed as
+/// often as was asked for, however fast the devices are.
 class Server {
  public:
-  Server(const RunOptions &options, size_t num_devices) : options_(options) {
+  Server(const RunOptions &options, size_t num_devices)
+      : options_(options), num_devices_(num_devices) {
     if (options.server_command.empty() && options.call.faults.killed_servers > 0) {
       throw tools::UsageError("kill-server needs a server to kill: expected --server COMMAND");
     }
-    every_ = num_devices / (options.call.faults.killed_servers + 1) + 1;
     if (!options.server_command.empty()) start();
   }
 
   ~Server() {
+    wait_for_kills();
     if (child_) child_->end();
   }
 
-  /// Kills it when its time has come, and starts it again. Returns whether it did.
-  bool look(size_t num_done) {
-    if (!child_) return false;
+  /// Each device utters it once, in the middle of its first call. The kill that is due then meets
+  /// what the device and others are about to ask.
+  void a_device_is_at_work() {
+    const unsigned num_kills = options_.call.faults.killed_servers;
+    const std::lock_guard guard(count_lock_);
+    ++num_at_work_;
+    while (kills_.size() < num_kills &&
+           num_at_work_ * (num_kills + 1) >= num_devices_ * (kills_.size() + 1)) {
+      kills_.emplace_back([this] { kill_and_start(); });
+    }
+  }
+
+  /// Throws when it has ended by itself.
+  void look() {
+    const std::lock_guard guard(child_lock_);
+    if (failure_) std::rethrow_exception(failure_);
+    if (!child_) return;
     if (const std::optional<int> code = child_->exit_code()) {
       throw std::runtime_error("the server has ended by itself, with exit code " +
                                std::to_string(*code));
     }
-    const bool is_due =
-        num_killed_ < options_.call.faults.killed_servers && num_done >= (num_killed_ + 1) * every_;
-    if (!is_due) return false;
-    ++num_killed_;
-    child_->kill();
-    start();
-    return true;
+  }
+
+  /// How often it was killed, in the end.
+  size_t wait_for_kills() {
+    for (std::jthread &kill : kills_) {
+      if (kill.joinable()) kill.join();
+    }
+    return kills_.size();
   }
 
  private:
+  void kill_and_start() {
+    const std::lock_guard guard(child_lock_);
+    try {
+      child_->kill();
+      start();
+    } catch (...) {
+      failure_ = std::current_exception();
+    }
+  }
+
   void start() {
     child_.emplace(std::vector<std::string>{"/bin/sh", "-c", options_.server_command},
                    Child::Output::kShown);
@@ -69,21 +97,29 @@ class Server {
   }
 
   const RunOptions &options_;
+  const size_t num_devices_;
+  std::mutex child_lock_;  // of child_ and failure_
   std::optional<Child> child_;
-  size_t every_;
-  unsigned num_killed_ = 0;
+  std::exception_ptr failure_;
+  std::mutex count_lock_;  // of the ones below
+  size_t num_at_work_ = 0;
+  std::vector<std::jthread> kills_;
 };
 
 class Run {
  public:
   Run(const std::filesystem::path &root, const RunOptions &options, const broker::Stop &stop)
-      : root_(root), members_(members_of(root)), options_(options), stop_(stop) {}
+      : root_(root),
+        members_(members_of(root)),
+        options_(options),
+        stop_(stop),
+        server_(options, members_.size()) {}
 
   Figures run(const std::function<void(const RunProgress &)> &progress);
 
  private:
   void bring(size_t index);
-  bool arrives(const Member &member, Random &random);
+  bool arrives(const Member &member, Random &random, const std::function<void()> &on_message);
   bool is_killed_or_arrives(const Member &member, Random &random, bool *arrived);
   void wait_for_turn(size_t index) const;
 
@@ -91,6 +127,7 @@ class Run {
   const std::vector<Member> members_;
   const RunOptions &options_;
   const broker::Stop &stop_;
+  Server server_;
   Clock::time_point start_;
   std::mutex lock_;  // of the ones below
   Figures figures_;
@@ -118,7 +155,7 @@ bool Run::is_killed_or_arrives(const Member &member, Random &random, bool *arriv
   return !code;
 }
 
-bool Run::arrives(const Member &member, Random &random) {
+bool Run::arrives(const Member &member, Random &random, const std::function<void()> &on_message) {
   Figures figures;
   bool arrived = false;
   if (happens(options_.call.faults.killed_devices, random)) {
@@ -126,7 +163,8 @@ bool Run::arrives(const Member &member, Random &random) {
     ++figures.num_sessions;
     if (is_killed_or_arrives(member, random, &arrived)) ++figures.failures["killed device"];
   } else {
-    const broker::Outcome outcome = call_tsm(member, options_.call, stop_, random, figures);
+    const broker::Outcome outcome =
+        call_tsm(member, options_.call, stop_, random, figures, on_message);
     arrived = outcome.end == broker::End::kDone;
   }
   figures.num_arrived = arrived ? 1 : 0;
@@ -137,32 +175,36 @@ bool Run::arrives(const Member &member, Random &random) {
 
 void Run::bring(size_t index) {
   Random random(static_cast<Random::result_type>(options_.seed * 1'000'003 + index + 1));
+  bool was_at_work = false;
+  const auto note_work = [&] {
+    if (!std::exchange(was_at_work, true)) server_.a_device_is_at_work();
+  };
   wait_for_turn(index);
   for (unsigned call = 0; call < options_.max_calls && !stop_.is_requested(); ++call) {
-    if (arrives(members_[index], random)) break;
+    if (arrives(members_[index], random, note_work)) break;
   }
+  note_work();  // if no message came
   const std::lock_guard guard(lock_);
   ++num_done_;
 }
 
 Figures Run::run(const std::function<void(const RunProgress &)> &progress) {
-  Server server(options_, members_.size());
   start_ = Clock::now();
   const auto tick = [&] {
+    server_.look();
     std::unique_lock guard(lock_);
     const RunProgress now = {num_done_, figures_.num_arrived, figures_.exchanges.count()};
     guard.unlock();
-    if (server.look(now.num_done)) {
-      guard.lock();
-      ++figures_.failures["killed server"];
-      guard.unlock();
-    }
     progress(now);
   };
   for_each(
       members_.size(), options_.num_threads, [&](size_t index) { bring(index); }, tick);
   figures_.num_devices = members_.size();
   figures_.time = Clock::now() - start_;
+  if (const size_t num_kills = server_.wait_for_kills()) {
+    figures_.failures["killed server"] = num_kills;
+  }
+  server_.look();
   return std::move(figures_);
 }
 
