@@ -88,12 +88,87 @@ TEST(Store, CountsDevicesAndWhatTheyOwe) {
   ASSERT_TRUE(store.save(device, {}));
   EXPECT_EQ(store.count_open(99), 1u);
   EXPECT_EQ(store.count_open(100), 0u);
-  std::map<std::string, uint64_t> counts;
-  for (const DeviceCount &count : store.count_devices()) {
-    EXPECT_EQ(count.plan, "p1");
-    counts[count.outcome + "/" + count.outcome_plan] = count.num_devices;
-  }
-  EXPECT_EQ(counts, (std::map<std::string, uint64_t>{{"/", 2}, {"current/p1", 1}}));
+  EXPECT_EQ(store.count_devices(), (StandingCounts{1, 0, 0, 2, 0}));
+}
+
+TEST(Store, FindsDevicesPageByPageAndByWhereTheyStand) {
+  const otrp_test::FreshStore fresh;
+  Store store(fresh.uri());
+  store.assign({"p1", "one", {}}, "g");
+  store.enrol({{"b%1", "key"}, {"B_2", "key"}, {"c'3", "key"}, {"a0", "key"}}, "g");
+  store.enrol({{"z", "key"}}, "B-side");
+  const auto stand = [&](const char *id, const char *outcome, const char *plan) {
+    StoredDevice device = store.find_device(id).value();
+    device.outcome = outcome;
+    device.outcome_plan = plan;
+    device.reason = id;
+    ASSERT_TRUE(store.save(device, {}));
+  };
+  stand("a0", "current", "p1");
+  stand("b%1", "current", "p0");
+  stand("c'3", "refused", "p1");
+  const auto found = [&](const DeviceQuery &query) {
+    std::string text;
+    for (const ListedDevice &device : store.list_devices(query)) {
+      text += device.device_id + ":" + name_of(device.standing) + " ";
+      EXPECT_EQ(store.find_device(device.device_id).value().standing, device.standing);
+    }
+    return text;
+  };
+  EXPECT_EQ(store.list_devices({}).size(), 5u);
+  const std::string first = store.list_devices({.max_devices = 2}).back().device_id;
+  EXPECT_EQ(store.list_devices({.after = first}).size(), 3u);
+  EXPECT_EQ(found({.text = "%"}), "b%1:behind ");
+  EXPECT_EQ(found({.text = "b_"}), "B_2:unseen ");
+  EXPECT_EQ(found({.text = "side"}), "z:unplanned ");
+  EXPECT_EQ(found({.text = "'", .standing = Standing::kRefused}), "c'3:refused ");
+  EXPECT_EQ(found({.text = "g", .standing = Standing::kCurrent}), "a0:current ");
+  EXPECT_EQ(store.count_devices(), (StandingCounts{1, 1, 1, 1, 1}));
+}
+
+TEST(Store, DevicesMoveAndGoWithAllThatIsKnownOfThem) {
+  const otrp_test::FreshStore fresh;
+  Store store(fresh.uri());
+  store.enrol({{"d1", "key"}, {"d2", "key"}}, "g");
+  ASSERT_TRUE(store.save(store.find_device("d1").value(), {.message = "m"}));
+  EXPECT_TRUE(store.move("d1", "h"));
+  EXPECT_EQ(store.find_device("d1").value().group, "h");
+  EXPECT_FALSE(store.move("d3", "h"));
+  const StoredDevice read_before = store.find_device("d1").value();
+  EXPECT_THROW(store.remove({"d1", "d3"}), tools::UsageError);
+  EXPECT_TRUE(store.find_device("d1"));
+  store.remove({"d1"});
+  EXPECT_FALSE(store.find_device("d1"));
+  EXPECT_FALSE(store.save(read_before, {}));
+  EXPECT_EQ(store.events_of("d1").size(), 0u);
+  EXPECT_TRUE(store.find_device("d2"));
+}
+
+TEST(Store, HistoryIsOneRowAMinuteOfTheLastWeek) {
+  const otrp_test::FreshStore fresh;
+  Store store(fresh.uri()), other(fresh.uri());
+  store.keep_history(6000);
+  store.enrol({{"d1", "key"}}, "g");
+  other.keep_history(6059);
+  other.keep_history(6060);
+  const std::vector<HistoryEntry> entries = store.history_since(6000);
+  ASSERT_EQ(entries.size(), 2u);
+  EXPECT_EQ(
+      std::tuple(entries[0].time, entries[0].counts[4], entries[1].time, entries[1].counts[4]),
+      std::tuple(6000, 0u, 6060, 1u));
+  store.keep_history(6060 + kHistoryTime);
+  EXPECT_EQ(store.history_since(0).size(), 2u);
+}
+
+TEST(Store, OfAnotherVersionIsLeftAsItIs) {
+  const otrp_test::FreshStore fresh;
+  const bool is_shared = fresh.is_shared();
+  soci::session sql(is_shared ? "postgresql" : "sqlite3",
+                    is_shared ? fresh.uri() : fresh.uri().substr(strlen("sqlite:")));
+  sql << "CREATE TABLE store_format (only_one INTEGER PRIMARY KEY, format INTEGER NOT NULL)";
+  sql << "INSERT INTO store_format VALUES (1, 1)";
+  EXPECT_THROW(Store{fresh.uri()}, tools::UsageError);
+  EXPECT_THROW(sql << "SELECT * FROM devices", soci::soci_error);
 }
 
 TEST(Store, ComesBackWithItsDatabase) {

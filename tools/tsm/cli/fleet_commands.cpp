@@ -10,6 +10,7 @@
 #include "http/server.h"
 #include "tsm/cli/commands.h"
 #include "tsm/home/home.h"
+#include "tsm/server/historian.h"
 #include "tsm/server/service.h"
 #include "tsm/store/store.h"
 
@@ -195,6 +196,7 @@ int run_serve(const Arguments &arguments) {
   http::Server server(std::move(options));
   const std::string url = server.listen(endpoint, service.handler(), std::move(listen));
   if (plan) store.assign(*plan, kDefaultGroup);
+  const Historian historian(&store);
   tools::write_file("-", url + "\n");
   server.run();
   return 0;

@@ -33,21 +33,8 @@ std::string message_label(const std::string &message) {
 
 }  // namespace
 
-std::string state_of(const std::string &plan, const std::string &outcome,
-                     const std::string &outcome_plan) {
-  if (plan.empty()) return "unplanned";
-  if (outcome.empty()) return "unseen";
-  return outcome_plan == plan ? outcome : "behind";
-}
-
 FleetCounts count_fleet(Store *store) {
-  FleetCounts fleet = {
-      .devices = {{"unseen", 0}, {"unplanned", 0}, {"behind", 0}, {"current", 0}, {"refused", 0}}};
-  for (const DeviceCount &count : store->count_devices()) {
-    fleet.devices[state_of(count.plan, count.outcome, count.outcome_plan)] += count.num_devices;
-  }
-  fleet.num_open = store->count_open(seconds_now());
-  return fleet;
+  return {.devices = store->count_devices(), .num_open = store->count_open(seconds_now())};
 }
 
 void Metrics::count_exchange(const DoorAnswer &answer, std::chrono::duration<double> time) {
@@ -101,8 +88,8 @@ std::string Metrics::text(const FleetCounts &fleet) const {
         std::to_string(count));
   }
   put_head(&text, "otrp_devices", "gauge", "Enrolled devices, by where they are.");
-  for (const auto &[state, count] : fleet.devices) {
-    put(&text, "otrp_devices", label("state", state), std::to_string(count));
+  for (size_t i = 0; i < kStandings.size(); ++i) {
+    put(&text, "otrp_devices", label("state", kStandings[i]), std::to_string(fleet.devices[i]));
   }
   put_head(&text, "otrp_open_transactions", "gauge", "Messages that wait for their answers.");
   put(&text, "otrp_open_transactions", "", std::to_string(fleet.num_open));

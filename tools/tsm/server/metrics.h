@@ -18,14 +18,9 @@ namespace tsm {
 
 /// What the store counts, for all servers together.
 struct FleetCounts {
-  std::map<std::string, uint64_t> devices;  // by state: see state_of()
+  StandingCounts devices = {};
   uint64_t num_open = 0;
 };
-
-/// "unseen", "unplanned", "behind", "current" or "refused". An outcome is one for the plan that it
-/// came from.
-std::string state_of(const std::string &plan, const std::string &outcome,
-                     const std::string &outcome_plan);
 
 FleetCounts count_fleet(Store *store);
 

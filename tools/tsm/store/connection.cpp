@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "tsm/store/connection.h"
 
+#include "tsm/store/schema.h"
+
 namespace tsm {
 
 using soci::into;
@@ -9,14 +11,15 @@ using soci::use;
 void Connection::prepare() {
   StoredDevice &d = device_;
   find_ = std::make_unique<soci::statement>(
-      (sql.prepare << "SELECT d.tee_key, d.device_group, COALESCE(g.plan, ''), d.version, d.state, "
+      (sql.prepare << "SELECT d.tee_key, d.device_group, COALESCE(g.plan, ''), " TSM_SQL_STANDING
+                      ", d.version, d.state, "
                       "d.progress, d.outcome, d.outcome_plan, d.reason, d.seen, d.open_message, "
                       "d.open_request, d.deadline FROM devices d "
                       "LEFT JOIN device_groups g ON g.name = d.device_group "
                       "WHERE d.device_id = :device_id",
-       use(d.device_id, "device_id"), into(d.key), into(d.group), into(d.plan), into(version_),
-       into(d.state), into(d.progress), into(d.outcome), into(d.outcome_plan), into(d.reason),
-       into(seen_), into(d.open_message), into(d.open_request), into(deadline_)));
+       use(d.device_id, "device_id"), into(d.key), into(d.group), into(d.plan), into(standing_),
+       into(version_), into(d.state), into(d.progress), into(d.outcome), into(d.outcome_plan),
+       into(d.reason), into(seen_), into(d.open_message), into(d.open_request), into(deadline_)));
   update_ = std::make_unique<soci::statement>(
       (sql.prepare << "UPDATE devices SET version = version + 1, state = :state, "
                       "progress = :progress, outcome = :outcome, outcome_plan = :outcome_plan, "
@@ -43,6 +46,7 @@ bool Connection::find(const std::string &device_id, StoredDevice *device) {
   device_.device_id = device_id;
   if (!find_->execute(true)) return false;
   *device = device_;
+  device->standing = static_cast<Standing>(standing_);
   device->version = version_;
   device->seen = seen_;
   device->deadline = deadline_;

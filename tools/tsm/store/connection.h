@@ -34,6 +34,7 @@ class Connection {
   // Statements are bound to these, and a connection is used by one thread at a time.
   StoredDevice device_;
   Event event_;
+  int standing_ = 0;
   long long version_ = 0;
   long long number_ = 0;
   long long seen_ = 0;

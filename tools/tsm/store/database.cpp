@@ -73,17 +73,20 @@ void Database::make_tables() {
     session.begin();
     session << "SELECT pg_advisory_xact_lock(" << kSchemaLock << ")";
   }
-  for (const char *statement : kSchema) session << statement;
+  session << kFormatTable;
   int format = kSchemaFormat;
   session << "INSERT INTO store_format (only_one, format) VALUES (1, :format) "
              "ON CONFLICT (only_one) DO NOTHING",
       soci::use(format, "format");
   session << "SELECT format FROM store_format", soci::into(format);
-  session << "COMMIT";
   if (format != kSchemaFormat) {
-    throw UsageError("the store is of format " + std::to_string(format) + ": expected " +
-                     std::to_string(kSchemaFormat));
+    throw UsageError("the store is of format " + std::to_string(format) +
+                     ", of another version of this program: expected format " +
+                     std::to_string(kSchemaFormat) +
+                     ", or a new store, in which the devices are enrolled anew");
   }
+  for (const char *statement : kSchema) session << statement;
+  session << "COMMIT";
 }
 
 std::unique_ptr<Connection> Database::take() {

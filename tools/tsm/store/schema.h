@@ -5,13 +5,14 @@
 
 namespace tsm {
 
-constexpr int kSchemaFormat = 1;
+constexpr int kSchemaFormat = 2;
 
-constexpr const char *kSchema[] = {
+constexpr char kFormatTable[] =
     "CREATE TABLE IF NOT EXISTS store_format ("
     "  only_one INTEGER PRIMARY KEY,"
-    "  format INTEGER NOT NULL)",
+    "  format INTEGER NOT NULL)";
 
+constexpr const char *kSchema[] = {
     "CREATE TABLE IF NOT EXISTS plans ("
     "  digest TEXT PRIMARY KEY,"
     "  document TEXT NOT NULL)",
@@ -24,24 +25,25 @@ constexpr const char *kSchema[] = {
     "  name TEXT PRIMARY KEY,"
     "  plan TEXT NOT NULL)",
 
+    // What is long comes last: SQLite reads a row from its beginning, and no further than it must.
     "CREATE TABLE IF NOT EXISTS devices ("
     "  device_id TEXT PRIMARY KEY,"
     "  tee_key TEXT NOT NULL,"
     "  device_group TEXT NOT NULL,"
     "  version BIGINT NOT NULL DEFAULT 0,"
-    "  state TEXT NOT NULL DEFAULT '',"
-    "  progress TEXT NOT NULL DEFAULT '',"
     "  outcome TEXT NOT NULL DEFAULT '',"
     "  outcome_plan TEXT NOT NULL DEFAULT '',"
-    "  reason TEXT NOT NULL DEFAULT '',"
     "  seen BIGINT NOT NULL DEFAULT 0,"
+    "  deadline BIGINT NOT NULL DEFAULT 0,"
     "  open_message TEXT NOT NULL DEFAULT '',"
     "  open_request TEXT NOT NULL DEFAULT '',"
-    "  deadline BIGINT NOT NULL DEFAULT 0)",
+    "  reason TEXT NOT NULL DEFAULT '',"
+    "  progress TEXT NOT NULL DEFAULT '',"
+    "  state TEXT NOT NULL DEFAULT '')",
 
-    // For counting: neither reads a row of a device.
-    "CREATE INDEX IF NOT EXISTS devices_by_outcome"
-    "  ON devices (device_group, outcome, outcome_plan)",
+    // For counting and looking through all: neither reads a row of a device.
+    "CREATE INDEX IF NOT EXISTS devices_to_look_through"
+    "  ON devices (device_id, device_group, outcome, outcome_plan)",
     "CREATE INDEX IF NOT EXISTS devices_that_owe ON devices (deadline) WHERE deadline > 0",
 
     "CREATE TABLE IF NOT EXISTS events ("
@@ -53,7 +55,23 @@ constexpr const char *kSchema[] = {
     "  reason TEXT NOT NULL,"
     "  next_message TEXT NOT NULL,"
     "  PRIMARY KEY (device_id, number))",
+
+    "CREATE TABLE IF NOT EXISTS history ("
+    "  time BIGINT PRIMARY KEY,"
+    "  num_current BIGINT NOT NULL,"
+    "  num_behind BIGINT NOT NULL,"
+    "  num_refused BIGINT NOT NULL,"
+    "  num_unseen BIGINT NOT NULL,"
+    "  num_unplanned BIGINT NOT NULL)",
 };
+
+/// Where a device `d` of a group `g`, which may have no row, stands: an index of kStandings.
+#define TSM_SQL_STANDING                        \
+  "CASE WHEN COALESCE(g.plan, '') = '' THEN 4 " \
+  "WHEN d.outcome = '' THEN 3 "                 \
+  "WHEN d.outcome_plan <> g.plan THEN 1 "       \
+  "WHEN d.outcome = 'current' THEN 0 "          \
+  "WHEN d.outcome = 'refused' THEN 2 ELSE 1 END"
 
 }  // namespace tsm
 

@@ -113,6 +113,39 @@ void Store::enrol(const std::vector<EnrolledDevice> &devices, const std::string 
   });
 }
 
+bool Store::move(const std::string &device_id, const std::string &group) {
+  const auto turn = database_->writers_turn();
+  return database_->with([&](Connection &connection) {
+    soci::statement update = (connection.sql.prepare << "UPDATE devices SET device_group = :name "
+                                                        "WHERE device_id = :id",
+                              use(group, "name"), use(device_id, "id"));
+    update.execute(true);
+    return update.get_affected_rows() == 1;
+  });
+}
+
+void Store::remove(const std::vector<std::string> &device_ids) {
+  const auto turn = database_->writers_turn();
+  database_->with([&](Connection &connection) {
+    soci::transaction transaction(connection.sql);
+    std::string id;
+    soci::statement remove =
+        (connection.sql.prepare << "DELETE FROM devices WHERE device_id = :id", use(id, "id"));
+    soci::statement remove_events =
+        (connection.sql.prepare << "DELETE FROM events WHERE device_id = :id", use(id, "id"));
+    for (const std::string &device_id : device_ids) {
+      id = device_id;
+      remove.execute(true);
+      if (remove.get_affected_rows() != 1) {
+        throw tools::UsageError("no device \"" + device_id + "\" is enrolled");
+      }
+      remove_events.execute(true);
+    }
+    transaction.commit();
+    return true;
+  });
+}
+
 void Store::assign(const StoredPlan &plan, const std::string &group) {
   const auto turn = database_->writers_turn();
   database_->with([&](Connection &connection) {
@@ -143,38 +176,6 @@ std::optional<std::string> Store::find_image(const std::string &digest) {
   const std::optional<std::string> base64 =
       find_text(database_.get(), "SELECT base64 FROM images WHERE digest = :key", digest);
   return base64 ? tools::base64_decode(*base64) : std::nullopt;
-}
-
-std::vector<DeviceCount> Store::count_devices() {
-  return database_->with(
-      [&](Connection &connection) {
-        std::vector<DeviceCount> counts;
-        DeviceCount count;
-        long long num = 0;
-        soci::statement query =
-            (connection.sql.prepare
-                 << "SELECT COALESCE(g.plan, ''), c.outcome, c.outcome_plan, c.num FROM "
-                    "(SELECT device_group, outcome, outcome_plan, COUNT(*) AS num "
-                    "FROM devices GROUP BY device_group, outcome, outcome_plan) c "
-                    "LEFT JOIN device_groups g ON g.name = c.device_group",
-             into(count.plan), into(count.outcome), into(count.outcome_plan), into(num));
-        query.execute();
-        while (query.fetch()) {
-          count.num_devices = static_cast<uint64_t>(num);
-          counts.push_back(count);
-        }
-        return counts;
-      });
-}
-
-uint64_t Store::count_open(int64_t now) {
-  return database_->with([&](Connection &connection) {
-    long long num = 0;
-    long long after = now;
-    connection.sql << "SELECT COUNT(*) FROM devices WHERE deadline > 0 AND deadline > :now",
-        use(after, "now"), into(num);
-    return static_cast<uint64_t>(num);
-  });
 }
 
 void Store::ping() {
