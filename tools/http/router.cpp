@@ -3,6 +3,8 @@
 
 #include <algorithm>
 
+#include "http/request_reader.h"
+
 namespace http {
 namespace {
 
@@ -50,6 +52,21 @@ bool match_path(std::string_view pattern, std::string_view path, Captures &captu
     captures.emplace_back(path.substr(0, len));
     path.remove_prefix(len);
   }
+}
+
+std::optional<std::map<std::string, std::string>> parse_query(std::string_view query) {
+  std::map<std::string, std::string> values;
+  while (!query.empty()) {
+    std::string part(query.substr(0, query.find('&')));
+    query.remove_prefix(std::min(part.size() + 1, query.size()));
+    std::ranges::replace(part, '+', ' ');
+    const size_t end = std::min(part.find('='), part.size());
+    std::string name, value;
+    if (!decode_path(part.substr(0, end), name)) return std::nullopt;
+    if (end < part.size() && !decode_path(part.substr(end + 1), value)) return std::nullopt;
+    if (!values.emplace(name, value).second) return std::nullopt;
+  }
+  return values;
 }
 
 void Router::add(Route route) {

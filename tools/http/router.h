@@ -10,6 +10,7 @@
 #define HTTP_ROUTER_H
 
 #include <functional>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -45,6 +46,10 @@ class Router : public Handler {
 
   std::vector<Route> routes_;
 };
+
+/// "a=b&c=%64" by name; "+" stands for a blank. Nothing for bad escapes or a name that is there
+/// twice.
+std::optional<std::map<std::string, std::string>> parse_query(std::string_view query);
 
 /// Public for tests.
 bool match_path(std::string_view pattern, std::string_view path, Captures &captures);

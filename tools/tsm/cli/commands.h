@@ -17,6 +17,7 @@ constexpr int kExitNotVerified = 3;
 /// How devices that call are served. Numbers are texts; empty: the default.
 struct ServeArguments {
   std::string listen = "127.0.0.1:8090";
+  std::string admin;  // likewise; empty: none
   std::string plan;
   std::string tls_cert;
   std::string tls_key;
@@ -80,6 +81,7 @@ int run_device_add(const Arguments &arguments);
 int run_device_list(const Arguments &arguments);
 int run_device_remove(const Arguments &arguments);
 int run_enrol(const Arguments &arguments);
+int run_unenrol(const Arguments &arguments);
 int run_assign(const Arguments &arguments);
 int run_serve(const Arguments &arguments);
 

@@ -10,6 +10,7 @@
 #include "http/server.h"
 #include "tsm/cli/commands.h"
 #include "tsm/home/home.h"
+#include "tsm/server/admin.h"
 #include "tsm/server/historian.h"
 #include "tsm/server/service.h"
 #include "tsm/store/store.h"
@@ -170,6 +171,12 @@ int run_enrol(const Arguments &arguments) {
   return 0;
 }
 
+int run_unenrol(const Arguments &arguments) {
+  Store(store_uri(arguments)).remove(arguments.names);
+  tools::write_file("-", "removed: " + std::to_string(arguments.names.size()) + "\n");
+  return 0;
+}
+
 int run_assign(const Arguments &arguments) {
   const std::string group = group_of(arguments);
   const Identity tsm = Home(arguments.home).load_identity();
@@ -182,22 +189,31 @@ int run_assign(const Arguments &arguments) {
 int run_serve(const Arguments &arguments) {
   const ServeArguments &serve = arguments.serve;
   const http::Endpoint endpoint = http::parse_endpoint(serve.listen);
+  std::optional<http::Endpoint> admin_endpoint;
+  if (!serve.admin.empty()) admin_endpoint = http::parse_endpoint(serve.admin);
   http::ListenOptions listen = listen_options(serve);
   http::ServerOptions options = server_options(serve);
   std::chrono::seconds time_to_answer = kTimeToAnswer;
   set_number("--deadline", serve.deadline, kMaxSeconds, &time_to_answer);
-  const Identity tsm = Home(arguments.home).load_identity();
+  const Home home(arguments.home);
+  const Identity tsm = home.load_identity();
   std::optional<StoredPlan> plan;
   if (!serve.plan.empty()) plan = plan_for(tsm, serve.plan);
 
   Store store(store_uri(arguments));
-  Service service(tsm, &store, time_to_answer);
+  Service service(tsm, &store, time_to_answer, !admin_endpoint);
   options.log = log_of(serve, &service);
+  std::optional<Admin> admin;
+  if (admin_endpoint) admin.emplace(&service, &store, home.admin_token());
   http::Server server(std::move(options));
-  const std::string url = server.listen(endpoint, service.handler(), std::move(listen));
+  std::string urls = server.listen(endpoint, service.handler(), listen) + "\n";
+  if (admin) {
+    listen.allows_own_pages = true;
+    urls += server.listen(*admin_endpoint, admin->handler(), std::move(listen)) + "\n";
+  }
   if (plan) store.assign(*plan, kDefaultGroup);
   const Historian historian(&store);
-  tools::write_file("-", url + "\n");
+  tools::write_file("-", urls);
   server.run();
   return 0;
 }

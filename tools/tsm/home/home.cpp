@@ -16,6 +16,9 @@ constexpr std::string_view kIdentityFile = "tsm.json";
 constexpr std::string_view kKeyFile = "tsm-key.pem";
 constexpr std::string_view kCaFile = "ca-tsm.pem";
 constexpr std::string_view kInventoryFile = "inventory.json";
+constexpr std::string_view kTokenFile = "admin-token";
+constexpr size_t kTokenLen = 32;  // bytes, before they are text
+constexpr size_t kMinTokenTextLen = 16;
 constexpr size_t kCaModulusLen = 256;
 constexpr size_t kMaxTsmidLen = 55;  // with its prefix it is a storage object ID of 64 bytes
 
@@ -114,6 +117,25 @@ Identity Home::load_identity() const {
   if (tools::file_exists(path(kCaFile))) ca = RsaKey::from_pem(tools::read_file(path(kCaFile)));
   if (ca && !ca->has_private_half()) ca.reset();
   return {*tsmid, *key, *chain, ca};
+}
+
+std::string Home::admin_token() const {
+  require_identity();
+  const std::string file = path(kTokenFile);
+  const tools::FileLock lock(path("lock"));  // servers that start together have the same
+  if (!tools::file_exists(file)) {
+    tools::write_file(file, base64url_encode(random_bytes(kTokenLen)) + "\n",
+                      tools::FileAccess::kOwnerOnly);
+  }
+  std::string token = tools::read_file(file);
+  token.erase(token.find_last_not_of(" \r\n") + 1);
+  const bool is_plain = std::ranges::all_of(token, [](char c) { return c > ' ' && c <= '~'; });
+  if (token.size() < kMinTokenTextLen || !is_plain) {
+    throw UsageError(file +
+                     " is no token: expected 16 or more printable ASCII characters; "
+                     "remove it, the next `serve --admin` makes one");
+  }
+  return token;
 }
 
 std::string Home::folder_of(const DeviceInfo &device) const {

@@ -6,7 +6,8 @@
 ///     ca-tsm.pem         the CA-TSM private key it was made with; needed only for TA images
 ///     inventory.json     the names of devices: see inventory.h
 ///     devices/KEY/       one per device, named by its key's fingerprint: see device_record.h
-///     lock               held while an identity is made
+///     admin-token        what changes on the page of `serve` are allowed by
+///     lock               held while an identity, or the token, is made
 ///
 /// Functions throw tools::UsageError. Files with private keys are made 0600, directories 0700.
 /// What cannot be read is an error, never taken for absent.
@@ -39,6 +40,9 @@ class Home {
   Identity create(std::string_view tsmid, std::string_view ca_pem) const;
 
   Identity load_identity() const;
+
+  /// Made when it is first asked for.
+  std::string admin_token() const;
 
   DeviceRecord open_record(const DeviceInfo &device) const {
     return DeviceRecord(folder_of(device), device);

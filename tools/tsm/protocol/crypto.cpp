@@ -290,6 +290,11 @@ Bytes sha256(std::string_view data) {
   return digest;
 }
 
+bool same_secret(std::string_view a, std::string_view b) {
+  const Bytes digest = sha256(a);
+  return CRYPTO_memcmp(digest.data(), sha256(b).data(), digest.size()) == 0;
+}
+
 Bytes rs256_sign(const RsaKey &key, std::string_view data) {
   const DigestContext context(EVP_MD_CTX_new());
   Bytes signature(key.modulus_len(), '\0');

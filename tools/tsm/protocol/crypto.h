@@ -60,6 +60,9 @@ class RsaKey {
 Bytes random_bytes(size_t len);
 Bytes sha256(std::string_view data);
 
+/// Takes the same time wherever the two differ, whatever their lengths.
+bool same_secret(std::string_view a, std::string_view b);
+
 /// RSASSA-PKCS1-v1_5 with SHA-256.
 Bytes rs256_sign(const RsaKey &key, std::string_view data);
 bool rs256_verify(const RsaKey &key, std::string_view data, std::string_view signature);

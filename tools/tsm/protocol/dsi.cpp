@@ -38,18 +38,6 @@ std::string text_of(const Json &object, std::string_view name) {
   return text == nullptr ? std::string() : *text;
 }
 
-/// SPs in the order in which the device names them first, by an SD or by an AIK.
-std::vector<std::string> service_providers(const Json &document) {
-  std::vector<std::string> spids;
-  for (const Json *list : {&security_domains(document), &aiks(document)}) {
-    for (const Json &entry : *list) {
-      const std::string spid = text_of(entry, "spid");
-      if (std::ranges::find(spids, spid) == spids.end()) spids.push_back(spid);
-    }
-  }
-  return spids;
-}
-
 struct Node {
   std::string text;
   std::vector<Node> children;
@@ -81,6 +69,17 @@ Node sp_node(const Json &document, const std::string &spid) {
 }
 
 }  // namespace
+
+std::vector<std::string> service_providers(const Json &document) {
+  std::vector<std::string> spids;
+  for (const Json *list : {&security_domains(document), &aiks(document)}) {
+    for (const Json &entry : *list) {
+      const std::string spid = text_of(entry, "spid");
+      if (std::ranges::find(spids, spid) == spids.end()) spids.push_back(spid);
+    }
+  }
+  return spids;
+}
 
 std::vector<Domain> domains_of(const Json &document) {
   std::vector<Domain> domains;

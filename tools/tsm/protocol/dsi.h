@@ -27,6 +27,9 @@ bool is_dsi_document(const Json &document);
 /// Reads a document as --dsi-out writes it; throws tools::UsageError.
 Json parse_dsi(std::string_view text);
 
+/// SPs in the order in which the device names them first, by a domain or by an AIK.
+std::vector<std::string> service_providers(const Json &document);
+
 /// A security domain, and the TAs in it.
 struct Domain {
   std::string name;

@@ -15,16 +15,17 @@ std::string digest_of(std::string_view bytes) {
   return hex_encode(sha256(bytes));
 }
 
-PlannedApp read_app(const Json &app, Store *store) {
-  const std::string digest = app.at("image");
-  const std::optional<std::string> image = store->find_image(digest);
+Bytes read_image(const std::string &digest, Store *store) {
+  std::optional<std::string> image = store->find_image(digest);
   if (!image || digest_of(*image) != digest) {
     throw std::runtime_error("the stored image " + digest + " is not whole");
   }
-  return {.taid = app.at("taid"), .version = app.at("version"), .image = *image};
+  return std::move(*image);
 }
 
-Plan read_stored_plan(const std::string &digest, Store *store) {
+enum class Images { kRead, kLeft };
+
+Plan read_stored_plan(const std::string &digest, Store *store, Images images) {
   const std::optional<std::string> document = store->find_plan_document(digest);
   if (!document || digest_of(*document) != digest) {
     throw std::runtime_error("the stored plan " + digest + " is not whole");
@@ -37,7 +38,12 @@ Plan read_stored_plan(const std::string &digest, Store *store) {
     planned.sd = domain.at("sd");
     planned.sp = domain.at("sp");
     planned.spcert = domain.at("cert");
-    for (const Json &app : domain.at("apps")) planned.apps.push_back(read_app(app, store));
+    for (const Json &app : domain.at("apps")) {
+      planned.apps.push_back(
+          {.taid = app.at("taid"),
+           .version = app.at("version"),
+           .image = images == Images::kRead ? read_image(app.at("image"), store) : Bytes()});
+    }
     plan.domains.push_back(std::move(planned));
   }
   return plan;
@@ -64,6 +70,10 @@ StoredPlan stored_plan(const Plan &plan) {
   return stored;
 }
 
+Plan plan_outline(const std::string &digest, Store *store) {
+  return read_stored_plan(digest, store, Images::kLeft);
+}
+
 std::shared_ptr<const Plan> PlanShelf::find_here(const std::string &digest) {
   const std::lock_guard guard(lock_);
   const auto found = std::ranges::find(entries_, digest, &Entry::digest);
@@ -73,7 +83,7 @@ std::shared_ptr<const Plan> PlanShelf::find_here(const std::string &digest) {
 std::shared_ptr<const Plan> PlanShelf::find(const std::string &digest) {
   if (digest.empty()) return nullptr;
   if (std::shared_ptr<const Plan> plan = find_here(digest)) return plan;
-  auto plan = std::make_shared<const Plan>(read_stored_plan(digest, store_));
+  auto plan = std::make_shared<const Plan>(read_stored_plan(digest, store_, Images::kRead));
   const std::lock_guard guard(lock_);
   entries_.push_front({digest, plan});
   if (entries_.size() > kNumPlans) entries_.pop_back();

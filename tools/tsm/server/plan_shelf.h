@@ -19,6 +19,9 @@ namespace tsm {
 /// Plans that say the same have the same digest.
 StoredPlan stored_plan(const Plan &plan);
 
+/// Without its images, which are only to be sent; the same exceptions as PlanShelf::find().
+Plan plan_outline(const std::string &digest, Store *store);
+
 /// The plans that were asked for last. A digest stands for one plan for ever, so what is here is
 /// never old. For any number of threads.
 class PlanShelf {

@@ -10,13 +10,6 @@ using http::Request;
 constexpr char kOtrpJson[] = "application/otrp+json";
 constexpr char kSecondsToRetry[] = "5";
 
-http::Answer unavailable(const std::string &why) {
-  http::Answer answer = http::failure(503, "the store cannot be used now: expected later");
-  answer.headers.push_back({"Retry-After", kSecondsToRetry});
-  answer.note = why;
-  return answer;
-}
-
 std::string note_of(const DoorAnswer &answer) {
   std::string note = (answer.message.empty() ? "" : answer.message + " ") + answer.outcome;
   if (!answer.next.empty()) note += " -> " + answer.next;
@@ -25,7 +18,15 @@ std::string note_of(const DoorAnswer &answer) {
 
 }  // namespace
 
-Service::Service(const Identity &tsm, Store *store, std::chrono::seconds time_to_answer)
+http::Answer unavailable(const StoreError &error) {
+  http::Answer answer = http::failure(503, "the store cannot be used now: expected later");
+  answer.headers.push_back({"Retry-After", kSecondsToRetry});
+  answer.note = error.what();
+  return answer;
+}
+
+Service::Service(const Identity &tsm, Store *store, std::chrono::seconds time_to_answer,
+                 bool has_metrics)
     : store_(store), door_(tsm, store, time_to_answer) {
   router_.add({.method = "POST",
                .path = "/tam/*",
@@ -37,6 +38,7 @@ Service::Service(const Identity &tsm, Store *store, std::chrono::seconds time_to
   router_.add({.method = "GET",
                .path = "/healthz",
                .answer = [this](const Request &, const Captures &) { return health(); }});
+  if (!has_metrics) return;
   router_.add({.method = "GET",
                .path = "/metrics",
                .answer = [this](const Request &, const Captures &) { return metrics(); }});
@@ -57,7 +59,7 @@ http::Answer Service::post(const std::string &device_id, const std::string &body
     return answer;
   } catch (const StoreError &error) {
     metrics_.count_failure();
-    return unavailable(error.what());
+    return unavailable(error);
   }
 }
 
@@ -66,7 +68,7 @@ http::Answer Service::health() {
     store_->ping();
     return http::text_answer(200, "application/json", "{\"status\":\"ok\"}\n");
   } catch (const StoreError &error) {
-    return unavailable(error.what());
+    return unavailable(error);
   }
 }
 
@@ -74,7 +76,7 @@ http::Answer Service::metrics() {
   try {
     return http::text_answer(200, "text/plain; version=0.0.4", metrics_.text(count_fleet(store_)));
   } catch (const StoreError &error) {
-    return unavailable(error.what());
+    return unavailable(error);
   }
 }
 
