@@ -113,9 +113,10 @@ void LoadedImage::remember_variables() {
     const uintptr_t begin = std::max(segments.base + header.p_vaddr, closed);
     const uintptr_t end = segments.base + header.p_vaddr + header.p_memsz;
     if (begin >= end) continue;
-    Variables &variables = variables_.emplace_back(reinterpret_cast<volatile uint8_t *>(begin),
-                                                   std::vector<uint8_t>(end - begin));
-    copy(variables.at, variables.initial.size(), variables.initial.data());
+    auto *at = reinterpret_cast<volatile uint8_t *>(begin);
+    std::vector<uint8_t> initial(end - begin);
+    copy(at, initial.size(), initial.data());
+    variables_.push_back({at, std::move(initial)});
   }
 }
 

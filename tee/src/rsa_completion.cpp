@@ -63,7 +63,8 @@ BIGNUM *root_of(const BIGNUM *square, Scratch &scratch) {
   BIGNUM *root = scratch.number(), *leading = scratch.number(), *other = scratch.number();
   int known = kSpareBits;
   require(BN_set_bit(root, known));
-  for (int halvings = std::bit_width(static_cast<unsigned>(num_bits)); halvings >= 0; --halvings) {
+  for (auto halvings = static_cast<int>(std::bit_width(static_cast<unsigned>(num_bits)));
+       halvings >= 0; --halvings) {
     const int wanted = std::min((num_bits >> halvings) + kSpareBits, num_bits);
     require(BN_lshift(root, root, wanted - known));
     require(BN_rshift(leading, square, 2 * (num_bits - wanted)));
