@@ -45,6 +45,60 @@ static int tokenize(const jsmn_string &text, jsmn_token *tokens, int num_tokens)
                     static_cast<unsigned>(num_tokens));
 }
 
+// Where a string begins that is a member's value: at a quote behind a colon. NULL: nowhere.
+static const char *find_value_string(const char *at, const char *end) {
+  while (at < end) {
+    const auto *quote = static_cast<const char *>(memchr(at, '"', static_cast<size_t>(end - at)));
+    if (quote == nullptr || quote[-1] == ':') return quote;
+    at = quote + 1;
+  }
+  return nullptr;
+}
+
+// The quote that ends the string. NULL when there is none, or something before it that the
+// tokenizer would look at.
+static const char *find_plain_end(const char *string, const char *end) {
+  const auto *quote =
+      static_cast<const char *>(memchr(string, '"', static_cast<size_t>(end - string)));
+  if (quote == nullptr) return nullptr;
+  const auto len = static_cast<size_t>(quote - string);
+  const bool is_plain = memchr(string, '\\', len) == nullptr && memchr(string, 0, len) == nullptr;
+  return is_plain ? quote : nullptr;
+}
+
+// Passes over the values that are plain strings: a text with an image is little else, and the
+// tokenizer would look at each character. What is before one it reads as if the text ended there,
+// which cuts nothing in two: a word ends at the colon, and of a string that is not over it goes
+// back to the beginning. When it has not come up to the value, for that reason or any other, the
+// rest of the text is left to it.
+static void pass_over_values(jsmn_parser *parser, const jsmn_string &text, jsmn_token *tokens,
+                             unsigned num_tokens) {
+  const char *end = text.data + text.len;
+  const char *begin = text.data + 1;
+  while ((begin = find_value_string(begin, end)) != nullptr) {
+    const auto at = static_cast<uint32_t>(begin - text.data);
+    jsmn_parse(parser, text.data, at, tokens, num_tokens);
+    const char *closing = find_plain_end(begin + 1, end);
+    if (parser->pos != at || closing == nullptr) return;
+    jsmntok_t *token = jsmn_alloc_token(parser, tokens, num_tokens);
+    if (token == nullptr) return;
+    parser->pos = static_cast<uint32_t>(closing - text.data);
+    jsmn_fill_token(token, JSMN_STRING, static_cast<int>(at + 1), static_cast<int>(parser->pos));
+    if (parser->toksuper != -1) ++tokens[parser->toksuper].size;
+    ++parser->pos;
+    begin = closing + 1;
+  }
+}
+
+// The same as tokenize() for a text of few tokens, which may be large. An error may be another one.
+static int tokenize_few(const jsmn_string &text, jsmn_token *tokens, int num_tokens) {
+  if (text.data == nullptr || text.len == 0 || text.len > INT32_MAX) return JSMN_ERROR_NOMEM;
+  jsmn_parser parser;
+  jsmn_init(&parser);
+  pass_over_values(&parser, text, tokens, static_cast<unsigned>(num_tokens));
+  return jsmn_parse(&parser, text.data, text.len, tokens, static_cast<unsigned>(num_tokens));
+}
+
 static tee_ptr<jsmn_token> allocate_tokens(int num_tokens) {
   const uint64_t len = static_cast<uint64_t>(num_tokens) * sizeof(jsmn_token);
   if (len > UINT32_MAX) return {};
@@ -73,7 +127,7 @@ static int count_and_tokenize(const jsmn_string &text, tee_ptr<jsmn_token> *toke
 static int tokenize_text(const jsmn_string &text, tee_ptr<jsmn_token> *tokens) {
   tee_ptr<jsmn_token> room = allocate_tokens(kUsualTokens);
   CHECK_AS(kInitObject, room, -1, "%s", kNoMemory);
-  const int count = tokenize(text, room.get(), kUsualTokens);
+  const int count = tokenize_few(text, room.get(), kUsualTokens);
   if (count < 1) {
     room.reset();
     return count_and_tokenize(text, tokens);

@@ -44,6 +44,9 @@ TEST_F(TokenReader, TakesTheTokenAfterTheFirstStringThatEqualsTheKey) {
       {R"({"ab":"1"})", "a", "NULL"},
       {R"({"\u0061":"1"})", "a", "NULL"},
       {R"({a:"1"})", "a", "NULL"},
+      {R"({x"y":"1"})", "y", "NULL"},
+      {R"({"x:":":","a":"1"})", "x:", ":"},
+      {R"({"x":"y\"a","a":"2"})", "a", "2"},
       {"{}", "a", "NULL"},
       {R"({"":"1"})", "", "1"},
       {std::string("{\"a\":\"1\"}\0\"b\":\"2\"", 17), "b", "NULL"},
@@ -57,9 +60,16 @@ TEST_F(TokenReader, TakesTheTokenAfterTheFirstStringThatEqualsTheKey) {
 }
 
 TEST_F(TokenReader, RefusesWhatIsNoObject) {
-  const std::string cases[] = {
-      "",           std::string("\0{}", 3),        R"({"a":"\x"})", R"({"a)", R"({"a":1)",
-      R"({"a":1])", std::string("{\"a\":1\0}", 8), R"(x {"a":1})",  "[{}]"};
+  const std::string cases[] = {"",
+                               std::string("\0{}", 3),
+                               R"({"a":"\x"})",
+                               R"({"a)",
+                               R"({"a":1)",
+                               R"({"a":1])",
+                               std::string("{\"a\":1\0}", 8),
+                               std::string("{\"a\":\"\0\"}", 9),
+                               R"(x {"a":1})",
+                               "[{}]"};
   for (const std::string &text : cases) EXPECT_EQ(over(text).get(), nullptr) << text;
 }
 
