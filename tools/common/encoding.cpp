@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "common/encoding.h"
 
+#include <algorithm>
+#include <array>
+#include <cstddef>
 #include <cstdint>
 
 namespace tools {
@@ -12,39 +15,64 @@ constexpr std::string_view kBase64Url =
     "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
 constexpr std::string_view kHex = "0123456789abcdef";
 
-std::string encode(std::string_view bytes, std::string_view alphabet) {
-  std::string text;
-  text.reserve((bytes.size() + 2) / 3 * 4);
-  uint32_t bits = 0;
-  int num_bits = 0;
-  for (const char byte : bytes) {
-    bits = bits << 8 | static_cast<uint8_t>(byte);
-    for (num_bits += 8; num_bits >= 6; num_bits -= 6) {
-      text += alphabet[bits >> (num_bits - 6) & 0x3F];
-    }
+constexpr uint32_t kNoDigit = 64;
+
+using Digits = std::array<uint8_t, 256>;
+constexpr Digits digits_of(std::string_view alphabet) {
+  Digits digits{};
+  digits.fill(kNoDigit);
+  for (size_t i = 0; i < alphabet.size(); ++i) {
+    digits[static_cast<uint8_t>(alphabet[i])] = static_cast<uint8_t>(i);
   }
-  if (num_bits > 0) text += alphabet[bits << (6 - num_bits) & 0x3F];
+  return digits;
+}
+constexpr Digits kBase64Digits = digits_of(kBase64);
+constexpr Digits kBase64UrlDigits = digits_of(kBase64Url);
+
+/// Up to three bytes, as one number.
+uint32_t number_of(std::string_view bytes) {
+  uint32_t bits = 0;
+  for (size_t i = 0; i < 3; ++i) {
+    bits = bits << 8 | (i < bytes.size() ? static_cast<uint8_t>(bytes[i]) : 0u);
+  }
+  return bits;
+}
+
+void put_digits(uint32_t bits, std::string_view alphabet, char *out) {
+  for (int i = 0; i < 4; ++i) out[i] = alphabet[bits >> (18 - 6 * i) & 0x3F];
+}
+
+std::string encode(std::string_view bytes, std::string_view alphabet) {
+  std::string text((bytes.size() + 2) / 3 * 4, '\0');
+  char *out = text.data();
+  const size_t whole = bytes.size() / 3 * 3;
+  for (size_t at = 0; at < whole; at += 3, out += 4) {
+    put_digits(number_of({bytes.data() + at, 3}), alphabet, out);
+  }
+  if (whole < bytes.size()) put_digits(number_of(bytes.substr(whole)), alphabet, out);
+  text.resize((bytes.size() * 4 + 2) / 3);
   return text;
 }
 
-std::optional<Bytes> decode(std::string_view text, std::string_view alphabet) {
+std::optional<Bytes> decode(std::string_view text, const Digits &digits) {
   if (text.size() % 4 == 1) return std::nullopt;
-  Bytes bytes;
-  bytes.reserve(text.size() / 4 * 3 + 2);
-  uint32_t bits = 0;
-  int num_bits = 0;
-  for (const char c : text) {
-    const size_t value = alphabet.find(c);
-    if (value == std::string_view::npos) return std::nullopt;
-    bits = bits << 6 | static_cast<uint32_t>(value);
-    num_bits += 6;
-    if (num_bits >= 8) {
-      num_bits -= 8;
-      bytes += static_cast<char>(bits >> num_bits & 0xFF);
+  Bytes bytes((text.size() + 3) / 4 * 3, '\0');
+  char *out = bytes.data();
+  uint32_t seen = 0;  // all digits, so that one look at the end finds what is none
+  for (size_t at = 0; at < text.size(); at += 4) {
+    uint32_t bits = 0;
+    for (size_t i = at; i < at + 4; ++i) {
+      const uint32_t digit = i < text.size() ? digits[static_cast<uint8_t>(text[i])] : 0;
+      seen |= digit;
+      bits = bits << 6 | digit;
     }
+    for (int shift = 16; shift >= 0; shift -= 8) *out++ = static_cast<char>(bits >> shift & 0xFF);
   }
-  const bool has_spare_bits = (bits & ((1u << num_bits) - 1)) != 0;
-  if (has_spare_bits) return std::nullopt;
+  const size_t len = text.size() * 3 / 4;
+  const bool has_spare_bits = std::any_of(bytes.begin() + static_cast<std::ptrdiff_t>(len),
+                                          bytes.end(), [](char byte) { return byte != '\0'; });
+  if ((seen & kNoDigit) != 0 || has_spare_bits) return std::nullopt;
+  bytes.resize(len);
   return bytes;
 }
 
@@ -63,11 +91,11 @@ std::string base64url_encode(std::string_view bytes) {
 std::optional<Bytes> base64_decode(std::string_view text) {
   if (text.size() % 4 != 0) return std::nullopt;
   for (int i = 0; i < 2 && text.ends_with('='); ++i) text.remove_suffix(1);
-  return decode(text, kBase64);
+  return decode(text, kBase64Digits);
 }
 
 std::optional<Bytes> base64url_decode(std::string_view text) {
-  return decode(text, kBase64Url);
+  return decode(text, kBase64UrlDigits);
 }
 
 std::string hex_encode(std::string_view bytes) {
