@@ -22,10 +22,19 @@ TEST(DeviceJson, IsWrittenAsTheDeviceWritesIt) {
     EXPECT_EQ(serialize_as_device(*value), out);
     EXPECT_EQ(parse_json(out), value);
   }
-  for (const std::string &text : {std::string("{"), std::string("{}x"), std::string(),
-                                  std::string("\"\xFF\""), std::string(100000, '[')}) {
+  for (const std::string &text :
+       {std::string("{"), std::string("{}x"), std::string(), std::string("\"\xFF\""),
+        std::string(100000, '['), "[" + std::string(64, '[') + std::string(65, ']')}) {
     EXPECT_FALSE(parse_json(text)) << text.substr(0, 10);
   }
+}
+
+TEST(DeviceJson, IsWrittenAsTheLibraryWritesIt) {
+  for (const char *text : {R"({"a":[1,-2,1.5,null,true,{}],"b":[]})", R"(["","x\"y\\","\n\u0001"])",
+                           "[\"\xC3\xA9~\x7F\"]"}) {
+    EXPECT_EQ(compact(Json::parse(text)), text);
+  }
+  EXPECT_THROW((void)compact("\xFF"), Json::type_error);
 }
 
 TEST(DsiTree, ListsDomainsBelowTheirProviders) {

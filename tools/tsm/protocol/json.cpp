@@ -11,6 +11,25 @@ namespace {
 
 constexpr int kMaxDepth = 64;
 
+/// Printable ASCII that needs no escape. All of it is looked at, which goes faster than stopping.
+bool is_plain(std::string_view text) {
+  size_t num_others = 0;
+  for (const char c : text) num_others += c < ' ' || c > '~' || c == '"' || c == '\\' ? 1 : 0;
+  return num_others == 0;
+}
+
+/// Whether the parser can have the text as it is: without control characters, and without so many
+/// brackets that they could be nested too deep.
+bool needs_no_care(std::string_view text) {
+  size_t num_controls = 0;
+  size_t num_opened = 0;
+  for (const char c : text) {
+    num_controls += static_cast<unsigned char>(c) < ' ' ? 1 : 0;
+    num_opened += c == '{' || c == '[' ? 1 : 0;
+  }
+  return num_controls == 0 && num_opened <= kMaxDepth;
+}
+
 /// The text with the control characters of its strings escaped; nothing when it is nested too deep
 /// for the parser, which recurses without a bound of its own.
 std::optional<std::string> prepare(std::string_view text) {
@@ -78,15 +97,41 @@ void put_real(double value, std::string *out) {
   *out += text;
 }
 
+struct DeviceForm {
+  static void put_text(const std::string &value, std::string *out) { put_string(value, out); }
+  static void put_number(const Json &value, std::string *out) {
+    if (value.is_number_float()) return put_real(value.get<double>(), out);
+    *out += value.dump();
+  }
+};
+
+/// Most strings are long and in base64: what needs no escape is found out and copied at once.
+struct CompactForm {
+  static constexpr size_t kRoom = 4096;  // for what follows a long string
+  static void put_text(const std::string &value, std::string *out) {
+    if (is_plain(value)) {
+      out->reserve(out->size() + value.size() + kRoom);
+      *out += '"';
+      *out += value;
+      *out += '"';
+    } else {
+      *out += Json(value).dump();
+    }
+  }
+  static void put_number(const Json &value, std::string *out) { *out += value.dump(); }
+};
+
+/// A number, or a literal, is put as one.
+template <class Form>
 void put_value(const Json &value, std::string *out) {
   const char *separator = "";
   if (value.is_object()) {
     *out += '{';
-    for (const auto &[name, member] : value.items()) {
+    for (const auto &[name, member] : value.get_ref<const Json::object_t &>()) {
       *out += separator;
-      put_string(name, out);
+      Form::put_text(name, out);
       *out += ':';
-      put_value(member, out);
+      put_value<Form>(member, out);
       separator = ",";
     }
     *out += '}';
@@ -94,16 +139,14 @@ void put_value(const Json &value, std::string *out) {
     *out += '[';
     for (const Json &element : value) {
       *out += separator;
-      put_value(element, out);
+      put_value<Form>(element, out);
       separator = ",";
     }
     *out += ']';
   } else if (value.is_string()) {
-    put_string(value.get_ref<const std::string &>(), out);
-  } else if (value.is_number_float()) {
-    put_real(value.get<double>(), out);
+    Form::put_text(value.get_ref<const std::string &>(), out);
   } else {
-    *out += value.dump();  // integers and literals
+    Form::put_number(value, out);
   }
 }
 
@@ -116,9 +159,13 @@ const Json *find_member(const Json &value, std::string_view name) {
 }  // namespace
 
 std::optional<Json> parse_json(std::string_view text) {
-  const std::optional<std::string> prepared = prepare(text);
-  if (!prepared) return std::nullopt;
-  Json value = Json::parse(*prepared, nullptr, false);
+  std::optional<std::string> prepared;
+  if (!needs_no_care(text)) {
+    prepared = prepare(text);
+    if (!prepared) return std::nullopt;
+    text = *prepared;
+  }
+  Json value = Json::parse(text.begin(), text.end(), nullptr, false);
   if (value.is_discarded()) return std::nullopt;
   return value;
 }
@@ -138,7 +185,13 @@ std::string json_problem(std::string_view text) {
 
 std::string serialize_as_device(const Json &value) {
   std::string text;
-  put_value(value, &text);
+  put_value<DeviceForm>(value, &text);
+  return text;
+}
+
+std::string compact(const Json &value) {
+  std::string text;
+  put_value<CompactForm>(value, &text);
   return text;
 }
 

@@ -26,6 +26,10 @@ std::string json_problem(std::string_view text);
 /// escaped (the slash among them), all others stand as they are; numbers are plain.
 std::string serialize_as_device(const Json &value);
 
+/// The text that dump() makes, sooner. Throws as that does, Json::type_error, for what is not
+/// UTF-8.
+std::string compact(const Json &value);
+
 /// The object, array or string member `name`; NULL when `value` is no object or has none such.
 const Json *find_object(const Json &value, std::string_view name);
 const Json *find_array(const Json &value, std::string_view name);

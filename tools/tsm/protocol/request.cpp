@@ -21,9 +21,9 @@ bool has_image(MessageId id) {
 }
 
 /// The device compares and signs some values as they stand in the text, so a slash is not escaped.
-std::string compact(const Json &value) {
+std::string text_of(const Json &value) {
   try {
-    return value.dump();
+    return compact(value);
   } catch (const Json::type_error &) {
     throw UsageError("a value is not UTF-8 text: expected names, IDs and PEM texts");
   }
@@ -117,7 +117,7 @@ Json tbs_request(const Message &message, const RequestOptions &options, const Js
 
 std::string seal(const Json &tbs, std::string_view request_name, std::string_view tsmid,
                  const RsaKey &key, const Json &extra) {
-  return seal_text(compact(tbs), request_name, tsmid, key, extra);
+  return seal_text(text_of(tbs), request_name, tsmid, key, extra);
 }
 
 std::string seal_text(std::string_view payload, std::string_view request_name,
@@ -132,7 +132,7 @@ std::string seal_text(std::string_view payload, std::string_view request_name,
   envelope.update(extra);
   Json message = Json::object();
   message[std::string(request_name)] = std::move(envelope);
-  return compact(message);
+  return text_of(message);
 }
 
 Json ta_info_request(std::string_view spid, std::string_view taid) {
@@ -142,7 +142,7 @@ Json ta_info_request(std::string_view spid, std::string_view taid) {
 
 std::string make_request(MessageId id, RequestOptions options, const Identity &tsm,
                          const DeviceInfo &device, const Json *dsi) {
-  if (id == MessageId::kGetTaInfo) return compact(ta_info_request(options.spid, options.taid));
+  if (id == MessageId::kGetTaInfo) return text_of(ta_info_request(options.spid, options.taid));
 
   const Message &message = message_of(id);
   if (options.rid.empty()) options.rid = random_id();
@@ -159,7 +159,7 @@ std::string make_request(MessageId id, RequestOptions options, const Identity &t
         signature2(ca_of(tsm), options.tid, options.rid, device.device_id, options.taid, tsm.tsmid);
     image = encrypted_ta(aik_of(dsi, options.spid), options.image, image_member(id));
   }
-  if (!content.is_null()) content = jwe_encrypt(device.tee_key, compact(content));
+  if (!content.is_null()) content = jwe_encrypt(device.tee_key, text_of(content));
   return seal(tbs_request(message, options, chain, image, content), message.request, tsm.tsmid,
               tsm.key, extra);
 }
