@@ -103,13 +103,13 @@ Json encrypted_ta(const RsaKey &aik, std::string_view image, std::string_view im
           {std::string(image_name), base64url_encode(ciphertext)}};
 }
 
-Json tbs_request(const Message &message, const RequestOptions &options, const Json &key_chain,
-                 const Json &encrypted_ta, const Json &content) {
+Json tbs_request(const Message &message, const RequestOptions &options, Json key_chain,
+                 Json encrypted_ta, Json content) {
   Json members = {{"ver", "1.0"}, {"rid", options.rid}, {"tid", options.tid}};
   if (!options.dsihash.empty()) members["dsihash"] = options.dsihash;
-  if (!key_chain.is_null()) members["tsm_key_chain"] = key_chain;
-  if (!encrypted_ta.is_null()) members["encrypted_ta"] = encrypted_ta;
-  if (!content.is_null()) members["content"] = content;
+  if (!key_chain.is_null()) members["tsm_key_chain"] = std::move(key_chain);
+  if (!encrypted_ta.is_null()) members["encrypted_ta"] = std::move(encrypted_ta);
+  if (!content.is_null()) members["content"] = std::move(content);
   Json tbs = Json::object();
   tbs[std::string(message.tbs_request)] = std::move(members);
   return tbs;
@@ -123,9 +123,9 @@ std::string seal(const Json &tbs, std::string_view request_name, std::string_vie
 std::string seal_text(std::string_view payload, std::string_view request_name,
                       std::string_view tsmid, const RsaKey &key, const Json &extra) {
   const std::string protect = base64url_encode(kProtectedHeader);
-  const std::string payload_text = base64url_encode(payload);
+  std::string payload_text = base64url_encode(payload);
   const Bytes signature = rs256_sign(key, protect + "." + payload_text);
-  Json envelope = {{"payload", payload_text},
+  Json envelope = {{"payload", std::move(payload_text)},
                    {"protect", protect},
                    {"signature", base64url_encode(signature)},
                    {"header", {{"tsmid", tsmid}}}};
@@ -160,8 +160,8 @@ std::string make_request(MessageId id, RequestOptions options, const Identity &t
     image = encrypted_ta(aik_of(dsi, options.spid), options.image, image_member(id));
   }
   if (!content.is_null()) content = jwe_encrypt(device.tee_key, text_of(content));
-  return seal(tbs_request(message, options, chain, image, content), message.request, tsm.tsmid,
-              tsm.key, extra);
+  return seal(tbs_request(message, options, std::move(chain), std::move(image), std::move(content)),
+              message.request, tsm.tsmid, tsm.key, extra);
 }
 
 }  // namespace tsm

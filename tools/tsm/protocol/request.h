@@ -53,8 +53,8 @@ Json encrypted_ta(const RsaKey &aik, std::string_view image, std::string_view im
                   const std::optional<Bytes> &key = {}, const std::optional<Bytes> &iv = {});
 
 /// The to-be-signed request. Empty parts (null) are left out; `rid` and `tid` must be set.
-Json tbs_request(const Message &message, const RequestOptions &options, const Json &key_chain,
-                 const Json &encrypted_ta, const Json &content);
+Json tbs_request(const Message &message, const RequestOptions &options, Json key_chain,
+                 Json encrypted_ta, Json content);
 
 /// The signed message; `extra` members are added to the envelope behind its header. The payload is
 /// the compact text of `tbs`, or exactly the given text.

@@ -48,12 +48,17 @@ void Visit::begin() {
   begin_session(&progress_);
 }
 
-Response Visit::verified(const std::string &body) const {
-  const std::optional<Json> state = parse_json(row_.state);
-  const DeviceInfo device = stored_device_info(row_);
+const DeviceInfo &Visit::device() {
+  if (!device_) device_ = stored_device_info(row_);
+  return *device_;
+}
+
+Response Visit::verified(const std::string &body) {
+  std::optional<Json> state;
+  if (!progress_.state) state = parse_json(row_.state);
+  const Json *dsi = progress_.state ? &*progress_.state : state ? &*state : nullptr;
   try {
-    return open_response(
-        body, {.tee_key = device.tee_key, .tsm_key = tsm_.key, .dsi = state ? &*state : nullptr});
+    return open_response(body, {.tee_key = device().tee_key, .tsm_key = tsm_.key, .dsi = dsi});
   } catch (const NotVerified &error) {
     try {
       (void)parse_envelope(body);
@@ -84,7 +89,7 @@ void Visit::hear(const std::string &body) {
   event_.reason = refusal_of(response);
   event_.outcome = event_.reason.empty() ? "pass" : "fail";
   learn(open.order, response, event_.reason, &progress_);
-  if (response.dsi_text && progress_.state) row_.state = progress_.state->dump();
+  if (response.dsi_text && progress_.state) row_.state = compact(*progress_.state);
 }
 
 void Visit::set_outcome(const char *outcome, const std::string &reason) {
@@ -104,8 +109,8 @@ std::string Visit::go_on(const Plan *plan, std::chrono::seconds time_to_answer) 
   return request;
 }
 
-std::string Visit::follow(const Decision &decision) {
-  if (decision.order) return try_to_send(*decision.order, decision.reason);
+std::string Visit::follow(Decision decision) {
+  if (decision.order) return try_to_send(std::move(*decision.order), decision.reason);
   if (decision.obstacles.empty()) {
     set_outcome("current", "");
     settle(&progress_);
@@ -116,12 +121,12 @@ std::string Visit::follow(const Decision &decision) {
 }
 
 /// What cannot be made, for want of the CA's key, say, is in the way like what the device refuses.
-std::string Visit::try_to_send(const Order &order, const std::string &reason) {
+std::string Visit::try_to_send(Order order, const std::string &reason) {
   const std::string text = order_text(order);
   const bool is_news = row_.outcome.empty() || changes_device(order);
   if (is_news) set_outcome("behind", text + ": " + reason);
   try {
-    std::string request = send(order);
+    std::string request = send(std::move(order));
     event_.next = text;
     return request;
   } catch (const tools::UsageError &error) {
@@ -136,7 +141,7 @@ std::string Visit::send(Order order) {
   options.tid = random_id();
   const Json *state = progress_.state ? &*progress_.state : nullptr;
   if (quotes_dsi(order.message)) options.dsihash = dsi_hash(*state);
-  std::string text = make_request(order.message, options, tsm_, stored_device_info(row_), state);
+  std::string text = make_request(order.message, options, tsm_, device(), state);
   row_.open_message = message_of(order.message).command;
   row_.open_request = open_request_text({.order = order, .sent = sent_request(order)});
   return text;

@@ -56,10 +56,12 @@ class Visit {
   const std::string &lost() const { return lost_; }
 
  private:
-  Response verified(const std::string &body) const;
+  /// Read once: what its key needs to be used is kept with it.
+  const DeviceInfo &device();
+  Response verified(const std::string &body);
   void set_outcome(const char *outcome, const std::string &reason);
-  std::string follow(const Decision &decision);
-  std::string try_to_send(const Order &order, const std::string &reason);
+  std::string follow(Decision decision);
+  std::string try_to_send(Order order, const std::string &reason);
   std::string send(Order order);
 
   const Identity &tsm_;
@@ -68,6 +70,7 @@ class Visit {
   Progress progress_;
   Event event_;
   std::string lost_;
+  std::optional<DeviceInfo> device_;
 };
 
 }  // namespace tsm
