@@ -32,6 +32,29 @@ class FleetAgent : public broker::Agent {
   device::Session session_;
 };
 
+/// The servers that a device calls, which take turns, from one of them on.
+class Tsms {
+ public:
+  Tsms(const Member &member, const CallOptions &options, size_t first) : next_(first) {
+    for (const std::string &tsm : options.tsms) {
+      urls_.push_back(broker::device_url(tsm, member.device_id));
+      clients_.emplace_back(
+          http::ClientOptions{.ca_file = options.ca_file, .user_agent = kProgram});
+    }
+  }
+
+  http::Reply send(http::Call call) {
+    const size_t at = next_++ % urls_.size();
+    call.url = urls_[at];
+    return clients_[at].send(call);
+  }
+
+ private:
+  std::vector<std::string> urls_;
+  std::vector<http::Client> clients_;
+  size_t next_;
+};
+
 std::string reason_of(const http::ClientError &error) {
   switch (error.failure()) {
     case http::Failure::kNoConnection:
@@ -86,11 +109,11 @@ broker::Outcome call_tsm(const Member &member, const CallOptions &options, const
                          const std::function<void()> &on_message) {
   const Clock::time_point start = Clock::now();
   device::AgentLog log(false);
-  http::Client client({.ca_file = options.ca_file, .user_agent = kProgram});
+  Tsms tsms(member, options, random());
   const auto post =
-      lossy([&](const http::Call &call) { return client.send(call); }, options.faults, random);
+      lossy([&](const http::Call &call) { return tsms.send(call); }, options.faults, random);
   broker::Ends ends;
-  ends.url = broker::device_url(options.tsm, member.device_id);
+  ends.url = broker::device_url(options.tsms[0], member.device_id);
   ends.post = [&](const http::Call &call) { return measured(post, call, figures); };
   ends.open_agent = [&] { return std::make_unique<FleetAgent>(member); };
   ends.on_exchange = [&](const broker::Exchange &exchange) {

@@ -5,6 +5,7 @@
 
 #include <functional>
 #include <string>
+#include <vector>
 
 #include "device/broker/broker.h"
 #include "fleet/faults.h"
@@ -14,13 +15,13 @@
 namespace fleet {
 
 struct CallOptions {
-  std::string tsm;  // URL, which the device's ID is added to
+  std::vector<std::string> tsms;  // URLs, which the device's ID is added to; asked in turn
   std::string ca_file;
   broker::Policy policy;
   Faults faults;
 };
 
-/// What happened is added to `figures`. Each call has a connection of its own. TA images are
+/// What happened is added to `figures`. Each call has connections of its own. TA images are
 /// dropped. `on_message`, where given, is called when the device has carried out a message, before
 /// the TSM hears of it.
 broker::Outcome call_tsm(const Member &member, const CallOptions &options, const broker::Stop &stop,

@@ -6,10 +6,13 @@
 #include <fstream>
 #include <nlohmann/json.hpp>
 
+#include "common/encoding.h"
 #include "common/error_line.h"
 #include "common/files.h"
 #include "device/device_client.h"
 #include "device/info_json.h"
+#include "device/inspect.h"
+#include "device/object_id.h"
 #include "fleet/parallel.h"
 
 namespace fleet {
@@ -86,6 +89,21 @@ void reset_fleet(const fs::path &root, size_t num_threads, const Progress &progr
   const std::vector<Member> members = members_of(root);
   for_each_name(members.size(), num_threads, progress,
                 [&](size_t index) { copy_made(root, members[index].name); });
+}
+
+void list_objects(const fs::path &root,
+                  const std::function<void(const std::string &lines)> &print) {
+  const device::Inspection *inspection = device::inspection();
+  if (inspection == nullptr) throw tools::UsageError("objects needs a TEE that shows them");
+  for (const Member &member : members_of(root)) {
+    device::Device device(member.state_directory.string());
+    std::string lines;
+    for (const device::StoredObject &object : inspection->list_objects(device)) {
+      lines += member.name + "\t" + device::show_object_id(object.id) + "\t" +
+               tools::base64_encode(inspection->get_object(device, object.id)) + "\n";
+    }
+    print(lines);
+  }
 }
 
 std::vector<Member> members_of(const fs::path &root) {

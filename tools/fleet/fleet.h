@@ -37,6 +37,12 @@ void reset_fleet(const std::filesystem::path &root, size_t num_threads, const Pr
 /// In the order of their names. Throws tools::UsageError where there are none.
 std::vector<Member> members_of(const std::filesystem::path &root);
 
+/// `print` gets, of one device after the other, a line for each object that its agent has stored:
+/// the device's name, the object's ID and its content in base64, with tabs between. Throws
+/// tools::UsageError where the TEE lets nobody look.
+void list_objects(const std::filesystem::path &root,
+                  const std::function<void(const std::string &lines)> &print);
+
 }  // namespace fleet
 
 #endif

@@ -111,6 +111,11 @@ void call(const Arguments &arguments) {
   if (!outcome.reason.empty()) throw std::runtime_error(outcome.reason);
 }
 
+void objects(const Arguments &arguments) {
+  fleet::list_objects(arguments.root,
+                      [](const std::string &lines) { tools::write_file("-", lines); });
+}
+
 void serve(const Arguments &arguments) {
   http::ServerOptions options;
   options.name = std::string(kProgram) + "/" + OTRP_VERSION;
@@ -144,8 +149,12 @@ void add_threads(CLI::App *command, size_t &num_threads, const std::string &help
 }
 
 void add_tsm(CLI::App *command, fleet::CallOptions &options) {
-  command->add_option("--tsm", options.tsm, "Where the TSM is; a device adds its ID")
+  command
+      ->add_option("--tsm", options.tsms,
+                   "Where the TSM is; a device adds its ID. Several, repeated: requests go to them "
+                   "in turn")
       ->type_name("URL")
+      ->allow_extra_args(false)
       ->required();
   command->add_option("--ca-file", options.ca_file, "The only roots to trust for https")
       ->type_name("PEM");
@@ -181,9 +190,10 @@ void add_run(CLI::App *command, Arguments &arguments) {
       ->type_name("NAME=VALUE")
       ->allow_extra_args(false);
   command
-      ->add_option("--server", run.server_command,
-                   "Run the TSM with the shell, for kill-server to kill")
-      ->type_name("COMMAND");
+      ->add_option("--server", run.servers,
+                   "Run the TSM with the shell, for kill-server to kill; one for each --tsm")
+      ->type_name("COMMAND")
+      ->allow_extra_args(false);
   command->add_option("--seed", run.seed, "Of the faults (default: 1)")->type_name("NUMBER");
   command->add_flag("--json", arguments.as_json, "Print the figures as JSON");
   command->footer(
@@ -220,6 +230,12 @@ void obey(std::span<char *> words) {
   command = add_command(app, "call", "One device calls a TSM", arguments, call, &chosen);
   command->add_option("NAME", arguments.name, "The device")->required();
   add_tsm(command, arguments.run.call);
+
+  command = add_command(app, "objects", "Print what the agent of each device has stored", arguments,
+                        objects, &chosen);
+  command->footer(
+      "Lines of NAME<TAB>OBJECT<TAB>CONTENT, the content in base64.\n"
+      "Example:\n  otrp-fleet objects --root fleet | cut -f2 | sort | uniq -c\n");
 
   command = add_command(app, "serve", "Answer over HTTP for all devices, until SIGTERM or SIGINT",
                         arguments, serve, &chosen);

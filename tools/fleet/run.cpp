@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "fleet/run.h"
 
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <thread>
@@ -20,21 +21,27 @@ constexpr milliseconds kLook(5);           // how often a child is looked at
 constexpr milliseconds kLongestLife(400);  // of a device that is killed in a call
 constexpr std::chrono::seconds kServerStart(30);
 
-/// The TSM, where it is ours to run. It is killed after counted events, so that it is killed as
-/// often as was asked for, however fast the devices are.
-class Server {
+/// The TSMs, where they are ours to run. They are killed in turn after counted events, so that they
+/// are killed as often as was asked for, however fast the devices are.
+class Servers {
  public:
-  Server(const RunOptions &options, size_t num_devices)
-      : options_(options), num_devices_(num_devices) {
-    if (options.server_command.empty() && options.call.faults.killed_servers > 0) {
+  Servers(const RunOptions &options, size_t num_devices)
+      : options_(options), num_devices_(num_devices), children_(options.servers.size()) {
+    if (options.servers.empty() && options.call.faults.killed_servers > 0) {
       throw tools::UsageError("kill-server needs a server to kill: expected --server COMMAND");
     }
-    if (!options.server_command.empty()) start();
+    if (!options.servers.empty() && options.servers.size() != options.call.tsms.size()) {
+      throw tools::UsageError("as many --server as --tsm belong together: expected " +
+                              std::to_string(options.call.tsms.size()));
+    }
+    for (size_t i = 0; i < children_.size(); ++i) start(i);
   }
 
-  ~Server() {
+  ~Servers() {
     wait_for_kills();
-    if (child_) child_->end();
+    for (const std::unique_ptr<Child> &child : children_) {
+      if (child) child->end();
+    }
   }
 
   /// Each device utters it once, in the middle of its first call. The kill that is due then meets
@@ -45,22 +52,24 @@ class Server {
     ++num_at_work_;
     while (kills_.size() < num_kills &&
            num_at_work_ * (num_kills + 1) >= num_devices_ * (kills_.size() + 1)) {
-      kills_.emplace_back([this] { kill_and_start(); });
+      const size_t index = kills_.size() % children_.size();
+      kills_.emplace_back([this, index] { kill_and_start(index); });
     }
   }
 
-  /// Throws when it has ended by itself.
+  /// Throws when one has ended by itself.
   void look() {
-    const std::lock_guard guard(child_lock_);
+    const std::lock_guard guard(children_lock_);
     if (failure_) std::rethrow_exception(failure_);
-    if (!child_) return;
-    if (const std::optional<int> code = child_->exit_code()) {
-      throw std::runtime_error("the server has ended by itself, with exit code " +
-                               std::to_string(*code));
+    for (const std::unique_ptr<Child> &child : children_) {
+      if (const std::optional<int> code = child->exit_code()) {
+        throw std::runtime_error("the server has ended by itself, with exit code " +
+                                 std::to_string(*code));
+      }
     }
   }
 
-  /// How often it was killed, in the end.
+  /// How often one was killed, in the end.
   size_t wait_for_kills() {
     for (std::jthread &kill : kills_) {
       if (kill.joinable()) kill.join();
@@ -69,27 +78,27 @@ class Server {
   }
 
  private:
-  void kill_and_start() {
-    const std::lock_guard guard(child_lock_);
+  void kill_and_start(size_t index) {
+    const std::lock_guard guard(children_lock_);
     try {
-      child_->kill();
-      start();
+      children_[index]->kill();
+      start(index);
     } catch (...) {
       failure_ = std::current_exception();
     }
   }
 
-  void start() {
-    child_.emplace(std::vector<std::string>{"/bin/sh", "-c", options_.server_command},
-                   Child::Output::kShown);
+  void start(size_t index) {
+    children_[index] = std::make_unique<Child>(
+        std::vector<std::string>{"/bin/sh", "-c", options_.servers[index]}, Child::Output::kShown);
     const Clock::time_point end = Clock::now() + kServerStart;
-    while (!is_there() && Clock::now() < end) std::this_thread::sleep_for(10 * kLook);
+    while (!is_there(index) && Clock::now() < end) std::this_thread::sleep_for(10 * kLook);
   }
 
   /// Whatever it answers.
-  bool is_there() const {
+  bool is_there(size_t index) const {
     try {
-      http::Client({.ca_file = options_.call.ca_file}).send({.url = options_.call.tsm});
+      http::Client({.ca_file = options_.call.ca_file}).send({.url = options_.call.tsms[index]});
       return true;
     } catch (const http::ClientError &error) {
       return error.failure() != http::Failure::kNoConnection;
@@ -98,8 +107,8 @@ class Server {
 
   const RunOptions &options_;
   const size_t num_devices_;
-  std::mutex child_lock_;  // of child_ and failure_
-  std::optional<Child> child_;
+  std::mutex children_lock_;  // of children_ and failure_
+  std::vector<std::unique_ptr<Child>> children_;
   std::exception_ptr failure_;
   std::mutex count_lock_;  // of the ones below
   size_t num_at_work_ = 0;
@@ -113,7 +122,7 @@ class Run {
         members_(members_of(root)),
         options_(options),
         stop_(stop),
-        server_(options, members_.size()) {}
+        servers_(options, members_.size()) {}
 
   Figures run(const std::function<void(const RunProgress &)> &progress);
 
@@ -127,7 +136,7 @@ class Run {
   const std::vector<Member> members_;
   const RunOptions &options_;
   const broker::Stop &stop_;
-  Server server_;
+  Servers servers_;
   Clock::time_point start_;
   std::mutex lock_;  // of the ones below
   Figures figures_;
@@ -145,9 +154,11 @@ void Run::wait_for_turn(size_t index) const {
 /// second.
 bool Run::is_killed_or_arrives(const Member &member, Random &random, bool *arrived) {
   const auto life = kLongestLife * std::generate_canonical<double, 32>(random);
-  Child child({"/proc/self/exe", "call", member.name, "--root", root_.string(), "--tsm",
-               options_.call.tsm, "--ca-file", options_.call.ca_file},
-              Child::Output::kNone);
+  std::vector<std::string> words = {"/proc/self/exe", "call", member.name, "--root",
+                                    root_.string()};
+  for (const std::string &tsm : options_.call.tsms) words.insert(words.end(), {"--tsm", tsm});
+  words.insert(words.end(), {"--ca-file", options_.call.ca_file});
+  Child child(words, Child::Output::kNone);
   const Clock::time_point end = Clock::now() + std::chrono::duration_cast<Clock::duration>(life);
   std::optional<int> code;
   while (!(code = child.exit_code()) && Clock::now() < end) std::this_thread::sleep_for(kLook);
@@ -177,7 +188,7 @@ void Run::bring(size_t index) {
   Random random(static_cast<Random::result_type>(options_.seed * 1'000'003 + index + 1));
   bool was_at_work = false;
   const auto note_work = [&] {
-    if (!std::exchange(was_at_work, true)) server_.a_device_is_at_work();
+    if (!std::exchange(was_at_work, true)) servers_.a_device_is_at_work();
   };
   wait_for_turn(index);
   for (unsigned call = 0; call < options_.max_calls && !stop_.is_requested(); ++call) {
@@ -191,7 +202,7 @@ void Run::bring(size_t index) {
 Figures Run::run(const std::function<void(const RunProgress &)> &progress) {
   start_ = Clock::now();
   const auto tick = [&] {
-    server_.look();
+    servers_.look();
     std::unique_lock guard(lock_);
     const RunProgress now = {num_done_, figures_.num_arrived, figures_.exchanges.count()};
     guard.unlock();
@@ -201,10 +212,10 @@ Figures Run::run(const std::function<void(const RunProgress &)> &progress) {
       members_.size(), options_.num_threads, [&](size_t index) { bring(index); }, tick);
   figures_.num_devices = members_.size();
   figures_.time = Clock::now() - start_;
-  if (const size_t num_kills = server_.wait_for_kills()) {
+  if (const size_t num_kills = servers_.wait_for_kills()) {
     figures_.failures["killed server"] = num_kills;
   }
-  server_.look();
+  servers_.look();
   return std::move(figures_);
 }
 

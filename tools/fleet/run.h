@@ -14,10 +14,10 @@ namespace fleet {
 struct RunOptions {
   CallOptions call;
   size_t num_threads = 16;
-  double rate = 0;             // first calls a second; 0: as fast as they go
-  unsigned max_calls = 1;      // of a device, until one arrives
-  std::string server_command;  // for the shell: the TSM, to be run and killed
-  uint64_t seed = 1;           // of the faults
+  double rate = 0;                   // first calls a second; 0: as fast as they go
+  unsigned max_calls = 1;            // of a device, until one arrives
+  std::vector<std::string> servers;  // for the shell: the TSMs, in order, to be run and killed
+  uint64_t seed = 1;                 // of the faults
 };
 
 struct RunProgress {
