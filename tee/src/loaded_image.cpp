@@ -3,10 +3,11 @@
 
 #include <dlfcn.h>
 #include <link.h>
-#include <tee_internal_api.h>
+#include <tee_ta_image.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <filesystem>
 #include <span>
 
 #include "error.h"
@@ -17,17 +18,17 @@ namespace fs = std::filesystem;
 
 namespace {
 
-bool is_loaded(const fs::path &file) {
+bool is_loaded(const std::string &file) {
   void *handle = ::dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD);
   if (handle != nullptr) ::dlclose(handle);
   return handle != nullptr;
 }
 
-host::File copy_of(const fs::path &file) {
+host::File copy_of(const std::string &file) {
   const host::File source = host::open_for_reading(file.c_str());
-  if (!source.valid()) throw system_error("cannot read " + file.string());
-  host::File copy = host::copy_in_memory(file.filename().c_str(), source);
-  if (!copy.valid()) throw system_error("cannot copy " + file.string());
+  if (!source.valid()) throw system_error("cannot read " + file);
+  host::File copy = host::copy_in_memory(fs::path(file).filename().c_str(), source);
+  if (!copy.valid()) throw system_error("cannot copy " + file);
   return copy;
 }
 
@@ -75,14 +76,14 @@ __attribute__((no_sanitize("address"))) void copy(const volatile uint8_t *from, 
 
 }  // namespace
 
-std::unique_ptr<LoadedImage> LoadedImage::load(const fs::path &file) {
+std::unique_ptr<LoadedImage> LoadedImage::load(const std::string &file) {
   std::unique_ptr<LoadedImage> image(new LoadedImage(file));
   image->open();
   image->remember_variables();
   return image;
 }
 
-LoadedImage::LoadedImage(const fs::path &file) : file_(file) {}
+LoadedImage::LoadedImage(const std::string &file) : file_(file) {}
 
 // Unloading runs code of the image. Where the file was written over, so was that code.
 LoadedImage::~LoadedImage() {
@@ -92,16 +93,17 @@ LoadedImage::~LoadedImage() {
 // The dynamic linker takes an object of the same name for the same. A copy in memory has a name
 // that no other one has while it is open.
 void LoadedImage::open() {
-  if (::stat(file_.c_str(), &status_) != 0) throw system_error("cannot read " + file_.string());
-  std::string name = file_.string();
+  if (::stat(file_.c_str(), &status_) != 0) throw system_error("cannot read " + file_);
+  std::string name = file_;
   if (is_loaded(file_)) {
     copy_ = copy_of(file_);
     name = "/proc/self/fd/" + std::to_string(copy_.get());
   }
   handle_ = ::dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
   if (handle_ == nullptr) {
-    throw Error{TEE_ERROR_BAD_FORMAT, "TA image " + file_.string() + ": " + ::dlerror()};
+    throw Error{TEE_ERROR_BAD_FORMAT, "TA image " + file_ + ": " + ::dlerror()};
   }
+  header_ = ::dlsym(handle_, TEE_TA_IMAGE_SYMBOL);
 }
 
 void LoadedImage::remember_variables() {
@@ -120,21 +122,16 @@ void LoadedImage::remember_variables() {
   }
 }
 
-const void *LoadedImage::find(const char *symbol) const {
-  return ::dlsym(handle_, symbol);
-}
-
-bool LoadedImage::is_up_to_date() const {
-  struct stat now;
-  return ::stat(file_.c_str(), &now) == 0 && is_same_file(now, status_) &&
-         now.st_size == status_.st_size && is_same_time(now.st_mtim, status_.st_mtim) &&
-         is_same_time(now.st_ctim, status_.st_ctim);
+bool LoadedImage::is_of(const struct stat &status) const {
+  return is_same_file(status, status_) && status.st_size == status_.st_size &&
+         is_same_time(status.st_mtim, status_.st_mtim) &&
+         is_same_time(status.st_ctim, status_.st_ctim);
 }
 
 bool LoadedImage::is_overwritten() const {
   struct stat now;
   return !copy_.valid() && ::stat(file_.c_str(), &now) == 0 && is_same_file(now, status_) &&
-         !is_up_to_date();
+         !is_of(now);
 }
 
 bool LoadedImage::reset() {

@@ -6,8 +6,8 @@
 #include <sys/stat.h>
 
 #include <cstdint>
-#include <filesystem>
 #include <memory>
+#include <string>
 #include <vector>
 
 #include "host_file.h"
@@ -18,18 +18,18 @@ namespace tee {
 class LoadedImage {
  public:
   /// Throws an Error that says what is wrong with the file.
-  static std::unique_ptr<LoadedImage> load(const std::filesystem::path &file);
+  static std::unique_ptr<LoadedImage> load(const std::string &file);
   ~LoadedImage();
   LoadedImage(const LoadedImage &) = delete;
   LoadedImage &operator=(const LoadedImage &) = delete;
 
-  /// What the symbol names, or NULL.
-  const void *find(const char *symbol) const;
+  /// What TEE_TA_IMAGE_SYMBOL names, or NULL.
+  const void *header() const { return header_; }
 
-  const std::filesystem::path &file() const { return file_; }
+  const std::string &file() const { return file_; }
 
-  /// Whether the file is still the one that was loaded.
-  bool is_up_to_date() const;
+  /// Whether a file of which the system says this is still the one that was loaded.
+  bool is_of(const struct stat &status) const;
 
   /// Sets all variables to what they were when the image had just been loaded. False when it
   /// cannot: the image is then used up.
@@ -41,15 +41,16 @@ class LoadedImage {
     std::vector<uint8_t> initial;
   };
 
-  explicit LoadedImage(const std::filesystem::path &file);
+  explicit LoadedImage(const std::string &file);
   void open();
   void remember_variables();
   bool is_overwritten() const;
 
-  const std::filesystem::path file_;
+  const std::string file_;
   struct stat status_ = {};  // of the file, when it was loaded
   host::File copy_;          // where it was loaded from, when not from the file itself
   void *handle_ = nullptr;
+  const void *header_ = nullptr;
   std::vector<Variables> variables_;
   bool has_other_variables_ = false;  // of each thread
 };

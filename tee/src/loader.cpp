@@ -23,8 +23,8 @@ namespace {
 std::mutex g_lock;  // of what is below, and of "is it loaded? then load"
 std::string g_test_directory;
 
-Error bad_image(const fs::path &file, const std::string &why) {
-  return {TEE_ERROR_BAD_FORMAT, "TA image " + file.string() + ": " + why};
+Error bad_image(const std::string &file, const std::string &why) {
+  return {TEE_ERROR_BAD_FORMAT, "TA image " + file + ": " + why};
 }
 
 // ---- Finding
@@ -40,8 +40,8 @@ fs::path own_path() {
 
 // Beside the program and beside this library. Neither moves while the process runs; to ask the
 // system each time would take a fifth of the time that loading takes.
-std::vector<fs::path> installed_folders() {
-  std::vector<fs::path> folders;
+std::vector<std::string> installed_folders() {
+  std::vector<std::string> folders;
   std::error_code error;
   const fs::path program = fs::read_symlink("/proc/self/exe", error);
   if (!error) folders.push_back(program.parent_path().parent_path() / "ta");
@@ -50,10 +50,11 @@ std::vector<fs::path> installed_folders() {
   return folders;
 }
 
-std::vector<fs::path> search_path() {
-  static const std::vector<fs::path> installed = installed_folders();
-  std::vector<fs::path> folders;
-  if (!g_test_directory.empty()) folders.emplace_back(g_test_directory);
+std::vector<std::string> search_path() {
+  static const std::vector<std::string> installed = installed_folders();
+  std::vector<std::string> folders;
+  folders.reserve(installed.size() + 2);
+  if (!g_test_directory.empty()) folders.push_back(g_test_directory);
   folders.insert(folders.end(), installed.begin(), installed.end());
   if (const char *folder = std::getenv("OTRP_TA_DIR"); folder != nullptr && *folder != '\0') {
     folders.emplace_back(folder);
@@ -61,13 +62,14 @@ std::vector<fs::path> search_path() {
   return folders;
 }
 
-fs::path find_image(const TEE_UUID &ta) {
+// The file, and what the system says of it.
+std::string find_image(const TEE_UUID &ta, struct stat &status) {
   const std::string name = uuid_text(ta) + ".so";
   std::string looked;
-  for (const fs::path &folder : search_path()) {
-    std::error_code error;
-    if (fs::exists(folder / name, error)) return folder / name;
-    looked += (looked.empty() ? " in " : ", ") + folder.string();
+  for (const std::string &folder : search_path()) {
+    std::string file = folder + '/' + name;
+    if (::stat(file.c_str(), &status) == 0) return file;
+    looked += (looked.empty() ? " in " : ", ") + folder;
   }
   throw Error{TEE_ERROR_ITEM_NOT_FOUND, "no TA image " + name + looked};
 }
@@ -83,9 +85,9 @@ IdleImages &idle_images() {
   return *images;
 }
 
-std::unique_ptr<LoadedImage> take_or_load(const fs::path &file) {
-  std::unique_ptr<LoadedImage> idle = std::move(idle_images()[file.native()]);
-  if (idle && idle->is_up_to_date()) return idle;
+std::unique_ptr<LoadedImage> take_or_load(const std::string &file, const struct stat &status) {
+  std::unique_ptr<LoadedImage> idle = std::move(idle_images()[file]);
+  if (idle && idle->is_of(status)) return idle;
   idle.reset();
   return LoadedImage::load(file);
 }
@@ -94,15 +96,15 @@ std::unique_ptr<LoadedImage> take_or_load(const fs::path &file) {
 void give_back(LoadedImage *used) {
   std::unique_ptr<LoadedImage> image(used);
   const std::lock_guard guard(g_lock);
-  std::unique_ptr<LoadedImage> &idle = idle_images()[image->file().native()];
+  std::unique_ptr<LoadedImage> &idle = idle_images()[image->file()];
   if (image->reset() && !idle) idle = std::move(image);
 }
 
 // ---- Checking
 
 const tee_ta_image &checked_header(const LoadedImage &image, const TEE_UUID &ta,
-                                   const fs::path &file) {
-  const auto *header = static_cast<const tee_ta_image *>(image.find(TEE_TA_IMAGE_SYMBOL));
+                                   const std::string &file) {
+  const auto *header = static_cast<const tee_ta_image *>(image.header());
   if (header == nullptr) throw bad_image(file, "has no " TEE_TA_IMAGE_SYMBOL);
   if (header->magic != TEE_TA_IMAGE_MAGIC || header->version != TEE_TA_IMAGE_VERSION) {
     throw bad_image(file, "header of another kind or version");
@@ -120,7 +122,7 @@ const tee_ta_image &checked_header(const LoadedImage &image, const TEE_UUID &ta,
 }
 
 const tee_property &property(const tee_ta_metadata &metadata, const char *name,
-                             tee_property_type type, const fs::path &file) {
+                             tee_property_type type, const std::string &file) {
   for (const tee_property &known : std::span(
            metadata.properties, metadata.properties != nullptr ? metadata.num_properties : 0)) {
     if (std::strcmp(known.name, name) == 0 && known.type == type) return known;
@@ -128,15 +130,15 @@ const tee_property &property(const tee_ta_metadata &metadata, const char *name,
   throw bad_image(file, std::string("has no property ") + name);
 }
 
-void check_lifecycle(const tee_ta_metadata &metadata, const fs::path &file) {
+void check_lifecycle(const tee_ta_metadata &metadata, const std::string &file) {
   const auto flag = [&](const char *name) {
     return property(metadata, name, TEE_PROPERTY_BOOL, file).value.boolean;
   };
   if (!flag("gpd.ta.singleInstance") || !flag("gpd.ta.multiSession") ||
       flag("gpd.ta.instanceKeepAlive")) {
-    throw Error{TEE_ERROR_NOT_SUPPORTED,
-                "TA image " + file.string() +
-                    ": only single instance, multi session, no keep-alive can run here"};
+    throw Error{
+        TEE_ERROR_NOT_SUPPORTED,
+        "TA image " + file + ": only single instance, multi session, no keep-alive can run here"};
   }
 }
 
@@ -144,8 +146,9 @@ void check_lifecycle(const tee_ta_metadata &metadata, const fs::path &file) {
 
 Program load_program(const TEE_UUID &ta) {
   std::unique_lock guard(g_lock);
-  const fs::path file = find_image(ta);
-  std::unique_ptr<LoadedImage> image = take_or_load(file);
+  struct stat status;
+  const std::string file = find_image(ta, status);
+  std::unique_ptr<LoadedImage> image = take_or_load(file, status);
   guard.unlock();
   const tee_ta_image &header = checked_header(*image, ta, file);
   check_lifecycle(*header.metadata, file);
