@@ -99,25 +99,23 @@ bool set_cipher_key(__TEE_OperationHandle &operation, const std::vector<uint8_t>
          EVP_CIPHER_CTX_set_padding(context, 0) == 1;
 }
 
-// With its parameters in one go, which OpenSSL would otherwise look up one by one.
+// With its padding in one go, which OpenSSL would otherwise look up. Of a digest it knows nothing:
+// it would fetch the algorithm for each operation, only to put a constant before the hash.
 bool start_rsa(EVP_PKEY_CTX *context, uint32_t mode) {
-  char digest[] = "SHA256";
   char padding[] = OSSL_PKEY_RSA_PAD_MODE_PKCSV15;
-  const OSSL_PARAM for_signatures[] = {
-      OSSL_PARAM_construct_utf8_string(OSSL_SIGNATURE_PARAM_DIGEST, digest, 0),
+  const OSSL_PARAM params[] = {
       OSSL_PARAM_construct_utf8_string(OSSL_PKEY_PARAM_PAD_MODE, padding, 0),
       OSSL_PARAM_construct_end(),
   };
-  const OSSL_PARAM *for_ciphers = for_signatures + 1;
   switch (mode) {
     case TEE_MODE_ENCRYPT:
-      return EVP_PKEY_encrypt_init_ex(context, for_ciphers) == 1;
+      return EVP_PKEY_encrypt_init_ex(context, params) == 1;
     case TEE_MODE_DECRYPT:
-      return EVP_PKEY_decrypt_init_ex(context, for_ciphers) == 1;
+      return EVP_PKEY_decrypt_init_ex(context, params) == 1;
     case TEE_MODE_SIGN:
-      return EVP_PKEY_sign_init_ex(context, for_signatures) == 1;
+      return EVP_PKEY_sign_init_ex(context, params) == 1;
     default:
-      return EVP_PKEY_verify_init_ex(context, for_signatures) == 1;
+      return EVP_PKEY_verify_init_ex(context, params) == 1;
   }
 }
 

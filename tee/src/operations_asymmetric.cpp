@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <array>
+#include <iterator>
 
 #include "operation.h"
 #include "rsa_key.h"
@@ -31,6 +32,18 @@ RsaOperation checked_rsa(TEE_OperationHandle handle, OperationClass wanted, uint
 
 const uint8_t *bytes(const void *data) {
   return static_cast<const uint8_t *>(data);
+}
+
+// RFC 8017, section 9.2: what is signed is a DigestInfo, whose last bytes are the hash.
+constexpr uint8_t kSha256Info[] = {0x30, 0x31, 0x30, 0x0d, 0x06, 0x09, 0x60, 0x86, 0x48, 0x01,
+                                   0x65, 0x03, 0x04, 0x02, 0x01, 0x05, 0x00, 0x04, 0x20};
+using DigestInfo = std::array<uint8_t, sizeof kSha256Info + SHA256_DIGEST_LENGTH>;
+
+DigestInfo info_of(const void *digest) {
+  DigestInfo info;
+  std::copy_n(bytes(digest), SHA256_DIGEST_LENGTH,
+              std::copy(std::begin(kSha256Info), std::end(kSha256Info), info.begin()));
+  return info;
 }
 
 }  // namespace
@@ -95,8 +108,9 @@ TEE_Result TEE_AsymmetricSignDigest(TEE_OperationHandle operation, const TEE_Att
 
   const QuietErrors quiet;
   size_t len = *signatureLen;
-  if (EVP_PKEY_sign(rsa.context, static_cast<uint8_t *>(signature), &len, bytes(digest),
-                    digestLen) != 1) {
+  const DigestInfo info = info_of(digest);
+  if (EVP_PKEY_sign(rsa.context, static_cast<uint8_t *>(signature), &len, info.data(),
+                    info.size()) != 1) {
     return TEE_ERROR_GENERIC;
   }
   *signatureLen = static_cast<TEE_LengthType>(len);
@@ -113,7 +127,8 @@ TEE_Result TEE_AsymmetricVerifyDigest(TEE_OperationHandle operation, const TEE_A
   if (signatureLen != rsa.modulus_len) return TEE_ERROR_SIGNATURE_INVALID;
 
   const QuietErrors quiet;
+  const DigestInfo info = info_of(digest);
   const bool genuine =
-      EVP_PKEY_verify(rsa.context, bytes(signature), signatureLen, bytes(digest), digestLen) == 1;
+      EVP_PKEY_verify(rsa.context, bytes(signature), signatureLen, info.data(), info.size()) == 1;
   return genuine ? TEE_SUCCESS : TEE_ERROR_SIGNATURE_INVALID;
 }
