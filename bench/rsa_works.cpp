@@ -15,6 +15,11 @@ namespace bench {
 namespace {
 
 using Number = std::shared_ptr<BIGNUM>;
+using KeyContext = std::shared_ptr<EVP_PKEY_CTX>;
+
+// RFC 8017, section 9.2: what is signed is a DigestInfo. OpenSSL makes it when it is told the
+// digest, and then looks that up for each operation.
+const std::string kSha256Info = tsm::hex_decode("3031300d060960864801650304020105000420").value();
 
 Number number_of_key(const char *name) {
   BIGNUM *value = nullptr;
@@ -46,12 +51,10 @@ class KeyNumbers {
   KeyNumbers &operator=(const KeyNumbers &) = delete;
 
   std::shared_ptr<EVP_PKEY> make_key() const {
-    const std::shared_ptr<EVP_PKEY_CTX> context(EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr),
-                                                EVP_PKEY_CTX_free);
     EVP_PKEY *key = nullptr;
     const int selection = params_.size() > 3 ? EVP_PKEY_KEYPAIR : EVP_PKEY_PUBLIC_KEY;
-    require(EVP_PKEY_fromdata_init(context.get()));
-    require(EVP_PKEY_fromdata(context.get(), &key, selection,
+    require(EVP_PKEY_fromdata_init(import_.get()));
+    require(EVP_PKEY_fromdata(import_.get(), &key, selection,
                               const_cast<OSSL_PARAM *>(params_.data())));
     return {key, EVP_PKEY_free};
   }
@@ -65,6 +68,7 @@ class KeyNumbers {
     params_.push_back(OSSL_PARAM_construct_BN(name, at, bytes.size()));
   }
 
+  const KeyContext import_{EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr), EVP_PKEY_CTX_free};
   std::list<std::string> bytes_;
   std::vector<OSSL_PARAM> params_;
 };
@@ -86,16 +90,16 @@ Work completion() {
   };
 }
 
-using KeyContext = std::shared_ptr<EVP_PKEY_CTX>;
-
-Work rsa(Form form, Keys keys, int (*start)(EVP_PKEY_CTX *), bool signs,
+Work rsa(Form form, Keys keys, int (*start)(EVP_PKEY_CTX *, const OSSL_PARAM *),
          std::function<void(EVP_PKEY_CTX *)> run) {
   const auto numbers = std::make_shared<KeyNumbers>(form);
   const auto make_context = [=](const std::shared_ptr<EVP_PKEY> &key) {
     KeyContext context(EVP_PKEY_CTX_new(key.get(), nullptr), EVP_PKEY_CTX_free);
-    require(start(context.get()));
-    require(EVP_PKEY_CTX_set_rsa_padding(context.get(), RSA_PKCS1_PADDING));
-    if (signs) require(EVP_PKEY_CTX_set_signature_md(context.get(), EVP_sha256()));
+    char padding[] = OSSL_PKEY_RSA_PAD_MODE_PKCSV15;
+    const OSSL_PARAM params[] = {
+        OSSL_PARAM_construct_utf8_string(OSSL_PKEY_PARAM_PAD_MODE, padding, 0),
+        OSSL_PARAM_construct_end()};
+    require(start(context.get(), params));
     return context;
   };
   const Work make = [=] { run(make_context(numbers->make_key()).get()); };
@@ -110,7 +114,7 @@ Work rsa(Form form, Keys keys, int (*start)(EVP_PKEY_CTX *), bool signs,
 }  // namespace
 
 Work rsa_encrypt(Keys keys) {
-  return rsa(Form::kPublic, keys, EVP_PKEY_encrypt_init, false, [](EVP_PKEY_CTX *context) {
+  return rsa(Form::kPublic, keys, EVP_PKEY_encrypt_init_ex, [](EVP_PKEY_CTX *context) {
     size_t len = kRsaLen;
     require(EVP_PKEY_encrypt(context, scratch().out.data(), &len, scratch().in.data(), kCekLen));
   });
@@ -119,25 +123,26 @@ Work rsa_encrypt(Keys keys) {
 Work rsa_decrypt(Form form, Keys keys) {
   const std::string sealed =
       tsm::rsa1_5_encrypt(otrp_test::key_named("floor"), std::string(kCekLen, 'k'));
-  return rsa(form, keys, EVP_PKEY_decrypt_init, false, [=](EVP_PKEY_CTX *context) {
+  return rsa(form, keys, EVP_PKEY_decrypt_init_ex, [=](EVP_PKEY_CTX *context) {
     size_t len = kRsaLen;
     require(EVP_PKEY_decrypt(context, scratch().out.data(), &len, bytes_of(sealed), sealed.size()));
   });
 }
 
 Work rsa_sign(Form form, Keys keys) {
-  return rsa(form, keys, EVP_PKEY_sign_init, true, [](EVP_PKEY_CTX *context) {
+  return rsa(form, keys, EVP_PKEY_sign_init_ex, [](EVP_PKEY_CTX *context) {
     size_t len = kRsaLen;
-    require(EVP_PKEY_sign(context, scratch().out.data(), &len, scratch().in.data(), kDigestLen));
+    require(EVP_PKEY_sign(context, scratch().out.data(), &len, scratch().in.data(),
+                          kSha256Info.size() + kDigestLen));
   });
 }
 
 Work rsa_verify(Keys keys) {
   const std::string signature = tsm::rs256_sign(otrp_test::key_named("floor"), "text");
-  const std::string hash = tsm::sha256("text");
-  return rsa(Form::kPublic, keys, EVP_PKEY_verify_init, true, [=](EVP_PKEY_CTX *context) {
-    require(EVP_PKEY_verify(context, bytes_of(signature), signature.size(), bytes_of(hash),
-                            hash.size()));
+  const std::string info = kSha256Info + tsm::sha256("text");
+  return rsa(Form::kPublic, keys, EVP_PKEY_verify_init_ex, [=](EVP_PKEY_CTX *context) {
+    require(EVP_PKEY_verify(context, bytes_of(signature), signature.size(), bytes_of(info),
+                            info.size()));
   });
 }
 }  // namespace bench
