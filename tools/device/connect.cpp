@@ -3,6 +3,7 @@
 
 #include <cstdio>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <random>
 
@@ -59,8 +60,10 @@ class LocalAgent : public broker::Agent {
 
 // ---- Lines of the log
 
-void log_line(const std::string &text) {
-  tools::print_error_line(kProgram, http::time_text(std::chrono::system_clock::now()) + " " + text);
+using Json = nlohmann::ordered_json;
+
+double milliseconds_of(std::chrono::microseconds time) {
+  return static_cast<double>(time.count() / 100) / 10;
 }
 
 std::string seconds_text(milliseconds time) {
@@ -69,24 +72,52 @@ std::string seconds_text(milliseconds time) {
   return text;
 }
 
-void log_exchange(const broker::Exchange &exchange) {
-  char times[80];
-  snprintf(times, sizeof(times), " %.1f ms (TSM %.1f ms) ",
-           static_cast<double>(exchange.agent_time.count()) / 1000,
-           static_cast<double>(exchange.tsm_time.count()) / 1000);
-  log_line(std::string(exchange.message->command) + times + exchange.verdict +
-           (exchange.image.empty() ? "" : ", image of " + exchange.image));
-}
+/// Each line in either form.
+class Log {
+ public:
+  explicit Log(const std::string &format) : is_json_(format == "json") {
+    if (!is_json_ && format != "text") {
+      throw tools::UsageError("bad --log \"" + format + "\": expected text or json");
+    }
+  }
 
-void log_retry(const broker::Outcome &outcome, milliseconds pause) {
-  log_line(outcome.reason + "; again in " + seconds_text(pause));
-}
+  void exchange(const broker::Exchange &exchange) const {
+    const double ms = milliseconds_of(exchange.agent_time);
+    const double tsm_ms = milliseconds_of(exchange.tsm_time);
+    char times[80];
+    snprintf(times, sizeof(times), " %.1f ms (TSM %.1f ms) ", ms, tsm_ms);
+    Json members = {{"message", exchange.message->command},
+                    {"ms", ms},
+                    {"tsm_ms", tsm_ms},
+                    {"verdict", exchange.verdict}};
+    if (!exchange.image.empty()) members["image"] = exchange.image;
+    put(std::string(exchange.message->command) + times + exchange.verdict +
+            (exchange.image.empty() ? "" : ", image of " + exchange.image),
+        members);
+  }
+  void retry(const broker::Outcome &outcome, milliseconds pause) const {
+    put(outcome.reason + "; again in " + seconds_text(pause),
+        {{"failure", outcome.reason}, {"again_in_ms", pause.count()}});
+  }
+  void failure(const std::string &reason) const { put(reason, {{"failure", reason}}); }
+  void end(const broker::Outcome &outcome) const {
+    const bool is_stopped = outcome.end == broker::End::kStopped;
+    put((is_stopped ? "stopped after messages: " : "done, messages: ") +
+            std::to_string(outcome.num_messages),
+        {{"end", is_stopped ? "stopped" : "done"}, {"messages", outcome.num_messages}});
+  }
 
-void log_end(const broker::Outcome &outcome) {
-  const bool is_stopped = outcome.end == broker::End::kStopped;
-  log_line((is_stopped ? "stopped after messages: " : "done, messages: ") +
-           std::to_string(outcome.num_messages));
-}
+ private:
+  void put(const std::string &text, const Json &members) const {
+    const std::string time = http::time_text(std::chrono::system_clock::now());
+    if (!is_json_) return tools::print_error_line(kProgram, time + " " + text);
+    Json line = {{"time", time}};
+    line.update(members);
+    fprintf(stderr, "%s\n", line.dump(-1, ' ', true, Json::error_handler_t::replace).c_str());
+  }
+
+  bool is_json_;
+};
 
 // ---- What the command line says
 
@@ -132,7 +163,9 @@ broker::Policy policy_of(const ConnectArguments &arguments) {
 class Caller {
  public:
   Caller(const DeviceArguments &device, const ConnectArguments &arguments)
-      : policy_(policy_of(arguments)), client_(client_options(arguments)) {
+      : log_(arguments.call_log),
+        policy_(policy_of(arguments)),
+        client_(client_options(arguments)) {
     if (!arguments.image_directory.empty()) {
       ends_.keep_image = [folder = broker::ImageFolder(arguments.image_directory)](
                              const std::string &taid, std::string_view image) {
@@ -142,19 +175,23 @@ class Caller {
     ends_.url = broker::device_url(arguments.url, LocalAgent(device, device.must_exist).id());
     ends_.post = [this](const http::Call &call) { return client_.send(call); };
     ends_.open_agent = [device] { return std::make_unique<LocalAgent>(device, true); };
-    ends_.on_exchange = log_exchange;
+    ends_.on_exchange = [this](const broker::Exchange &exchange) { log_.exchange(exchange); };
   }
   Caller(const Caller &) = delete;
   Caller &operator=(const Caller &) = delete;
 
   /// Throws what kept the call from its end.
   void call(const broker::Stop &stop) {
-    const broker::Outcome outcome = broker::call(ends_, policy_, stop, log_retry);
+    const broker::Outcome outcome = broker::call(
+        ends_, policy_, stop,
+        [this](const broker::Outcome &failed, milliseconds pause) { log_.retry(failed, pause); });
     if (!outcome.reason.empty()) throw std::runtime_error(outcome.reason);
-    log_end(outcome);
+    log_.end(outcome);
   }
+  const Log &log() const { return log_; }
 
  private:
+  Log log_;
   broker::Policy policy_;
   http::Client client_;
   broker::Ends ends_;
@@ -190,7 +227,7 @@ void connect_device(const DeviceArguments &device, const ConnectArguments &argum
     } catch (const tools::UsageError &) {
       throw;  // no later call can be better
     } catch (const std::exception &failure) {
-      log_line(failure.what());
+      caller.log().failure(failure.what());
     }
   } while (!stop.wait_for(interval.next()));
 }

@@ -21,6 +21,7 @@ struct ConnectArguments {
   std::string reply_time;
   std::string retries;
   std::string first_pause;
+  std::string call_log = "text";  // or "json"
 };
 
 /// Each message is a line on standard error. Returns when a call ended well or SIGTERM or SIGINT

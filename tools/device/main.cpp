@@ -146,7 +146,8 @@ const Command kCommands[] = {
       {"--retries", "COUNT", &Arguments::retries,
        "How often a call without an answer is begun anew (default: 4)"},
       {"--first-pause", "MILLISECONDS", &Arguments::first_pause,
-       "Before the first of these, then twice as long each, up to a minute (default: 1000)"}},
+       "Before the first of these, then twice as long each, up to a minute (default: 1000)"},
+      {"--log", "FORMAT", &Arguments::call_log, "text or json: a line for each message"}},
      "The address that is called ends in the device's ID: it is added, unless URL ends in it.\n"
      "Each message is a line on standard error. SIGTERM and SIGINT end between two messages.\n",
      "connect https://tsm.example/tam --image-dir images --every 3600"},
