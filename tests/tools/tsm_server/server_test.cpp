@@ -190,6 +190,32 @@ TEST(TsmServer, WhateverIsLostTheNextCallArrives) {
   }
 }
 
+TEST(TsmServer, ALostQuestionBringsNoImageAgainButAFewInARowDo) {
+  Fleet fleet;
+  ASSERT_EQ(fleet.call().reason, "");
+  fleet.executed.clear();
+  const auto call = [&](int lost) {  // requests and answers, counted from 1
+    const int before = fleet.num_posts;
+    bool was_lost = false;
+    fleet.lose = [&, before](int now, bool is_answer) {
+      if (2 * (now - before) - !is_answer != lost) return;
+      was_lost = true;
+      throw http::ClientError(http::Failure::kLost, "lost");
+    };
+    (void)fleet.call();
+    return was_lost;
+  };
+  int lost = 1;
+  while (call(lost)) ASSERT_LT(++lost, 12);
+  EXPECT_EQ(fleet.row().outcome, "current");
+  EXPECT_EQ(fleet.executed.size(), 2u) << "the state and versions are asked for, nothing is done";
+
+  for (int i = 0; i < 3; ++i) EXPECT_TRUE(call(5)) << "the answer of the device about its first TA";
+  EXPECT_FALSE(call(0));
+  EXPECT_EQ(fleet.executed["update-ta pass"], 1);
+  EXPECT_EQ(fleet.row().outcome, "current");
+}
+
 TEST(TsmServer, WhatIsNotTheAnswerChangesNothing) {
   Fleet fleet;
   Service impatient(fleet.tsm, &fleet.stores[0], 0s);

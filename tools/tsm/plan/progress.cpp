@@ -9,6 +9,8 @@
 namespace tsm {
 namespace {
 
+constexpr int kMaxUnanswered = 3;  // questions about a TA, in a row
+
 bool is_about_ta(MessageId id) {
   return id == MessageId::kInstallTa || id == MessageId::kUpdateTa || id == MessageId::kDeleteTa ||
          id == MessageId::kGetTaInfo;
@@ -94,7 +96,8 @@ bool changes_device(const Order &order) {
 void begin_session(Progress *progress) {
   *progress = {.is_ours = std::move(progress->is_ours),
                .versions = std::move(progress->versions),
-               .doubtful = std::move(progress->doubtful)};
+               .doubtful = std::move(progress->doubtful),
+               .unanswered = std::move(progress->unanswered)};
 }
 
 std::string attempt_key(const Order &order) {
@@ -119,6 +122,7 @@ void learn(const Order &order, const Response &response, const std::string &refu
   note_success(order, progress);
   if (order.message == MessageId::kGetDeviceState) progress->has_changed = false;
   if (order.message == MessageId::kGetTaInfo) {
+    progress->unanswered.erase(order.options.taid);
     const std::string *version = find_string(response.members, "ta_version");
     progress->versions[order.options.taid] = version == nullptr ? "" : *version;
   } else if (response.dsi_text) {
@@ -132,6 +136,14 @@ void learn_nothing(const Order &order, const std::string &why, Progress *progres
   progress->has_changed = progress->has_changed || changes_device(order);
   note_failure(order, progress);
   if (order.message != MessageId::kGetTaInfo) progress->state.reset();
+}
+
+void learn_loss(const Order &order, const std::string &why, Progress *progress) {
+  const std::string &taid = order.options.taid;
+  const bool is_question = order.message == MessageId::kGetTaInfo;
+  if (is_question && ++progress->unanswered[taid] < kMaxUnanswered) return;
+  progress->unanswered.erase(taid);
+  learn_nothing(order, why, progress);
 }
 
 void settle(Progress *progress) {
@@ -170,7 +182,8 @@ void imagine(const Order &order, Progress *progress) {
 Json progress_json(const Progress &progress) {
   return {{"is_ours", progress.is_ours},
           {"versions", progress.versions},
-          {"doubtful", progress.doubtful}};
+          {"doubtful", progress.doubtful},
+          {"unanswered", progress.unanswered}};
 }
 
 Progress parse_progress(const Json &value) {
@@ -183,6 +196,11 @@ Progress parse_progress(const Json &value) {
   if (const Json *versions = find_object(value, "versions")) {
     for (const auto &[taid, version] : versions->items()) {
       if (version.is_string()) progress.versions[taid] = version.get<std::string>();
+    }
+  }
+  if (const Json *unanswered = find_object(value, "unanswered")) {
+    for (const auto &[taid, number] : unanswered->items()) {
+      if (number.is_number_integer()) progress.unanswered[taid] = number.get<int>();
     }
   }
   if (const Json *doubtful = find_array(value, "doubtful")) {

@@ -20,6 +20,7 @@ struct Progress {
   std::map<std::string, bool> is_ours = {};          // by SD, where it is known
   std::map<std::string, std::string> versions = {};  // by TA ID
   std::set<std::string> doubtful = {};               // TA IDs
+  std::map<std::string, int> unanswered = {};        // by TA ID: lost questions, in a row
 
   // Of one session.
   std::optional<Json> state = {};            // none: to be asked for
@@ -44,6 +45,11 @@ void learn(const Order &order, const Response &response, const std::string &refu
 
 /// No answer came, or none that could be believed: what the order would have changed is in doubt.
 void learn_nothing(const Order &order, const std::string &why, Progress *progress);
+
+/// The same, of an answer that may only be lost on its way: then a question about a TA has done
+/// nothing. But a device that cannot tell of a TA gives no answer either, so the TA is in doubt
+/// after a few in a row.
+void learn_loss(const Order &order, const std::string &why, Progress *progress);
 
 /// The plan is met.
 void settle(Progress *progress);

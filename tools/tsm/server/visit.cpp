@@ -43,7 +43,7 @@ void Visit::begin() {
     const OpenRequest open = parse_open_request(row_.open_request);
     lost_ = row_.open_message;
     event_.reason = order_text(open.order) + " was not answered";
-    learn_nothing(open.order, event_.reason, &progress_);
+    learn_loss(open.order, event_.reason, &progress_);
   }
   begin_session(&progress_);
 }
