@@ -10,6 +10,7 @@
 #include <map>
 #include <mutex>
 #include <span>
+#include <string_view>
 
 #include "error.h"
 #include "loaded_image.h"
@@ -50,11 +51,12 @@ std::vector<std::string> installed_folders() {
   return folders;
 }
 
-std::vector<std::string> search_path() {
+// Valid as long as the lock is held.
+std::vector<std::string_view> search_path() {
   static const std::vector<std::string> installed = installed_folders();
-  std::vector<std::string> folders;
+  std::vector<std::string_view> folders;
   folders.reserve(installed.size() + 2);
-  if (!g_test_directory.empty()) folders.push_back(g_test_directory);
+  if (!g_test_directory.empty()) folders.emplace_back(g_test_directory);
   folders.insert(folders.end(), installed.begin(), installed.end());
   if (const char *folder = std::getenv("OTRP_TA_DIR"); folder != nullptr && *folder != '\0') {
     folders.emplace_back(folder);
@@ -65,11 +67,14 @@ std::vector<std::string> search_path() {
 // The file, and what the system says of it.
 std::string find_image(const TEE_UUID &ta, struct stat &status) {
   const std::string name = uuid_text(ta) + ".so";
-  std::string looked;
-  for (const std::string &folder : search_path()) {
-    std::string file = folder + '/' + name;
+  std::string file;
+  for (const std::string_view folder : search_path()) {
+    file.assign(folder).append(1, '/').append(name);
     if (::stat(file.c_str(), &status) == 0) return file;
-    looked += (looked.empty() ? " in " : ", ") + folder;
+  }
+  std::string looked;
+  for (const std::string_view folder : search_path()) {
+    looked.append(looked.empty() ? " in " : ", ").append(folder);
   }
   throw Error{TEE_ERROR_ITEM_NOT_FOUND, "no TA image " + name + looked};
 }

@@ -20,6 +20,7 @@ std::string uuid_text(const TEE_UUID &uuid) {
   static const char kDigits[] = "0123456789abcdef";
   const UuidBytes bytes = uuid_bytes(uuid);
   std::string text;
+  text.reserve(36);
   for (size_t i = 0; i < bytes.size(); ++i) {
     if (i == 4 || i == 6 || i == 8 || i == 10) text += '-';
     text += kDigits[bytes[i] >> 4];
