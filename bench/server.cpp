@@ -39,7 +39,7 @@ constexpr size_t kMany = 100'000;
 constexpr size_t kManyQuick = 1'000;
 constexpr size_t kNumAtOnce = 1'000;  // devices in a transaction
 constexpr size_t kNumExchanges = 84;  // of a run: each of another device, whole sessions
-constexpr int kNumRounds = 41;
+constexpr int kNumRounds = 25;
 constexpr size_t kImageLen = 100'000;
 constexpr int64_t kNeverDue = int64_t{1} << 40;
 constexpr std::chrono::seconds kTimeToAnswer{3600};
