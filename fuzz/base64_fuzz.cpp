@@ -92,7 +92,7 @@ void check(std::string_view input) {
     if (len == 0) break;
   }
   check_decoders(exact.bytes(), static_cast<uint32_t>(input.size()));
-  for (const size_t size : {1, 2, 7, 64}) {
+  for (const size_t size : {1U, 2U, 7U, 64U}) {
     require(decode_pieces(exact.bytes(), size) == decode_plainly(exact.bytes(), true),
             "pieces give what the whole gives");
   }
