@@ -23,10 +23,11 @@ void *operator new(size_t size) {
   if (block == nullptr) throw std::bad_alloc();
   return block;
 }
-void operator delete(void *block) noexcept {
+// Inlined without the one above, g++ takes these for mismatched.
+[[gnu::noinline]] void operator delete(void *block) noexcept {
   std::free(block);
 }
-void operator delete(void *block, size_t) noexcept {
+[[gnu::noinline]] void operator delete(void *block, size_t) noexcept {
   std::free(block);
 }
 
