@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "host_device.h"
 
+#include "loaded_image.h"
 #include "loader.h"
 
 namespace tee {
@@ -59,9 +60,26 @@ Instance *HostDevice::find_instance(const UuidBytes &ta) {
   return found != instances_.end() ? found->second.get() : nullptr;
 }
 
-Program HostDevice::program_of(const TEE_UUID &ta) const {
-  const auto found = registered_.find(uuid_bytes(ta));
-  return found != registered_.end() ? found->second : load_program(ta);
+Program HostDevice::program_of(const TEE_UUID &ta) {
+  const UuidBytes uuid = uuid_bytes(ta);
+  if (const auto found = registered_.find(uuid); found != registered_.end()) return found->second;
+  auto resting = resting_.extract(uuid);
+  const bool usable = resting && resting.mapped().image->reset();
+  return usable ? std::move(resting.mapped()) : load_program(ta);
+}
+
+// A trusted application that asks another one does so again. As long as it lives, the other one's
+// next instances run what the first one ran, which need not be looked for.
+void HostDevice::rest(Program program) noexcept {
+  if (instances_.empty()) {
+    resting_.clear();
+  } else if (program.image) {
+    try {
+      resting_.insert_or_assign(uuid_bytes(program.uuid), std::move(program));
+    } catch (const std::bad_alloc &) {
+      // The next one is looked for.
+    }
+  }
 }
 
 TEE_Result HostDevice::find_or_create(const TEE_UUID &ta, Instance **instance) {
@@ -88,7 +106,9 @@ void HostDevice::drop_client(Instance &instance) {
     const Running running(instance);
     instance.program.entry_points.destroy();
   }
+  Program program = std::move(instance.program);
   instances_.extract(instance.uuid);
+  rest(std::move(program));
 }
 
 }  // namespace tee

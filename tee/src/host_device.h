@@ -50,11 +50,13 @@ class HostDevice {
   bool creates_at_once = false;  // a creation without data is stored like one with data
 
  private:
-  Program program_of(const TEE_UUID &ta) const;
+  Program program_of(const TEE_UUID &ta);
   TEE_Result find_or_create(const TEE_UUID &ta, Instance **instance);
   void drop_client(Instance &instance);
+  void rest(Program program) noexcept;
 
   std::map<UuidBytes, Program> registered_;
+  std::map<UuidBytes, Program> resting_;  // of images that no instance runs
   std::map<UuidBytes, std::unique_ptr<Instance>> instances_;
 };
 

@@ -24,9 +24,7 @@ bool is_loaded(const std::string &file) {
   return handle != nullptr;
 }
 
-host::File copy_of(const std::string &file) {
-  const host::File source = host::open_for_reading(file.c_str());
-  if (!source.valid()) throw system_error("cannot read " + file);
+host::File copy_of(const std::string &file, const host::File &source) {
   host::File copy = host::copy_in_memory(fs::path(file).filename().c_str(), source);
   if (!copy.valid()) throw system_error("cannot copy " + file);
   return copy;
@@ -87,16 +85,19 @@ LoadedImage::LoadedImage(const std::string &file) : file_(file) {}
 
 // Unloading runs code of the image. Where the file was written over, so was that code.
 LoadedImage::~LoadedImage() {
-  if (handle_ != nullptr && !is_overwritten()) ::dlclose(handle_);
+  if (handle_ != nullptr && is_intact()) ::dlclose(handle_);
 }
 
 // The dynamic linker takes an object of the same name for the same. A copy in memory has a name
 // that no other one has while it is open.
 void LoadedImage::open() {
-  if (::stat(file_.c_str(), &status_) != 0) throw system_error("cannot read " + file_);
+  source_ = host::open_for_reading(file_.c_str());
+  if (!source_.valid() || ::fstat(source_.get(), &status_) != 0) {
+    throw system_error("cannot read " + file_);
+  }
   std::string name = file_;
   if (is_loaded(file_)) {
-    copy_ = copy_of(file_);
+    copy_ = copy_of(file_, source_);
     name = "/proc/self/fd/" + std::to_string(copy_.get());
   }
   handle_ = ::dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
@@ -128,17 +129,19 @@ bool LoadedImage::is_of(const struct stat &status) const {
          is_same_time(status.st_ctim, status_.st_ctim);
 }
 
-bool LoadedImage::is_overwritten() const {
+// A copy is nobody else's. Giving a file another name, or none, changes the time of its status.
+bool LoadedImage::is_intact() const {
   struct stat now;
-  return !copy_.valid() && ::stat(file_.c_str(), &now) == 0 && is_same_file(now, status_) &&
-         !is_of(now);
+  return copy_.valid() || (::fstat(source_.get(), &now) == 0 && now.st_size == status_.st_size &&
+                           is_same_time(now.st_mtim, status_.st_mtim));
 }
 
 bool LoadedImage::reset() {
+  if (has_other_variables_ || !is_intact()) return false;
   for (const Variables &variables : variables_) {
     copy(variables.initial.data(), variables.initial.size(), variables.at);
   }
-  return !has_other_variables_;
+  return true;
 }
 
 }  // namespace tee

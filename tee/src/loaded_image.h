@@ -32,7 +32,7 @@ class LoadedImage {
   bool is_of(const struct stat &status) const;
 
   /// Sets all variables to what they were when the image had just been loaded. False when it
-  /// cannot: the image is then used up.
+  /// cannot, or the file, wherever it is now, was written to: the image is then used up.
   bool reset();
 
  private:
@@ -44,9 +44,10 @@ class LoadedImage {
   explicit LoadedImage(const std::string &file);
   void open();
   void remember_variables();
-  bool is_overwritten() const;
+  bool is_intact() const;
 
   const std::string file_;
+  host::File source_;        // keeps hold of the file, though others may take its place
   struct stat status_ = {};  // of the file, when it was loaded
   host::File copy_;          // where it was loaded from, when not from the file itself
   void *handle_ = nullptr;

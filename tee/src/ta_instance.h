@@ -16,7 +16,8 @@
 
 namespace tee {
 class HostDevice;
-}
+class LoadedImage;
+}  // namespace tee
 
 /// A session with a trusted application, of a client of either world.
 struct __TEE_TASessionHandle {
@@ -36,7 +37,7 @@ struct Program {
   std::string trace_prefix;
   uint32_t trace_level;
   tee_ta_entry_points entry_points;
-  std::shared_ptr<void> image;  // keeps the loaded code; NULL for functions
+  std::shared_ptr<LoadedImage> image;  // keeps the loaded code; NULL for functions
 };
 
 class Instance {
@@ -51,7 +52,7 @@ class Instance {
   tee_heap_stats stats() const;
 
   HostDevice &device;
-  const Program program;
+  Program program;
   const UuidBytes uuid;
   Heap heap;
   OpenHandles handles;

@@ -2,6 +2,7 @@
 // Ways into a trusted application: loading, sessions of both worlds, parameters.
 #include <atomic>
 #include <chrono>
+#include <fstream>
 #include <thread>
 
 #include "tee_support.h"
@@ -29,17 +30,42 @@ TEST(Loading, AMissingOrWrongImageIsNamed) {
   set_ta_directory("");
 }
 
+uint32_t commands_of(Client &client) {
+  TEEC_Operation operation{};
+  operation.paramTypes = TEEC_VALUE_OUTPUT;
+  EXPECT_EQ(client.invoke(0, &operation), TEEC_SUCCESS);
+  return operation.params[0].value.a;
+}
+
+// As long as another instance of its device lives, the next one runs what the last one ran, unless
+// that was written to.
+TEST(Loading, AnImageRestsBetweenInstances) {
+  TemporaryFolder folder;
+  const std::filesystem::path image = folder.path / "00000001-0000-4000-8000-00000000000a.so";
+  const std::filesystem::path moved = folder.path / "moved.so";
+  std::filesystem::copy(OTRP_COUNTING_IMAGE, image);
+  set_ta_directory(folder.path);
+  Device device;
+  register_script<1>(device, kTaB);
+  Client keeper(device.name()), client(device.name());
+  ASSERT_EQ(keeper.open(kTaB), TEEC_SUCCESS);
+  for (int i = 0; i < 2; ++i) {
+    ASSERT_EQ(client.open(kTaA), TEEC_SUCCESS);
+    EXPECT_EQ(commands_of(client), 1u);
+    client.close();
+    if (i == 0) std::filesystem::rename(image, moved);
+  }
+  std::filesystem::copy(kCorvelImage, image);
+  std::ofstream(moved, std::ios::app) << "more";
+  EXPECT_EQ(client.open(kTaA), TEEC_ERROR_BAD_FORMAT);
+  set_ta_directory("");
+}
+
 TEST(Loading, AnInstanceSharesNoVariableWithOthersOfItsImage) {
   TemporaryFolder folder;
   const std::filesystem::path image = folder.path / "00000001-0000-4000-8000-00000000000a.so";
   std::filesystem::copy(OTRP_COUNTING_IMAGE, image);
   set_ta_directory(folder.path);
-  const auto commands_of = [](Client &client) {
-    TEEC_Operation operation{};
-    operation.paramTypes = TEEC_VALUE_OUTPUT;
-    EXPECT_EQ(client.invoke(0, &operation), TEEC_SUCCESS);
-    return operation.params[0].value.a;
-  };
   Device device, other_device;
   Client client(device.name()), other(other_device.name());
   for (int i = 0; i < 3; ++i) {
