@@ -33,12 +33,10 @@ void tidy_heap() {
 }
 
 double measure(const Contestant &contestant, benchmark::IterationCount num_runs, Gauge gauge) {
-  if (contestant.before) contestant.before();
   tidy_heap();
   const double begin = read(gauge);
   for (benchmark::IterationCount i = 0; i < num_runs; ++i) contestant.run();
   const double end = read(gauge);
-  if (contestant.after) contestant.after();
   return (end - begin) / static_cast<double>(num_runs);
 }
 
@@ -80,11 +78,18 @@ void run_round(benchmark::State &state, const Comparison &comparison, size_t rou
   const benchmark::IterationCount num_runs = state.max_iterations;
   std::vector<double> amounts(contestants.size());
   while (state.KeepRunningBatch(num_runs)) {
-    // Each comes first as often as the others: what one leaves in the caches meets all of them.
+    // Each comes first as often as the others: what one leaves in the caches, or what comes before
+    // the runs, meets all of them.
+    for (const Contestant &contestant : contestants) {
+      if (contestant.before) contestant.before();
+    }
     for (size_t turn = 0; turn < contestants.size(); ++turn) {
       const size_t i = (turn + round) % contestants.size();
       amounts[i] = measure(contestants[i], num_runs, gauge);
       state.SetIterationTime(amounts[i] * static_cast<double>(num_runs));
+    }
+    for (const Contestant &contestant : contestants) {
+      if (contestant.after) contestant.after();
     }
   }
   state.counters = comparison.counters;
