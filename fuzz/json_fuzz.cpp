@@ -64,6 +64,13 @@ static void check_rewriting(const JSON_Value *value, const std::string &text) {
   require(copy && serialized(copy.get()) == text, "a copy is the same document");
   const json_ptr again = parsed(text);
   if (again) require_same(again.get(), text);
+  const ExactText kept_text(text);
+  const json_ptr kept(json_value_init_verbatim(kept_text.get()));
+  require(bool(kept) == bool(again) && (!kept || serialized(kept.get()) == serialized(again.get())),
+          "an array that stays its text is written as what is read from it");
+  require(json_value_count_elements(kept.get()) ==
+              json_array_get_count(json_value_get_array(again.get())),
+          "it has as many elements");
   const json_ptr spread = parsed(take_text(json_serialize_to_string_pretty(value)));
   require(bool(spread) == bool(again), "white space makes no difference");
   if (spread) require_same(spread.get(), text);

@@ -47,88 +47,89 @@ static T *allocate_zeroed() {
 
 // ---- The two forms
 
+namespace {
+
+struct list_forms {
+  JSON_Value *dsi_t::*value;
+  char *dsi_json_str_t::*text;
+  const char *value_name;
+  const char *text_name;
+};
+
+const list_forms kLists[] = {
+    {&dsi_t::sdl, &dsi_json_str_t::sdl_json_str, "sdl", "sdl_json_str"},
+    {&dsi_t::spl, &dsi_json_str_t::spl_json_str, "spl", "spl_json_str"},
+    {&dsi_t::tal, &dsi_json_str_t::tal_json_str, "tal", "tal_json_str"},
+};
+constexpr size_t kNumLists = sizeof kLists / sizeof kLists[0];
+
+}  // namespace
+
+static void drop_value(JSON_Value **value) {
+  json_value_free(*value);
+  *value = nullptr;
+}
+
+static void drop_values(dsi_t *dsi, JSON_Value *dsi_t::*except = nullptr) {
+  for (const list_forms &list : kLists) {
+    if (list.value != except) drop_value(&(dsi->*list.value));
+  }
+}
+
 void dsi_free(dsi_t *dsi) {
   if (dsi == nullptr) return;
-  json_value_free(dsi->sdl);
-  json_value_free(dsi->spl);
-  json_value_free(dsi->tal);
+  drop_values(dsi);
   TEE_Free(dsi);
 }
 
 void dsi_json_str_free(dsi_json_str_t *dsi) {
   if (dsi == nullptr) return;
-  TEE_Free(dsi->sdl_json_str);
-  TEE_Free(dsi->spl_json_str);
-  TEE_Free(dsi->tal_json_str);
+  for (const list_forms &list : kLists) TEE_Free(dsi->*list.text);
   TEE_Free(dsi);
 }
 
-static bool parse_over(const char *text, JSON_Value **value) {
-  if (text == nullptr) return true;
-  json_value_free(*value);
-  *value = json_parse_string(text);
-  return *value != nullptr;
-}
-
-static void drop_values(dsi_t *dsi) {
-  json_value_free(dsi->sdl);
-  json_value_free(dsi->spl);
-  json_value_free(dsi->tal);
-  *dsi = {};
-}
-
-TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out) {
+TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out, JSON_Value *dsi_t::*tree) {
   CHECK(in != nullptr && out != nullptr, OTRP_MISSING, "dsi_json_str_2_dsi input is NULL");
 
-  const char *failed = nullptr;
-  if (!parse_over(in->sdl_json_str, &out->sdl)) {
-    failed = "sdl_json_str";
-  } else if (!parse_over(in->spl_json_str, &out->spl)) {
-    failed = "spl_json_str";
-  } else if (!parse_over(in->tal_json_str, &out->tal)) {
-    failed = "tal_json_str";
+  for (const list_forms &list : kLists) {
+    const char *text = in->*list.text;
+    if (text == nullptr) continue;
+    JSON_Value **value = &(out->*list.value);
+    json_value_free(*value);
+    *value = list.value == tree ? json_parse_string(text) : json_value_init_verbatim(text);
+    if (*value != nullptr) continue;
+    drop_values(out);
+    FAIL(OTRP_NO_MEMORY, "dsi_json_str_2_dsi %s string to json fail", list.text_name);
   }
-  if (failed == nullptr) return TEE_SUCCESS;
-  drop_values(out);
-  FAIL(OTRP_NO_MEMORY, "dsi_json_str_2_dsi %s string to json fail", failed);
-}
-
-// A value that is not there has no text: the old one stays.
-static bool serialize(const JSON_Value *value, json_text *text) {
-  if (value == nullptr) return true;
-  text->reset(json_serialize_to_string(value));
-  return text->get() != nullptr;
-}
-
-static void replace_text(json_text *text, char **old) {
-  if (!*text) return;
-  TEE_Free(*old);
-  *old = text->release();
+  return TEE_SUCCESS;
 }
 
 TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out) {
   CHECK(in != nullptr && out != nullptr, OTRP_MISSING, "dsi_2_dsi_json_str input is NULL");
 
-  json_text sdl;
-  json_text spl;
-  json_text tal;
-  CHECK(serialize(in->sdl, &sdl), OTRP_NO_MEMORY,
-        "dsi_2_dsi_json_str dsi->sdl json to string fail");
-  CHECK(serialize(in->spl, &spl), OTRP_NO_MEMORY,
-        "dsi_2_dsi_json_str dsi->spl json to string fail");
-  CHECK(serialize(in->tal, &tal), OTRP_NO_MEMORY,
-        "dsi_2_dsi_json_str dsi->tal json to string fail");
-  replace_text(&sdl, &out->sdl_json_str);
-  replace_text(&spl, &out->spl_json_str);
-  replace_text(&tal, &out->tal_json_str);
+  json_text texts[kNumLists];
+  for (size_t i = 0; i < kNumLists; ++i) {
+    const JSON_Value *value = in->*kLists[i].value;
+    if (value == nullptr) continue;
+    texts[i].reset(json_serialize_to_string(value));
+    CHECK(texts[i], OTRP_NO_MEMORY, "dsi_2_dsi_json_str dsi->%s json to string fail",
+          kLists[i].value_name);
+  }
+  for (size_t i = 0; i < kNumLists; ++i) {
+    if (!texts[i]) continue;
+    TEE_Free(out->*kLists[i].text);
+    out->*kLists[i].text = texts[i].release();
+  }
   return TEE_SUCCESS;
 }
 
-TEE_Result open_dsi(const dsi_json_str_t *dsi, TEE_Result no_memory, dsi_ptr *working,
-                    const char *as) {
+TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*tree, TEE_Result no_memory,
+                    dsi_ptr *working, const char *as) {
   working->reset(allocate_zeroed<dsi_t>());
   CHECK_AS(as, *working, no_memory, "malloc dsi fail");
-  TRY_LOG_AS(as, dsi_json_str_2_dsi(dsi, working->get()), "dsi_json_str_2_dsi error code: 0x%x");
+  TRY_LOG_AS(as, dsi_json_str_2_dsi(dsi, working->get(), tree),
+             "dsi_json_str_2_dsi error code: 0x%x");
+  if (tree != nullptr) drop_values(working->get(), tree);
   return TEE_SUCCESS;
 }
 
@@ -261,7 +262,7 @@ static TEE_Result hand_over(JSON_Object *into, const char *key, JSON_Value **lis
 
 static TEE_Result fill_sdlist_info(JSON_Object *tee, JSON_Value **sdl) {
   JSON_Object *sdlist = json_object_get_object(tee, "sdlist");
-  const size_t num_sds = json_array_get_count(json_value_get_array(*sdl));
+  const size_t num_sds = json_value_count_elements(*sdl);
   const JSON_Status set = json_object_set_number(sdlist, "cnt", static_cast<double>(num_sds));
   if (set != JSONSuccess) return static_cast<TEE_Result>(set);
   return hand_over(sdlist, "sd", sdl);
@@ -302,7 +303,9 @@ JSON_Value *construct_dsi() {
   JSON_Value *document = dsi_get_json_dsi(g_dsi);
   CHECK(document != nullptr, nullptr, "dsi_get_json_dsi error");
   if constexpr (TA_TRACE_LEVEL >= TEE_TRACE_DEBUG) {
-    const json_text dump(json_serialize_to_string_pretty(document));
+    const json_text text(json_serialize_to_string(document));
+    const json_ptr tree(json_parse_string(text.get()));
+    const json_text dump(json_serialize_to_string_pretty(tree.get()));
     tee_trace(__func__, __LINE__, TEE_TRACE_DEBUG, "dsi_json %s", dump ? dump.get() : "");
   }
   return document;
@@ -338,7 +341,7 @@ static TEE_Result digest_dsi(dsi_t *lists, uint8_t *digest, uint32_t digest_len,
 
 TEE_Result dsi_validate_dsi_hash(const dsi_json_str_t *dsi, const char *hash) {
   dsi_ptr working;
-  TRY(open_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(open_dsi(dsi, nullptr, TEE_ERROR_OUT_OF_MEMORY, &working));
 
   const tee_ptr<uint8_t> digest(allocate_bytes(kSha256Len));
   CHECK(digest, TEE_ERROR_OUT_OF_MEMORY, "no memory for now_dsi_hash");

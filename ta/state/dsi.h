@@ -4,8 +4,9 @@
 /// then edited in step with them.
 ///
 /// At rest it is three compact JSON texts (`dsi_json_str_t`), which take less of the heap than
-/// trees. An edit is made on trees of its own (`dsi_t`) and comes into force when their new texts
-/// are there, all of them; until then the DSI is what it was. Entries are
+/// trees. They are sent and hashed as they are; only an edit makes a tree, of the one list that it
+/// changes, and comes into force when the new text is there. Until then the DSI is what it was. A
+/// text that cannot be read as JSON fails whatever is done with the DSI. Entries are
 ///
 ///     SD:   {"name", "spid", "talist"}          AIK:   {"spaik", "spaiktype", "spid"}
 ///
@@ -45,20 +46,24 @@ using dsi_text_ptr = owned<dsi_json_str_t *, dsi_json_str_free>;
 /// SD list where there is none.
 dsi_json_str_t *init_dsi();
 
-/// Replaces the values of `out` by those of the texts. OTRP_NO_MEMORY when one does not parse.
-[[nodiscard]] TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out);
+/// Replaces the values of `out` by those of the texts: a tree for the list `tree`, the texts
+/// themselves for the others. OTRP_NO_MEMORY when one does not parse.
+[[nodiscard]] TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out,
+                                            JSON_Value *dsi_t::*tree = nullptr);
 
 /// Replaces the texts of `out` by those of the values: all of them or, after a failure, none.
 [[nodiscard]] TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out);
 
-/// The working form of `dsi`, for the operation named `as`, which logs; `no_memory` is the
-/// code when there is no room for the structure.
-[[nodiscard]] TEE_Result open_dsi(const dsi_json_str_t *dsi, TEE_Result no_memory, dsi_ptr *working,
+/// The working form of `dsi`, for the operation named `as`, which logs: the list `tree` alone, as a
+/// tree, or with NULL all of them as texts. `no_memory` is the code when there is no room for the
+/// structure.
+[[nodiscard]] TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*tree,
+                                  TEE_Result no_memory, dsi_ptr *working,
                                   const char *as = __builtin_FUNCTION());
 
 // ---- The document that is sent, and its hash
 
-/// A new DSI document, or NULL.
+/// A new DSI document, or NULL. It borrows the texts of `dsi`, and is of use until they change.
 JSON_Value *dsi_get_json_dsi(const dsi_json_str_t *dsi);
 
 /// The document of g_dsi, or NULL.

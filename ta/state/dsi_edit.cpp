@@ -8,13 +8,13 @@
 #include "state/dsi.h"
 #include "state/object_store.h"
 
-// Has `change` edit the working form of `dsi`, and puts it back unless that fails.
+// Has `change` edit one of the lists, and puts it back unless that fails.
 template <class Change>
-static TEE_Result edit_dsi(dsi_json_str_t *dsi, TEE_Result no_memory, const Change &change,
-                           const char *as = __builtin_FUNCTION()) {
+static TEE_Result edit_dsi(dsi_json_str_t *dsi, JSON_Value *dsi_t::*list, TEE_Result no_memory,
+                           const Change &change, const char *as = __builtin_FUNCTION()) {
   dsi_ptr working;
-  TRY(open_dsi(dsi, no_memory, &working, as));
-  TRY(change(working.get()));
+  TRY(open_dsi(dsi, list, no_memory, &working, as));
+  TRY(change(working.get()->*list));
   TRY_LOG_AS(as, dsi_2_dsi_json_str(working.get(), dsi), "dsi_2_dsi_json_str error code: 0x%x");
   return TEE_SUCCESS;
 }
@@ -56,8 +56,8 @@ TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *
   CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
         TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
   return edit_dsi(
-      dsi, TEE_ERROR_OUT_OF_MEMORY,
-      [=](dsi_t *working) { return add_aik(working->spl, spid, key, key_len, spaiktype, as); }, as);
+      dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY,
+      [=](JSON_Value *spl) { return add_aik(spl, spid, key, key_len, spaiktype, as); }, as);
 }
 
 static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
@@ -69,8 +69,8 @@ static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
 }
 
 TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
-  return edit_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY,
-                  [=](dsi_t *working) { return remove_aik(working->spl, spid); });
+  return edit_dsi(dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY,
+                  [=](JSON_Value *spl) { return remove_aik(spl, spid); });
 }
 
 // ---- SD entries
@@ -78,7 +78,7 @@ TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) 
 TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, uint32_t *found) {
   *found = 0;
   dsi_ptr working;
-  TRY(open_dsi(dsi, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(open_dsi(dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY, &working));
   const JSON_Array *entries = json_value_get_array(working->sdl);
   size_t index = 0;
   TRY(find_entry(entries, "spid", spid, &index));
@@ -102,8 +102,8 @@ static TEE_Result load_sd(dsi_json_str_t *dsi, const char *sdname,
   json_ptr entry(json_value_init_object());
   CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
   return edit_dsi(
-      dsi, TEE_ERROR_OUT_OF_MEMORY,
-      [&](dsi_t *working) { return add_sd(working->sdl, sdname, &entry, as); }, as);
+      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
+      [&](JSON_Value *sdl) { return add_sd(sdl, sdname, &entry, as); }, as);
 }
 
 TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
@@ -129,8 +129,8 @@ static TEE_Result remove_sd(JSON_Value *sdl, const char *sdname,
 TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
   const char *as = __builtin_FUNCTION();
   return edit_dsi(
-      g_dsi, OTRP_NO_MEMORY, [=](dsi_t *working) { return remove_sd(working->sdl, sdname, as); },
-      as);
+      g_dsi, &dsi_t::sdl, OTRP_NO_MEMORY,
+      [=](JSON_Value *sdl) { return remove_sd(sdl, sdname, as); }, as);
 }
 
 // Stricter about the entries on the way, and content when none has the name.
@@ -157,8 +157,8 @@ static TEE_Result remove_sd_if_there(JSON_Value *sdl, const char *sdname,
 TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
   const char *as = __builtin_FUNCTION();
   return edit_dsi(
-      dsi, TEE_ERROR_OUT_OF_MEMORY,
-      [=](dsi_t *working) { return remove_sd_if_there(working->sdl, sdname, as); }, as);
+      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
+      [=](JSON_Value *sdl) { return remove_sd_if_there(sdl, sdname, as); }, as);
 }
 
 TEE_Result refresh_sd_in_dsi(const char *sdname, const char *as) {

@@ -95,8 +95,8 @@ static json_extent measure_tree(const JSON_Value *root) {
 
 static void copy_content(const JSON_Value *from, JSON_Value *to, json_room *room) {
   if (from->type == kJsonNumber) to->number = from->number;
-  if (from->type != kJsonString) return;
-  to->text = new_text(room, from->text, from->count);
+  if (from->type != kJsonString && from->type != kJsonVerbatim) return;
+  to->text = from->type == kJsonString ? new_text(room, from->text, from->count) : from->text;
   to->count = from->count;
 }
 
@@ -193,6 +193,12 @@ JSON_Array *json_object_get_array(const JSON_Object *object, const char *name) {
 
 size_t json_array_get_count(const JSON_Array *array) {
   return array != nullptr ? array->node.count : 0;
+}
+
+size_t json_value_count_elements(const JSON_Value *value) {
+  const bool listed =
+      value != nullptr && (value->type == kJsonArray || value->type == kJsonVerbatim);
+  return listed ? value->count : 0;
 }
 
 // The element at `index`, which must be there. Starts from where the last walk ended, if it can.

@@ -32,6 +32,11 @@ JSON_Value *json_parse_string(const char *text);
 JSON_Value *json_value_init_object();
 JSON_Value *json_value_init_array();
 
+/// The array that `text` is, for a document that is only written: it stays its text, and has no
+/// elements that could be asked for. `text` must have come from json_serialize_to_string; it is
+/// borrowed, by copies too. NULL and what would be written are as with json_parse_string.
+JSON_Value *json_value_init_verbatim(const char *text);
+
 /// A document of its own, also when `value` is a part of one.
 JSON_Value *json_value_deep_copy(const JSON_Value *value);
 
@@ -52,6 +57,9 @@ JSON_Array *json_object_get_array(const JSON_Object *object, const char *name);
 
 /// 0 for NULL.
 size_t json_array_get_count(const JSON_Array *array);
+
+/// The number of elements of an array, verbatim or not; 0 for all else.
+size_t json_value_count_elements(const JSON_Value *value);
 
 /// A walk by ascending index takes constant time per step.
 const char *json_array_get_string(const JSON_Array *array, size_t index);

@@ -26,6 +26,7 @@ enum json_type : uint8_t {
   kJsonTrue,
   kJsonNumber,
   kJsonString,
+  kJsonVerbatim,  // an array as its text, which is someone else's
   kJsonArray,
   kJsonObject,
 };
@@ -45,7 +46,7 @@ struct JSON_Value {
     char *text;
     JSON_Value *first;
   };
-  uint32_t count;      // children, or bytes of the text
+  uint32_t count;      // children, of a verbatim array too, or bytes of the text
   uint16_t name_mark;  // names with different marks differ
   json_type type;
   uint8_t flags;

@@ -248,6 +248,8 @@ static void put_value(Sink *out, const JSON_Value *value) {
       return out->put_number(value->number);
     case kJsonString:
       return put_string(out, value->text, value->count);
+    case kJsonVerbatim:
+      return out->put_run(value->text, static_cast<uint32_t>(strlen(value->text)));
     case kJsonArray:
       return out->put('[');
     case kJsonObject:

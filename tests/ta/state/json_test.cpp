@@ -68,6 +68,20 @@ TEST_F(Json, RefusesWhatIsNoDocument) {
   EXPECT_EQ(json_parse_string(nullptr), nullptr);
 }
 
+// A list that stays its text is written like the tree that is read from it.
+TEST_F(Json, KeepsTexts) {
+  const std::string deep = std::string(20, '[') + std::string(20, ']');
+  for (const std::string &text :
+       {std::string("[]"), std::string(R"([1,"a,b",{"c":[2,3]}])"), deep, "[" + deep + "]",
+        std::string("[0.000000]"), std::string("[\"\x01\"]"), std::string("[1"),
+        std::string("{}")}) {
+    const json_ptr kept(json_value_init_verbatim(text.c_str())), read = parse(text);
+    EXPECT_EQ(compact(kept.get()), compact(read.get())) << text;
+    EXPECT_EQ(json_value_count_elements(kept.get()), json_value_count_elements(read.get()));
+    EXPECT_EQ(compact(json_ptr(json_value_deep_copy(kept.get())).get()), compact(read.get()));
+  }
+}
+
 TEST_F(Json, ParsesNumbers) {
   for (const std::string &c :
        words("0=0 -0=0 3735879681=3735879681 -12=-12 0.5=0.500000 -.5=-0.500000 1.=1 1e2=100 "
