@@ -104,17 +104,13 @@ JSON_Value *construct_dsi();
 
 /// Appends an entry made from the stored SD record; does not look for an older one.
 [[nodiscard]] TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname);
-[[nodiscard]] TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname);
 
-/// OTRP_MISSING when no entry has that name.
-[[nodiscard]] TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname);
-
-/// The same, but there need not be one.
+/// Removes the entry of that name, if there is one.
 [[nodiscard]] TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname);
 
-/// Lets g_dsi show an SD as it is stored now: takes the entry out and makes a new one, the last,
-/// from the record. When that cannot be made the DSI is without the SD until the next instance.
-/// Logs under the name of the operation `as`.
+/// Lets g_dsi show an SD as it is stored now: takes the entry out, OTRP_MISSING when there is none,
+/// and makes a new one, the last, from the record. When that cannot be made the DSI is without the
+/// SD until the next instance. Logs under the name of the operation `as`.
 [[nodiscard]] TEE_Result refresh_sd_in_dsi(const char *sdname,
                                            const char *as = __builtin_FUNCTION());
 

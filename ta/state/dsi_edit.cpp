@@ -87,50 +87,32 @@ TEE_Result check_spid_in_dsi_sdl(const dsi_json_str_t *dsi, const char *spid, ui
   return TEE_SUCCESS;
 }
 
-// Fills `entry` from the SD's record and appends it.
-static TEE_Result add_sd(JSON_Value *sdl, const char *sdname, json_ptr *entry,
-                         const char *as = __builtin_FUNCTION()) {
+// Appends an entry that is made from the SD's record.
+static TEE_Result add_sd(JSON_Value *sdl, const char *sdname, const char *as) {
+  json_ptr entry(json_value_init_object());
+  CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
   const json_ptr record(get_json_by_name(SD_INFO_PREFIX, sdname));
   CHECK_AS(as, record, TEE_ERROR_GENERIC, "get_json_by_name %s %s error", SD_INFO_PREFIX,
            sdname != nullptr ? sdname : "(null)");
-  TRY(fill_sd_entry(json_value_get_object(entry->get()), json_value_get_object(record.get()), as));
-  return static_cast<TEE_Result>(json_array_take(json_value_get_array(sdl), entry));
-}
-
-static TEE_Result load_sd(dsi_json_str_t *dsi, const char *sdname,
-                          const char *as = __builtin_FUNCTION()) {
-  json_ptr entry(json_value_init_object());
-  CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "Bad get item object sdl_item_value\n");
-  return edit_dsi(
-      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
-      [&](JSON_Value *sdl) { return add_sd(sdl, sdname, &entry, as); }, as);
+  TRY(fill_sd_entry(json_value_get_object(entry.get()), json_value_get_object(record.get()), as));
+  return static_cast<TEE_Result>(json_array_take(json_value_get_array(sdl), &entry));
 }
 
 TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
-  const TEE_Result result = load_sd(dsi, sdname);
+  const char *as = __builtin_FUNCTION();
+  const TEE_Result result = edit_dsi(
+      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
+      [=](JSON_Value *sdl) { return add_sd(sdl, sdname, as); }, as);
   if (result != TEE_SUCCESS) dsi->lacks_an_sd = true;
   return result;
 }
 
-TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname) {
-  TRY_LOG(dsi_load_sd_by_name(g_dsi, sdname), "dsi_load_sd_by_name error code: 0x%x");
-  return TEE_SUCCESS;
-}
-
-static TEE_Result remove_sd(JSON_Value *sdl, const char *sdname,
-                            const char *as = __builtin_FUNCTION()) {
+static TEE_Result remove_sd(JSON_Value *sdl, const char *sdname, const char *as) {
   JSON_Array *entries = json_value_get_array(sdl);
   size_t index = 0;
   TRY(find_entry(entries, "name", sdname, &index));
   CHECK_AS(as, index < json_array_get_count(entries), OTRP_MISSING, "delete dsi sd with name fail");
   return json_array_remove(entries, index) == JSONSuccess ? TEE_SUCCESS : OTRP_NO_MEMORY;
-}
-
-TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname) {
-  const char *as = __builtin_FUNCTION();
-  return edit_dsi(
-      g_dsi, &dsi_t::sdl, OTRP_NO_MEMORY,
-      [=](JSON_Value *sdl) { return remove_sd(sdl, sdname, as); }, as);
 }
 
 // Stricter about the entries on the way, and content when none has the name.
@@ -161,10 +143,34 @@ TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
       [=](JSON_Value *sdl) { return remove_sd_if_there(sdl, sdname, as); }, as);
 }
 
+// ---- Refreshing an SD
+//
+// Both steps edit one tree, which goes back after the second one, whether or not that failed: a
+// record that cannot be read takes its SD out.
+
+static TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname, dsi_ptr *working) {
+  const char *as = __builtin_FUNCTION();
+  TRY(open_dsi(g_dsi, &dsi_t::sdl, OTRP_NO_MEMORY, working, as));
+  return remove_sd((*working)->sdl, sdname, as);
+}
+
+static TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname, dsi_t *working) {
+  const TEE_Result added = add_sd(working->sdl, sdname, "dsi_load_sd_by_name");
+  const TEE_Result put_back = dsi_2_dsi_json_str(working, g_dsi);
+  if (put_back != TEE_SUCCESS) {
+    trace_error("dsi_load_sd_by_name", __LINE__, "dsi_2_dsi_json_str error code: 0x%x", put_back);
+  }
+  const TEE_Result result = added != TEE_SUCCESS ? added : put_back;
+  if (result != TEE_SUCCESS) g_dsi->lacks_an_sd = true;
+  TRY_LOG(result, "dsi_load_sd_by_name error code: 0x%x");
+  return TEE_SUCCESS;
+}
+
 TEE_Result refresh_sd_in_dsi(const char *sdname, const char *as) {
-  TRY_LOG_AS(as, remove_g_dsi_sdl_item_by_sdname(sdname),
+  dsi_ptr working;
+  TRY_LOG_AS(as, remove_g_dsi_sdl_item_by_sdname(sdname, &working),
              "remove_g_dsi_sdl_item_by_sdname fail error code: 0x%x");
-  TRY_LOG_AS(as, load_g_dsi_sdl_item_by_sdname(sdname),
+  TRY_LOG_AS(as, load_g_dsi_sdl_item_by_sdname(sdname, working.get()),
              "load_g_dsi_sdl_item_by_sdname fail error code: 0x%x");
   return TEE_SUCCESS;
 }
