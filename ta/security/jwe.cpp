@@ -102,9 +102,9 @@ TEE_Result verify_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint8
 
 static bool set_encoded(JSON_Object *into, const char *key, const uint8_t *bytes, uint32_t len,
                         const char *failed, const char *as = __builtin_FUNCTION()) {
-  const tee_ptr<char> text(base64urlEncodeAddEndZero(bytes, len));
+  tee_ptr<char> text(base64urlEncodeAddEndZero(bytes, len));
   CHECK_AS(as, text, false, "%s", failed);
-  return json_object_set_string(into, key, text.get()) == JSONSuccess;
+  return json_object_take_string(into, key, &text) == JSONSuccess;
 }
 
 JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,

@@ -283,21 +283,20 @@ char *construct_json_signature(const char *name, const char *payload, const char
   CHECK(root, nullptr, "init response json error");
   tee_ptr<char> payload_text(encode_text(payload, "base64url encode payload error"));
   if (!payload_text) return nullptr;
-  const tee_ptr<char> protect_text(encode_text(protect, "base64url encode protect error"));
+  tee_ptr<char> protect_text(encode_text(protect, "base64url encode protect error"));
   if (!protect_text) return nullptr;
-  const tee_ptr<char> signature_text(encode_signature(payload_text.get(), protect_text.get(), key));
+  tee_ptr<char> signature_text(encode_signature(payload_text.get(), protect_text.get(), key));
   if (!signature_text) return nullptr;
 
   json_ptr envelope(json_value_init_object());
   CHECK(envelope, nullptr, "json_parse_string error");
   JSON_Object *members = json_value_get_object(envelope.get());
   const bool complete =
-      json_object_set_string(members, "payload", payload_text.get()) == JSONSuccess &&
-      json_object_set_string(members, "signature", signature_text.get()) == JSONSuccess &&
-      json_object_set_string(members, "protect", protect_text.get()) == JSONSuccess &&
+      json_object_take_string(members, "payload", &payload_text) == JSONSuccess &&
+      json_object_take_string(members, "signature", &signature_text) == JSONSuccess &&
+      json_object_take_string(members, "protect", &protect_text) == JSONSuccess &&
       add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
   if (!complete) return nullptr;
-  payload_text.reset();
   if (own_header && json_object_take(members, "header", &own_header) != JSONSuccess) return nullptr;
   CHECK(json_object_take(json_value_get_object(root.get()), name, &envelope) == JSONSuccess,
         nullptr, "set signature_json to response json Fail");

@@ -88,7 +88,7 @@ static json_extent measure_tree(const JSON_Value *root) {
     ++extent.num_nodes;
     if (at->type == kJsonArray) ++extent.num_arrays;
     if (at->type == kJsonString) extent.text_len += uint64_t{at->count} + 1;
-    if (at != root && at->name != nullptr) extent.text_len += strlen(at->name) + 1;
+    if (at != root && at->name != nullptr) extent.text_len += uint64_t{name_len(at)} + 1;
   }
   return extent;
 }
@@ -98,14 +98,16 @@ static void copy_content(const JSON_Value *from, JSON_Value *to, json_room *room
   if (from->type != kJsonString && from->type != kJsonVerbatim) return;
   to->text = from->type == kJsonString ? new_text(room, from->text, from->count) : from->text;
   to->count = from->count;
+  to->flags |= from->flags & kPlainText;
 }
 
 static JSON_Value *copy_child(const JSON_Value *from, JSON_Value *parent, JSON_Value *last,
                               json_room *room) {
   JSON_Value *child = new_node(room, from->type);
   if (from->name != nullptr) {
-    child->name = new_text(room, from->name, static_cast<uint32_t>(strlen(from->name)));
+    child->name = new_text(room, from->name, name_len(from));
     child->name_mark = from->name_mark;
+    child->flags |= from->flags & kPlainName;
   }
   copy_content(from, child, room);
   append_child(parent, last, child);
@@ -148,22 +150,20 @@ static const char *value_text(const JSON_Value *value) {
   return value != nullptr && value->type == kJsonString ? value->text : nullptr;
 }
 
-// Length, first and last character tell most names apart without looking at them.
-static uint16_t mark_of(const char *name, uint32_t len) {
-  if (len == 0) return 0;
-  const uint32_t first = static_cast<uint8_t>(name[0]);
-  const uint32_t last = static_cast<uint8_t>(name[len - 1]);
-  return static_cast<uint16_t>((len << 8) ^ (first << 4) ^ last);
+static uint16_t mark_of(uint32_t len) {
+  return len < kLongName ? static_cast<uint16_t>(len) : kLongName;
 }
 
-void set_name(JSON_Value *member, char *name, uint32_t len) {
+void set_name(JSON_Value *member, char *name, uint32_t len, bool plain) {
   member->name = name;
-  member->name_mark = mark_of(name, len);
+  member->name_mark = mark_of(len);
+  member->flags &= static_cast<uint8_t>(~kPlainName);
+  if (plain) member->flags |= kPlainName;
 }
 
 JSON_Value *find_member(const JSON_Value *object, const char *name, uint32_t len,
                         JSON_Value **last) {
-  const uint16_t mark = mark_of(name, len);
+  const uint16_t mark = mark_of(len);
   *last = nullptr;
   JSON_Value *at = object->first;
   for (uint32_t i = 0; i < object->count; ++i, at = at->next) {
@@ -229,9 +229,9 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index) {
 // ---- Edits
 
 // RFC 3629: no overlong forms, no surrogates, nothing above U+10FFFF.
-bool json_is_utf8(const char *text) {
+static bool is_utf8(const char *text, size_t len) {
   const auto *at = reinterpret_cast<const uint8_t *>(text);
-  const uint8_t *end = at + strlen(text);
+  const uint8_t *end = at + len;
   while (at != end) {
     if (end - at >= 8 && all_ascii(load_eight(reinterpret_cast<const char *>(at)))) {
       at += 8;
@@ -252,24 +252,59 @@ bool json_is_utf8(const char *text) {
   return true;
 }
 
+bool json_is_utf8(const char *text) {
+  return is_utf8(text, strlen(text));
+}
+
+namespace {
+
+// What is to be known of a text before it becomes one of a document.
+struct text_form {
+  size_t len;
+  bool plain;  // of ASCII, and written as it stands
+  bool utf8;
+};
+
+}  // namespace
+
+// Most texts are base64, and plain to their end.
+static text_form form_of(const char *text) {
+  const size_t len = strlen(text);
+  size_t at = 0;
+  while (len - at >= 8) {
+    const uint64_t eight = load_eight(text + at);
+    if (!all_ascii(eight) || not_plain(eight) != 0) break;
+    at += 8;
+  }
+  while (at != len && static_cast<uint8_t>(text[at]) < 0x80 && !is_special(text[at]) &&
+         text[at] != '/') {
+    ++at;
+  }
+  return {len, at == len, at == len || is_utf8(text + at, len - at)};
+}
+
+static void set_text(JSON_Value *value, char *text, const text_form &form) {
+  value->text = text;
+  value->count = static_cast<uint32_t>(form.len);
+  if (form.plain) value->flags |= kPlainText;
+}
+
 // A value in a block of its own, together with its name and its text, where it has them.
-static JSON_Value *new_value(json_type type, const char *name, const char *text) {
-  const size_t name_len = name != nullptr ? strlen(name) : 0;
-  const size_t text_len = text != nullptr ? strlen(text) : 0;
+static JSON_Value *new_value(json_type type, const char *name, const char *text,
+                             const text_form &form) {
+  const text_form name_form = name != nullptr ? form_of(name) : text_form{};
   json_extent extent = {1, 0, 0};
-  if (name != nullptr) extent.text_len += uint64_t{name_len} + 1;
-  if (text != nullptr) extent.text_len += uint64_t{text_len} + 1;
+  if (name != nullptr) extent.text_len += uint64_t{name_form.len} + 1;
+  if (text != nullptr) extent.text_len += uint64_t{form.len} + 1;
   json_room room;
   JSON_Value *value = new_block(extent, type, &room);
   if (value == nullptr) return nullptr;
   if (name != nullptr) {
-    const auto len = static_cast<uint32_t>(name_len);
-    set_name(value, new_text(&room, name, len), len);
+    const auto len = static_cast<uint32_t>(name_form.len);
+    set_name(value, new_text(&room, name, len), len, name_form.plain);
   }
-  if (text != nullptr) {
-    value->count = static_cast<uint32_t>(text_len);
-    value->text = new_text(&room, text, value->count);
-  }
+  if (text != nullptr)
+    set_text(value, new_text(&room, text, static_cast<uint32_t>(form.len)), form);
   return value;
 }
 
@@ -328,12 +363,13 @@ JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Va
   if (value->next != nullptr || holds(value, &object->node)) return JSONFailure;
   if (!find_place(object, name, &place)) return JSONFailure;
 
-  const size_t len = strlen(name);
-  if (len >= UINT32_MAX) return JSONFailure;
-  auto *copy = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(len) + 1));
+  const text_form form = form_of(name);
+  if (form.len >= UINT32_MAX) return JSONFailure;
+  const auto len = static_cast<uint32_t>(form.len);
+  auto *copy = reinterpret_cast<char *>(allocate_bytes(len + 1));
   if (copy == nullptr) return JSONFailure;
   memcpy(copy, name, len);
-  set_name(value, copy, static_cast<uint32_t>(len));
+  set_name(value, copy, len, form.plain);
   value->flags |= kOwnsName;
   put_member(object, place, value);
   return JSONSuccess;
@@ -341,10 +377,25 @@ JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Va
 
 JSON_Status json_object_set_string(JSON_Object *object, const char *name, const char *string) {
   if (object == nullptr || name == nullptr || string == nullptr) return JSONFailure;
+  const text_form form = form_of(string);
   member_place place;
-  if (!json_is_utf8(string) || !find_place(object, name, &place)) return JSONFailure;
-  JSON_Value *member = new_value(kJsonString, name, string);
+  if (!form.utf8 || !find_place(object, name, &place)) return JSONFailure;
+  JSON_Value *member = new_value(kJsonString, name, string, form);
   if (member == nullptr) return JSONFailure;
+  put_member(object, place, member);
+  return JSONSuccess;
+}
+
+JSON_Status json_object_take_string(JSON_Object *object, const char *name, tee_ptr<char> *string) {
+  if (object == nullptr || name == nullptr || !*string) return JSONFailure;
+  const text_form form = form_of(string->get());
+  member_place place;
+  if (!form.utf8 || form.len >= UINT32_MAX) return JSONFailure;
+  if (!find_place(object, name, &place)) return JSONFailure;
+  JSON_Value *member = new_value(kJsonString, name, nullptr, {});
+  if (member == nullptr) return JSONFailure;
+  set_text(member, string->release(), form);
+  member->flags |= kOwnsText;
   put_member(object, place, member);
   return JSONSuccess;
 }
@@ -353,7 +404,7 @@ JSON_Status json_object_set_number(JSON_Object *object, const char *name, double
   if (object == nullptr || name == nullptr || number - number != 0) return JSONFailure;
   member_place place;
   if (!find_place(object, name, &place)) return JSONFailure;
-  JSON_Value *member = new_value(kJsonNumber, name, nullptr);
+  JSON_Value *member = new_value(kJsonNumber, name, nullptr, {});
   if (member == nullptr) return JSONFailure;
   member->number = number;
   put_member(object, place, member);
@@ -375,8 +426,9 @@ JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value) {
 JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
   if (array == nullptr || string == nullptr || array->node.count == kMaxElements)
     return JSONFailure;
-  if (!json_is_utf8(string)) return JSONFailure;
-  JSON_Value *value = new_value(kJsonString, nullptr, string);
+  const text_form form = form_of(string);
+  if (!form.utf8) return JSONFailure;
+  JSON_Value *value = new_value(kJsonString, nullptr, string, form);
   if (value == nullptr) return JSONFailure;
   append(array, value);
   return JSONSuccess;

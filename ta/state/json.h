@@ -82,8 +82,10 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
 [[nodiscard]] JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value);
 [[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
 
-/// The same for a value that has an owner, which holds it no longer after a success.
+/// The same for a value, or a text, that has an owner, which holds it no longer after a success.
 [[nodiscard]] JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value);
+[[nodiscard]] JSON_Status json_object_take_string(JSON_Object *object, const char *name,
+                                                  tee_ptr<char> *string);
 [[nodiscard]] JSON_Status json_array_take(JSON_Array *array, json_ptr *value);
 
 /// Frees an element; the array's last one moves there.

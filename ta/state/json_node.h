@@ -19,6 +19,7 @@
 constexpr uint32_t kMaxDepth = 19;  // containers around a parsed value
 constexpr uint32_t kMaxMembers = 960;
 constexpr uint32_t kMaxElements = 122880;
+constexpr uint16_t kLongName = UINT16_MAX;
 
 enum json_type : uint8_t {
   kJsonNull,
@@ -36,6 +37,8 @@ enum json_flag : uint8_t {
   kBeginsBlock = 2,
   kOwnsName = 4,  // the name, or the text, is an allocation of its own
   kOwnsText = 8,
+  kPlainName = 16,  // is written as it stands
+  kPlainText = 32,
 };
 
 struct JSON_Value {
@@ -47,7 +50,7 @@ struct JSON_Value {
     JSON_Value *first;
   };
   uint32_t count;      // children, of a verbatim array too, or bytes of the text
-  uint16_t name_mark;  // names with different marks differ
+  uint16_t name_mark;  // length of the name, at most kLongName
   json_type type;
   uint8_t flags;
 };
@@ -105,7 +108,13 @@ inline char *new_text(json_room *room, const char *text, uint32_t len) {
 
 // ---- Trees
 
-void set_name(JSON_Value *member, char *name, uint32_t len);
+/// `plain`: whether the name is known to be written as it stands.
+void set_name(JSON_Value *member, char *name, uint32_t len, bool plain);
+
+inline uint32_t name_len(const JSON_Value *member) {
+  if (member->name_mark != kLongName) return member->name_mark;
+  return static_cast<uint32_t>(strlen(member->name));
+}
 
 /// `*last` receives the member before the one that is found, or else the object's last member; NULL
 /// when that is none.
@@ -135,14 +144,15 @@ inline void append_child(JSON_Value *parent, JSON_Value *last, JSON_Value *child
 
 // ---- Characters
 //
-// Texts are looked through eight characters at a time. Each has a byte of a number, in whatever
-// order, and the high bit of that byte is free for an answer.
+// Texts are looked through eight characters at a time. Each has a byte of a number, the first one
+// the lowest, and the high bit of that byte is free for an answer.
 
 constexpr uint64_t kHighBits = 0x8080808080808080;
 
 inline uint64_t load_eight(const char *at) {
   uint64_t eight;
   memcpy(&eight, at, sizeof eight);
+  if constexpr (__BYTE_ORDER__ == __ORDER_BIG_ENDIAN__) eight = __builtin_bswap64(eight);
   return eight;
 }
 
@@ -155,7 +165,8 @@ inline bool all_ascii(uint64_t eight) {
 }
 
 /// Candidates: the high bits of the characters that are less than `limit`, which is one of ASCII. A
-/// subtraction borrows from the byte above, so there may be more, but never without a true one.
+/// subtraction borrows from the byte above, so there may be more, but the first one is true. So may
+/// be the bits of characters beyond ASCII, which are none.
 inline uint64_t less_than(uint64_t eight, uint8_t limit) {
   return eight - eight_times(limit);
 }
@@ -165,18 +176,29 @@ inline uint64_t same_as(uint64_t eight, char c) {
   return less_than(eight ^ eight_times(static_cast<uint8_t>(c)), 1);
 }
 
-/// Whether there is one among the candidates; a character beyond ASCII is none.
-inline bool any_of(uint64_t eight, uint64_t candidates) {
-  return (candidates & ~eight & kHighBits) != 0;
-}
-
-/// Whether any is a control character, a quote or a backslash.
-inline bool any_special(uint64_t eight) {
-  return any_of(eight, less_than(eight, 0x20) | same_as(eight, '"') | same_as(eight, '\\'));
+/// Special: control characters, quotes and backslashes.
+inline uint64_t special(uint64_t eight) {
+  const uint64_t candidates = less_than(eight, 0x20) | same_as(eight, '"') | same_as(eight, '\\');
+  return candidates & ~eight & kHighBits;
 }
 
 inline bool is_special(char c) {
   return static_cast<uint8_t>(c) < 0x20 || c == '"' || c == '\\';
+}
+
+/// Not plain: what is not written as it stands, and control characters.
+inline uint64_t not_plain(uint64_t eight) {
+  return special(eight) | (same_as(eight, '/') & ~eight & kHighBits);
+}
+
+/// The first special character of a text that ends at `end` with a NUL.
+inline const char *find_special(const char *at, const char *end) {
+  for (; end - at >= 8; at += 8) {
+    const uint64_t found = special(load_eight(at));
+    if (found != 0) return at + __builtin_ctzll(found) / 8;
+  }
+  while (!is_special(*at)) ++at;
+  return at;
 }
 
 #endif

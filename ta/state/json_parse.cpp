@@ -20,6 +20,7 @@ struct json_measure {
 struct decoded_string {
   char *text;  // in the block, or `own`
   uint32_t len;
+  bool plain;  // is written as it stands
   secret_text own;
 };
 
@@ -43,8 +44,7 @@ static const char *skip_space(const char *at) {
 static const char *measure_string(const char *at, const char *end, json_extent *extent) {
   for (;;) {
     const char *start = at;
-    while (end - at >= 8 && !any_special(load_eight(at))) at += 8;
-    while (!is_special(*at)) ++at;
+    at = find_special(at, end);
     extent->text_len += static_cast<uint64_t>(at - start) + 1;
     if (*at == '"') return at + 1;
     if (*at != '\\' || at[1] == 0) return nullptr;
@@ -168,15 +168,11 @@ static bool take_escape(parser *in, char **to) {
 }
 
 static char *take_plain(parser *in, char *to) {
-  const char *at = in->at;
-  for (; in->end - at >= 8; at += 8, to += 8) {
-    const uint64_t word = load_eight(at);
-    if (any_special(word)) break;
-    memcpy(to, &word, sizeof word);
-  }
-  while (!is_special(*at)) *to++ = *at++;
-  in->at = at;
-  return to;
+  const char *end = find_special(in->at, in->end);
+  const auto len = static_cast<size_t>(end - in->at);
+  memcpy(to, in->at, len);
+  in->at = end;
+  return to + len;
 }
 
 // Decodes a string, from behind its opening quote, into the block. One that shrinks to half of its
@@ -195,6 +191,7 @@ static bool process_string(parser *in, decoded_string *string) {
   string->text = text;
   // An escaped NUL ends the text.
   string->len = static_cast<uint32_t>(has_escapes ? strlen(text) : static_cast<size_t>(to - text));
+  string->plain = !has_escapes && memchr(text, '/', string->len) == nullptr;
 
   const auto initial_size = static_cast<uint64_t>(in->at++ - raw) + 1;
   const uint32_t final_size = string->len + 1;
@@ -299,6 +296,7 @@ static bool take_string(parser *in, JSON_Value *value) {
   if (!process_string(in, &string)) return false;
   value->text = string.text;
   value->count = string.len;
+  if (string.plain) value->flags |= kPlainText;
   if (string.own.release() != nullptr) value->flags |= kOwnsText;
   return true;
 }
@@ -345,7 +343,7 @@ static JSON_Value *add_member(parser *in, JSON_Value *object) {
   json_type type;
   if (!type_at(*in->at, &type)) return nullptr;
   JSON_Value *member = new_node(&in->room, type);
-  set_name(member, name.text, name.len);
+  set_name(member, name.text, name.len, name.plain);
   if (name.own.release() != nullptr) member->flags |= kOwnsName;
   append_child(object, last, member);
   return member;

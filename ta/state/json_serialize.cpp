@@ -45,14 +45,10 @@ static char escape_letter(char c) {
   return kEscapes.letters[static_cast<uint8_t>(c)];
 }
 
-static inline bool may_need_escapes(uint64_t eight) {
-  return any_special(eight) || any_of(eight, same_as(eight, '/'));
-}
-
 void text_counter::put_escaped(const char *text, uint32_t text_len) {
   len += text_len;
   for (uint32_t i = 0; i < text_len;) {
-    if (text_len - i >= 8 && !may_need_escapes(load_eight(text + i))) {
+    if (text_len - i >= 8 && not_plain(load_eight(text + i)) == 0) {
       i += 8;
       continue;
     }
@@ -67,7 +63,7 @@ void text_writer::put_escaped(const char *text, uint32_t text_len) {
     const uint32_t left = text_len - i;
     if (left >= 8) {
       const uint64_t word = load_eight(text + i);
-      if (!may_need_escapes(word)) {
+      if (not_plain(word) == 0) {
         memcpy(at, &word, sizeof word);
         at += sizeof word;
         i += 8;
@@ -228,9 +224,13 @@ void text_writer::put_number(double value) {
 // ---- Documents
 
 template <class Sink>
-static void put_string(Sink *out, const char *text, uint32_t len) {
+static void put_string(Sink *out, const char *text, uint32_t len, bool plain) {
   out->put('"');
-  out->put_escaped(text, len);
+  if (plain) {
+    out->put_run(text, len);
+  } else {
+    out->put_escaped(text, len);
+  }
   out->put('"');
 }
 
@@ -247,7 +247,7 @@ static void put_value(Sink *out, const JSON_Value *value) {
     case kJsonNumber:
       return out->put_number(value->number);
     case kJsonString:
-      return put_string(out, value->text, value->count);
+      return put_string(out, value->text, value->count, (value->flags & kPlainText) != 0);
     case kJsonVerbatim:
       return out->put_run(value->text, static_cast<uint32_t>(strlen(value->text)));
     case kJsonArray:
@@ -279,9 +279,9 @@ struct line_layout {
 }  // namespace
 
 template <class Sink>
-static void put_name(Sink *out, const char *name, const line_layout &layout) {
-  if (name == nullptr) return;
-  put_string(out, name, static_cast<uint32_t>(strlen(name)));
+static void put_name(Sink *out, const JSON_Value *member, const line_layout &layout) {
+  if (member->name == nullptr) return;
+  put_string(out, member->name, name_len(member), (member->flags & kPlainName) != 0);
   out->put(':');
   if (layout.pretty) out->put(' ');
 }
@@ -306,7 +306,7 @@ static void put_document(Sink *out, const JSON_Value *root, bool pretty) {
       out->put(',');
     }
     layout.new_line(out);
-    put_name(out, at->name, layout);
+    put_name(out, at, layout);
     put_value(out, at);
   }
 }
