@@ -7,6 +7,8 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <numeric>
+#include <random>
 
 namespace bench {
 namespace {
@@ -73,18 +75,24 @@ void count(const std::vector<Contestant> &contestants, const std::vector<double>
   }
 }
 
+// What one leaves in the caches, and what is arranged before the first turn, meets each of the
+// others as often as any.
+std::vector<size_t> order_of(size_t round, size_t num_contestants) {
+  std::vector<size_t> order(num_contestants);
+  std::iota(order.begin(), order.end(), 0);
+  std::ranges::shuffle(order, std::mt19937_64(round));
+  return order;
+}
+
 void run_round(benchmark::State &state, const Comparison &comparison, size_t round, Gauge gauge) {
   const std::vector<Contestant> &contestants = comparison.contestants;
   const benchmark::IterationCount num_runs = state.max_iterations;
   std::vector<double> amounts(contestants.size());
   while (state.KeepRunningBatch(num_runs)) {
-    // Each comes first as often as the others: what one leaves in the caches, or what comes before
-    // the runs, meets all of them.
     for (const Contestant &contestant : contestants) {
       if (contestant.before) contestant.before();
     }
-    for (size_t turn = 0; turn < contestants.size(); ++turn) {
-      const size_t i = (turn + round) % contestants.size();
+    for (const size_t i : order_of(round, contestants.size())) {
       amounts[i] = measure(contestants[i], num_runs, gauge);
       state.SetIterationTime(amounts[i] * static_cast<double>(num_runs));
     }
