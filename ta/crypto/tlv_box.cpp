@@ -15,7 +15,7 @@ static void destroy_bytes(uint8_t *bytes, uint32_t len) {
 
 static void destroy_item(void *value) {
   auto *item = static_cast<tlv_item *>(value);
-  destroy_bytes(item->value, item->len);
+  if (item->owns_value) destroy_bytes(item->value, item->len);
   TEE_Free(item);
 }
 
@@ -35,27 +35,39 @@ void tlv_box_destroy(tlv_box *box) {
   TEE_Free(box);
 }
 
+static int new_item(uint16_t type, uint32_t len, item_ptr *item,
+                    const char *as = __builtin_FUNCTION()) {
+  item->reset(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
+  CHECK_AS(as, *item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
+           static_cast<unsigned>(sizeof(tlv_item)));
+  (*item)->type = type;
+  (*item)->len = static_cast<uint16_t>(len);
+  return 0;
+}
+
+static int add_item(tlv_box *box, item_ptr *item) {
+  // All types at their full length would be more than a length can say.
+  const uint32_t record_len = kRecordHeaderLen + (*item)->len;
+  if (record_len > UINT32_MAX - box->serialized_len) return TLV_ERROR;
+  const int added = key_list_add(box->items, (*item)->type, item->get());
+  if (added != 0) return added;
+  (void)item->release();
+  box->serialized_len += record_len;
+  return 0;
+}
+
 int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t len) {
   if (box->serialized != nullptr) return TLV_SERIALIZED;
   if (len > UINT16_MAX || (value == nullptr && len != 0)) return TLV_ERROR;
-  item_ptr item(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
-  CHECK(item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
-        static_cast<unsigned>(sizeof(tlv_item)));
-  item->type = type;
-  item->len = static_cast<uint16_t>(len);
+  item_ptr item;
+  const int made = new_item(type, len, &item);
+  if (made != 0) return made;
   item->value = allocate_bytes(len);
   CHECK(item->value != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
         static_cast<int>(len));
+  item->owns_value = true;
   if (len != 0) memcpy(item->value, value, len);
-
-  // All types at their full length would be more than a length can say.
-  const uint32_t record_len = kRecordHeaderLen + len;
-  if (record_len > UINT32_MAX - box->serialized_len) return TLV_ERROR;
-  const int added = key_list_add(box->items, type, item.get());
-  if (added != 0) return added;
-  (void)item.release();
-  box->serialized_len += record_len;
-  return 0;
+  return add_item(box, &item);
 }
 
 int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value) {
@@ -92,13 +104,17 @@ uint32_t tlv_box_get_size(const tlv_box *box) {
   return box->serialized_len;
 }
 
+// Its value stays where it is.
 static bool take_record(reader *in, tlv_box *box) {
   uint16_t type = 0;
   uint16_t len = 0;
-  const uint8_t *value = nullptr;
   if (!take_u16(in, &type) || !take_u16(in, &len)) return false;
+  const uint8_t *value = in->at;
   if (len != 0 && !take(in, len, &value)) return false;
-  return tlv_box_putobject(box, type, value, len) == 0;
+  item_ptr item;
+  if (new_item(type, len, &item, "tlv_box_putobject") != 0) return false;
+  item->value = const_cast<uint8_t *>(value);
+  return add_item(box, &item) == 0;
 }
 
 tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len) {

@@ -27,6 +27,7 @@ enum tlv_result : int {
 struct tlv_item {
   uint16_t type;
   uint16_t len;
+  bool owns_value;  // else it lies in the serialized box
   uint8_t *value;
 };
 
