@@ -35,9 +35,14 @@ JSON_Value *new_node(json_room *room, json_type type) {
   return node;
 }
 
+static void release_text(char *text, uint32_t len) {
+  wipe(text, len);
+  TEE_Free(text);
+}
+
 static void release_node(JSON_Value *node) {
-  if ((node->flags & kOwnsName) != 0) wipe_and_free_text(node->name);
-  if ((node->flags & kOwnsText) != 0) wipe_and_free_text(node->text);
+  if ((node->flags & kOwnsName) != 0) release_text(node->name, name_len(node));
+  if ((node->flags & kOwnsText) != 0) release_text(node->text, node->count);
   if ((node->flags & kBeginsBlock) == 0) return;
   auto *block = reinterpret_cast<block_header *>(node) - 1;
   wipe(block, block->len);
