@@ -14,7 +14,7 @@ namespace tee {
 namespace {
 constexpr uint32_t kAlignment = 16;
 constexpr uint32_t kHeaderLen = 16;
-constexpr size_t kFirstSlots = 256;
+constexpr size_t kFirstSlots = 64;
 }  // namespace
 
 Heap::~Heap() {
