@@ -86,6 +86,7 @@ void Database::make_tables() {
                      ", or a new store, in which the devices are enrolled anew");
   }
   for (const char *statement : kSchema) session << statement;
+  session << kEventsTable << (is_sqlite_ ? kInOrderOfKey : "");
   session << "COMMIT";
 }
 

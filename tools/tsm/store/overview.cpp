@@ -112,8 +112,8 @@ uint64_t Store::count_open(int64_t now) {
   return database_->with([&](Connection &connection) {
     long long num = 0;
     long long after = now;
-    connection.sql << "SELECT COUNT(*) FROM devices WHERE deadline > 0 AND deadline > :now",
-        use(after, "now"), into(num);
+    connection.sql << "SELECT COUNT(*) FROM devices WHERE deadline > :now", use(after, "now"),
+        into(num);
     return static_cast<uint64_t>(num);
   });
 }
