@@ -105,7 +105,7 @@ struct Device {
       domains = kept;
       response.error_code = code;
     } else {
-      response.dsi_text = serialize_as_device(state());
+      response.content = state();
     }
     return response;
   }

@@ -125,8 +125,8 @@ void learn(const Order &order, const Response &response, const std::string &refu
     progress->unanswered.erase(order.options.taid);
     const std::string *version = find_string(response.members, "ta_version");
     progress->versions[order.options.taid] = version == nullptr ? "" : *version;
-  } else if (response.dsi_text) {
-    take_state(*parse_json(*response.dsi_text), progress);
+  } else if (const Json *dsi = find_object(response.content, "dsi")) {
+    take_state({{"dsi", *dsi}}, progress);
   }
 }
 

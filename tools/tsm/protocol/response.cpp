@@ -57,19 +57,19 @@ void decrypt_member(std::string_view name, const ResponseKeys &keys, Response *r
   if (jwe == nullptr) reject("it has no \"" + std::string(name) + "\"");
   response->content_text = jwe_decrypt(keys.tsm_key, *jwe);
   if (!response->content_text) reject("its content does not decrypt with this TSM's key");
-  const std::optional<Json> content = parse_json(*response->content_text);
+  std::optional<Json> content = parse_json(*response->content_text);
   if (!content || !content->is_object()) reject("its content is not a JSON object");
-  response->content = *content;
+  response->content = std::move(*content);
 }
 
 /// An "edsi" is the document itself; a content holds the document's one member.
 void take_dsi(Response *response) {
   const Json *dsi = find_object(response->content, "dsi");
   if (dsi == nullptr) reject("its content has no device state");
-  const Json document = {{"dsi", *dsi}};
-  if (!is_dsi_document(document)) reject("its device state has no lists of SDs and AIKs");
+  if (!is_dsi_document(response->content)) reject("its device state has no lists of SDs and AIKs");
   const bool is_whole_document = response->message->id == MessageId::kGetDeviceState;
-  response->dsi_text = is_whole_document ? *response->content_text : serialize_as_device(document);
+  response->dsi_text =
+      is_whole_document ? *response->content_text : "{\"dsi\":" + serialize_as_device(*dsi) + "}";
 }
 
 void take_reason(Response *response) {
@@ -110,14 +110,17 @@ bool signature_verifies(const Envelope &envelope, const RsaKey &key) {
 }
 
 Response open_response(std::string_view text, const ResponseKeys &keys) {
-  const Envelope envelope = parse_envelope(text);
+  return open_response(parse_envelope(text), keys);
+}
+
+Response open_response(Envelope envelope, const ResponseKeys &keys) {
   if (!signature_verifies(envelope, key_for(envelope, keys))) {
     reject("its signature is not that of the device's key");
   }
 
   Response response = {.message = envelope.message,
-                       .payload_text = envelope.payload_text,
-                       .header = envelope.header,
+                       .payload_text = std::move(envelope.payload_text),
+                       .header = std::move(envelope.header),
                        .members = members_of(*envelope.message, envelope.payload)};
   if (response.message->id == MessageId::kGetTaInfo) return response;
   if (response.message->id == MessageId::kGetDeviceState) {

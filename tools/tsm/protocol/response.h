@@ -57,6 +57,7 @@ struct Response {
 
 /// Throws tools::UsageError when a GetTAInfo response comes without a state to verify it with.
 Response open_response(std::string_view text, const ResponseKeys &keys);
+Response open_response(Envelope envelope, const ResponseKeys &keys);
 
 /// Why a verified response is a refusal, with its code; empty when it is none.
 std::string refusal_of(const Response &response);

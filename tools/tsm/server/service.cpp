@@ -47,11 +47,11 @@ Service::Service(const Identity &tsm, Store *store, std::chrono::seconds time_to
 http::Answer Service::post(const std::string &device_id, const std::string &body) {
   const auto start = std::chrono::steady_clock::now();
   try {
-    const DoorAnswer told = door_.post(device_id, body);
+    DoorAnswer told = door_.post(device_id, body);
     metrics_.count_exchange(told, std::chrono::steady_clock::now() - start);
     http::Answer answer = {.status = told.status};
     if (told.status == 200) {
-      answer = http::text_answer(200, kOtrpJson, told.text);
+      answer = http::text_answer(200, kOtrpJson, std::move(told.text));
     } else if (told.status != 204) {
       answer = http::failure(told.status, told.text);
     }

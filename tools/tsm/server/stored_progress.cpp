@@ -44,27 +44,25 @@ Progress stored_progress(const StoredDevice &row) {
       if (number.is_number_integer()) progress.attempts[key] = number.get<int>();
     }
   }
-  if (is_true(*session, "knows_state")) progress.state = parse_json(row.state);
   return progress;
 }
 
 std::string progress_text(const Progress &progress) {
   return Json{{"lasting", progress_json(progress)},
               {"session",
-               {{"knows_state", progress.state.has_value()},
-                {"has_changed", progress.has_changed},
+               {{"has_changed", progress.has_changed},
                 {"attempts", progress.attempts},
                 {"last_refusal", progress.last_refusal}}}}
       .dump();
 }
 
-std::string open_request_text(const OpenRequest &request) {
-  Json order = {{"renew_aik", request.order.options.renew_aik}};
+std::string open_request_text(const Order &order, const SentRequest &sent) {
+  Json value = {{"renew_aik", order.options.renew_aik}};
   for (const auto &[name, member] : kOrderTexts) {
-    const std::string &text = request.order.options.*member;
-    if (!text.empty()) order[name] = text;
+    const std::string &text = order.options.*member;
+    if (!text.empty()) value[name] = text;
   }
-  return Json{{"sent", sent_request_json(request.sent)}, {"order", order}}.dump();
+  return Json{{"sent", sent_request_json(sent)}, {"order", std::move(value)}}.dump();
 }
 
 OpenRequest parse_open_request(const std::string &text) {

@@ -17,10 +17,9 @@ namespace tsm {
 /// Throws std::runtime_error for a damaged key.
 DeviceInfo stored_device_info(const StoredDevice &row);
 
-/// A row whose progress cannot be read is one without: the device is asked anew.
+/// All but the state, which few exchanges need. A row whose progress cannot be read is one without:
+/// the device is asked anew.
 Progress stored_progress(const StoredDevice &row);
-
-/// All but the state, of which it only says whether it is the device's present one.
 std::string progress_text(const Progress &progress);
 
 /// A message that waits: what was ordered, and what ties its answer. The image is not kept.
@@ -28,7 +27,7 @@ struct OpenRequest {
   Order order;
   SentRequest sent;
 };
-std::string open_request_text(const OpenRequest &request);
+std::string open_request_text(const Order &order, const SentRequest &sent);
 OpenRequest parse_open_request(const std::string &text);  // throws std::runtime_error
 
 }  // namespace tsm

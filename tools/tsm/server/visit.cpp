@@ -29,6 +29,14 @@ SentRequest sent_request(const Order &order) {
   return sent;
 }
 
+Envelope envelope_of(const std::string &body) {
+  try {
+    return parse_envelope(body);
+  } catch (const NotVerified &error) {
+    throw Refusal(400, "malformed", error.what());
+  }
+}
+
 }  // namespace
 
 Visit::Visit(const Identity &tsm, StoredDevice row, int64_t now)
@@ -53,18 +61,12 @@ const DeviceInfo &Visit::device() {
   return *device_;
 }
 
-Response Visit::verified(const std::string &body) {
-  std::optional<Json> state;
-  if (!progress_.state) state = parse_json(row_.state);
-  const Json *dsi = progress_.state ? &*progress_.state : state ? &*state : nullptr;
+Response Visit::verified(Envelope envelope) {
+  const Json *dsi = progress_.state ? &*progress_.state : nullptr;
   try {
-    return open_response(body, {.tee_key = device().tee_key, .tsm_key = tsm_.key, .dsi = dsi});
+    return open_response(std::move(envelope),
+                         {.tee_key = device().tee_key, .tsm_key = tsm_.key, .dsi = dsi});
   } catch (const NotVerified &error) {
-    try {
-      (void)parse_envelope(body);
-    } catch (const NotVerified &) {
-      throw Refusal(400, "malformed", error.what());
-    }
     throw Refusal(403, "stranger", error.what());
   } catch (const tools::UsageError &error) {
     throw Refusal(403, "stranger", error.what());
@@ -79,7 +81,10 @@ void Visit::hear(const std::string &body) {
     throw Refusal(409, "late", "the message waits no longer: expected an empty POST");
   }
   const OpenRequest open = parse_open_request(row_.open_request);
-  const Response response = verified(body);
+  Envelope envelope = envelope_of(body);
+  // To verify it with, and to go on with: all other answers bring a state, or leave it unknown.
+  if (envelope.message->id == MessageId::kGetTaInfo) progress_.state = parse_json(row_.state);
+  const Response response = verified(std::move(envelope));
   if (!tie_of(response, open.sent)) {
     throw Refusal(409, "other",
                   "the response does not answer the message that waits (" + row_.open_message +
@@ -141,9 +146,10 @@ std::string Visit::send(Order order) {
   options.tid = random_id();
   const Json *state = progress_.state ? &*progress_.state : nullptr;
   if (quotes_dsi(order.message)) options.dsihash = dsi_hash(*state);
-  std::string text = make_request(order.message, options, tsm_, device(), state);
+  std::string waiting = open_request_text(order, sent_request(order));
+  std::string text = make_request(order.message, std::move(options), tsm_, device(), state);
   row_.open_message = message_of(order.message).command;
-  row_.open_request = open_request_text({.order = order, .sent = sent_request(order)});
+  row_.open_request = std::move(waiting);
   return text;
 }
 

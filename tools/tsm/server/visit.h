@@ -58,7 +58,7 @@ class Visit {
  private:
   /// Read once: what its key needs to be used is kept with it.
   const DeviceInfo &device();
-  Response verified(const std::string &body);
+  Response verified(Envelope envelope);
   void set_outcome(const char *outcome, const std::string &reason);
   std::string follow(Decision decision);
   std::string try_to_send(Order order, const std::string &reason);
