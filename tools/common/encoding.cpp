@@ -5,6 +5,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 namespace tools {
 namespace {
@@ -29,6 +30,16 @@ constexpr Digits digits_of(std::string_view alphabet) {
 constexpr Digits kBase64Digits = digits_of(kBase64);
 constexpr Digits kBase64UrlDigits = digits_of(kBase64Url);
 
+/// Two digits for each number of twelve bits, found with one look.
+using DigitPairs = std::array<std::array<char, 2>, 1 << 12>;
+constexpr DigitPairs pairs_of(std::string_view alphabet) {
+  DigitPairs pairs{};
+  for (size_t i = 0; i < pairs.size(); ++i) pairs[i] = {alphabet[i >> 6], alphabet[i & 0x3F]};
+  return pairs;
+}
+constexpr DigitPairs kBase64Pairs = pairs_of(kBase64);
+constexpr DigitPairs kBase64UrlPairs = pairs_of(kBase64Url);
+
 /// Up to three bytes, as one number.
 uint32_t number_of(std::string_view bytes) {
   uint32_t bits = 0;
@@ -38,18 +49,19 @@ uint32_t number_of(std::string_view bytes) {
   return bits;
 }
 
-void put_digits(uint32_t bits, std::string_view alphabet, char *out) {
-  for (int i = 0; i < 4; ++i) out[i] = alphabet[bits >> (18 - 6 * i) & 0x3F];
+void put_digits(uint32_t bits, const DigitPairs &pairs, char *out) {
+  memcpy(out, pairs[bits >> 12].data(), 2);
+  memcpy(out + 2, pairs[bits & 0xFFF].data(), 2);
 }
 
-std::string encode(std::string_view bytes, std::string_view alphabet) {
+std::string encode(std::string_view bytes, const DigitPairs &pairs) {
   std::string text((bytes.size() + 2) / 3 * 4, '\0');
   char *out = text.data();
   const size_t whole = bytes.size() / 3 * 3;
   for (size_t at = 0; at < whole; at += 3, out += 4) {
-    put_digits(number_of({bytes.data() + at, 3}), alphabet, out);
+    put_digits(number_of({bytes.data() + at, 3}), pairs, out);
   }
-  if (whole < bytes.size()) put_digits(number_of(bytes.substr(whole)), alphabet, out);
+  if (whole < bytes.size()) put_digits(number_of(bytes.substr(whole)), pairs, out);
   text.resize((bytes.size() * 4 + 2) / 3);
   return text;
 }
@@ -79,13 +91,13 @@ std::optional<Bytes> decode(std::string_view text, const Digits &digits) {
 }  // namespace
 
 std::string base64_encode(std::string_view bytes) {
-  std::string text = encode(bytes, kBase64);
+  std::string text = encode(bytes, kBase64Pairs);
   while (text.size() % 4 != 0) text += '=';
   return text;
 }
 
 std::string base64url_encode(std::string_view bytes) {
-  return encode(bytes, kBase64Url);
+  return encode(bytes, kBase64UrlPairs);
 }
 
 std::optional<Bytes> base64_decode(std::string_view text) {
