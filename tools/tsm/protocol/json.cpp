@@ -2,6 +2,7 @@
 #include "tsm/protocol/json.h"
 
 #include <cmath>
+#include <cstdint>
 #include <cstdio>
 
 template class nlohmann::basic_json<nlohmann::ordered_map>;
@@ -11,23 +12,24 @@ namespace {
 
 constexpr int kMaxDepth = 64;
 
-/// Printable ASCII that needs no escape. All of it is looked at, which goes faster than stopping.
+/// Printable ASCII that needs no escape. All of it is looked at, which goes faster than stopping,
+/// and kept in a byte: so as many are looked at at once as the machine can.
 bool is_plain(std::string_view text) {
-  size_t num_others = 0;
-  for (const char c : text) num_others += c < ' ' || c > '~' || c == '"' || c == '\\' ? 1 : 0;
-  return num_others == 0;
+  uint8_t others = 0;
+  for (const char c : text) others |= c < ' ' || c > '~' || c == '"' || c == '\\' ? 1 : 0;
+  return others == 0;
 }
 
 /// Whether the parser can have the text as it is: without control characters, and without so many
 /// brackets that they could be nested too deep.
 bool needs_no_care(std::string_view text) {
-  size_t num_controls = 0;
-  size_t num_opened = 0;
+  uint8_t controls = 0;
+  uint32_t num_opened = 0;
   for (const char c : text) {
-    num_controls += static_cast<unsigned char>(c) < ' ' ? 1 : 0;
+    controls |= static_cast<unsigned char>(c) < ' ' ? 1 : 0;
     num_opened += c == '{' || c == '[' ? 1 : 0;
   }
-  return num_controls == 0 && num_opened <= kMaxDepth;
+  return controls == 0 && num_opened <= kMaxDepth;
 }
 
 /// The text with the control characters of its strings escaped; nothing when it is nested too deep
