@@ -296,13 +296,19 @@ bool same_secret(std::string_view a, std::string_view b) {
 }
 
 Bytes rs256_sign(const RsaKey &key, std::string_view data) {
+  return rs256_sign(key, {data});
+}
+
+Bytes rs256_sign(const RsaKey &key, std::initializer_list<std::string_view> parts) {
   const DigestContext context(EVP_MD_CTX_new());
   Bytes signature(key.modulus_len(), '\0');
   size_t len = signature.size();
-  require(context != nullptr &&
-              EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, key.get()) == 1 &&
-              EVP_DigestSign(context.get(), out(signature), &len, in(data), data.size()) == 1,
-          "cannot sign");
+  bool ok = context != nullptr &&
+            EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, key.get()) == 1;
+  for (const std::string_view part : parts) {
+    ok = ok && EVP_DigestSignUpdate(context.get(), part.data(), part.size()) == 1;
+  }
+  require(ok && EVP_DigestSignFinal(context.get(), out(signature), &len) == 1, "cannot sign");
   signature.resize(len);
   return signature;
 }

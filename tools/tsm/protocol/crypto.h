@@ -8,6 +8,7 @@
 
 #include <openssl/evp.h>
 
+#include <initializer_list>
 #include <memory>
 #include <optional>
 #include <string>
@@ -65,6 +66,8 @@ bool same_secret(std::string_view a, std::string_view b);
 
 /// RSASSA-PKCS1-v1_5 with SHA-256.
 Bytes rs256_sign(const RsaKey &key, std::string_view data);
+/// The same of parts that stand apart, as if they stood behind each other.
+Bytes rs256_sign(const RsaKey &key, std::initializer_list<std::string_view> parts);
 bool rs256_verify(const RsaKey &key, std::string_view data, std::string_view signature);
 
 /// RSAES-PKCS1-v1_5.

@@ -124,7 +124,7 @@ std::string seal_text(std::string_view payload, std::string_view request_name,
                       std::string_view tsmid, const RsaKey &key, const Json &extra) {
   const std::string protect = base64url_encode(kProtectedHeader);
   std::string payload_text = base64url_encode(payload);
-  const Bytes signature = rs256_sign(key, protect + "." + payload_text);
+  const Bytes signature = rs256_sign(key, {protect, ".", payload_text});
   Json envelope = {{"payload", std::move(payload_text)},
                    {"protect", protect},
                    {"signature", base64url_encode(signature)},

@@ -31,9 +31,7 @@ Json key_chain(std::string_view ca_hash, const std::vector<Json> &entries) {
 
 std::string signature2(const RsaKey &ca, std::string_view tid, std::string_view rid,
                        std::string_view device_id, std::string_view taid, std::string_view tsmid) {
-  std::string signed_text;
-  for (const std::string_view part : {tid, rid, device_id, taid, tsmid}) signed_text += part;
-  return base64url_encode(rs256_sign(ca, signed_text));
+  return base64url_encode(rs256_sign(ca, {tid, rid, device_id, taid, tsmid}));
 }
 
 }  // namespace tsm
