@@ -151,7 +151,7 @@ class Decider {
       order.options.spcert = planned.spcert;
       if (find_domain(planned.sd) == nullptr) return take(std::move(order), "it is missing");
       if (progress_.imagined_aiks.contains(planned.sp)) continue;
-      if (find_aik(*progress_.state, planned.sp)) continue;
+      if (has_aik(*progress_.state, planned.sp)) continue;
       order.message = MessageId::kUpdateSd;
       order.options.renew_aik = true;
       return take(std::move(order), quoted(planned.sp) + " has lost its key");

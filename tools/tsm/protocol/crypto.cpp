@@ -98,6 +98,22 @@ std::optional<std::string_view> take_block(std::string_view *rest) {
   return block;
 }
 
+struct PublicNumbers {
+  std::string_view n;
+  std::string_view e;
+};
+
+std::optional<PublicNumbers> take_apart(std::string_view encoded) {
+  const std::optional<std::string_view> n = take_block(&encoded);
+  const std::optional<std::string_view> e = n ? take_block(&encoded) : std::nullopt;
+  return e && encoded.empty() ? std::optional(PublicNumbers{*n, *e}) : std::nullopt;
+}
+
+bool have_usual_lengths(const PublicNumbers &numbers) {
+  return !numbers.n.empty() && !numbers.e.empty() && numbers.n.size() <= kMaxModulusLen &&
+         numbers.e.size() <= numbers.n.size();
+}
+
 /// A failed decryption or verification is an answer; a failed encryption is not.
 enum class Direction { kDecrypt = 0, kEncrypt = 1 };
 
@@ -200,18 +216,19 @@ std::optional<RsaKey> RsaKey::from_pem(std::string_view pem) {
   return key;
 }
 
+bool RsaKey::is_encoded(std::string_view encoded) {
+  const std::optional<PublicNumbers> numbers = take_apart(encoded);
+  return numbers && have_usual_lengths(*numbers);
+}
+
 std::optional<RsaKey> RsaKey::from_encoded(std::string_view encoded) {
-  std::string_view rest = encoded;
-  const std::optional<std::string_view> n = take_block(&rest);
-  if (!n) return std::nullopt;
-  const std::optional<std::string_view> e = take_block(&rest);
-  if (!e || !rest.empty()) return std::nullopt;
-  return from_numbers(*n, *e);
+  const std::optional<PublicNumbers> numbers = take_apart(encoded);
+  return numbers ? from_numbers(numbers->n, numbers->e) : std::nullopt;
 }
 
 std::optional<RsaKey> RsaKey::from_numbers(std::string_view n, std::string_view e,
                                            std::string_view d) {
-  if (n.empty() || e.empty() || n.size() > kMaxModulusLen || e.size() > n.size()) return nothing();
+  if (!have_usual_lengths({n, e})) return nothing();
   const BigNumber modulus = number_of(n);
   const BigNumber exponent = number_of(e);
   const BigNumber private_exponent = number_of(d);
@@ -224,7 +241,8 @@ std::optional<RsaKey> RsaKey::from_numbers(std::string_view n, std::string_view 
          OSSL_PARAM_BLD_push_BN(builder.get(), OSSL_PKEY_PARAM_RSA_D, private_exponent.get()) == 1;
   }
   const Params params(ok ? OSSL_PARAM_BLD_to_param(builder.get()) : nullptr);
-  const KeyContext context(EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr));
+  // Finding RSA among the algorithms takes as long as all the rest.
+  thread_local const KeyContext context(EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr));
   EVP_PKEY *key = nullptr;
   if (params == nullptr || context == nullptr || EVP_PKEY_fromdata_init(context.get()) != 1 ||
       EVP_PKEY_fromdata(context.get(), &key, d.empty() ? EVP_PKEY_PUBLIC_KEY : EVP_PKEY_KEYPAIR,

@@ -37,6 +37,7 @@ class RsaKey {
   static RsaKey generate(int num_bits = 2048);
   static std::optional<RsaKey> from_pem(std::string_view pem);  // private or public
   static std::optional<RsaKey> from_encoded(std::string_view encoded);
+  static bool is_encoded(std::string_view encoded);  // without making the key
   /// Big-endian numbers; an empty `d` makes a public key.
   static std::optional<RsaKey> from_numbers(std::string_view n, std::string_view e,
                                             std::string_view d = {});

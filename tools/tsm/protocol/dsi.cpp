@@ -38,6 +38,13 @@ std::string text_of(const Json &object, std::string_view name) {
   return text == nullptr ? std::string() : *text;
 }
 
+std::optional<Bytes> find_encoded_aik(const Json &document, std::string_view spid) {
+  for (const Json &entry : aiks(document)) {
+    if (text_of(entry, "spid") == spid) return base64url_decode(text_of(entry, "spaik"));
+  }
+  return std::nullopt;
+}
+
 struct Node {
   std::string text;
   std::vector<Node> children;
@@ -115,12 +122,13 @@ Json parse_dsi(std::string_view text) {
 }
 
 std::optional<RsaKey> find_aik(const Json &document, std::string_view spid) {
-  for (const Json &entry : aiks(document)) {
-    if (text_of(entry, "spid") != spid) continue;
-    const std::optional<Bytes> encoded = base64url_decode(text_of(entry, "spaik"));
-    return encoded ? RsaKey::from_encoded(*encoded) : std::nullopt;
-  }
-  return std::nullopt;
+  const std::optional<Bytes> encoded = find_encoded_aik(document, spid);
+  return encoded ? RsaKey::from_encoded(*encoded) : std::nullopt;
+}
+
+bool has_aik(const Json &document, std::string_view spid) {
+  const std::optional<Bytes> encoded = find_encoded_aik(document, spid);
+  return encoded && RsaKey::is_encoded(*encoded);
 }
 
 std::string dsi_tree(const Json &document) {

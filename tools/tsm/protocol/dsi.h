@@ -42,6 +42,7 @@ std::vector<Domain> domains_of(const Json &document);
 
 /// The AIK of a service provider; nothing when the device lists none, or no RSA key.
 std::optional<RsaKey> find_aik(const Json &document, std::string_view spid);
+bool has_aik(const Json &document, std::string_view spid);  // without making the key
 
 /// The document as a tree of lines: SPs, their AIK fingerprints, security domains, TAs.
 std::string dsi_tree(const Json &document);
