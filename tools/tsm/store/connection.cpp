@@ -10,6 +10,8 @@ using soci::use;
 
 void Connection::prepare() {
   StoredDevice &d = device_;
+  begin_ = std::make_unique<soci::statement>((sql.prepare << "BEGIN"));
+  commit_ = std::make_unique<soci::statement>((sql.prepare << "COMMIT"));
   find_ = std::make_unique<soci::statement>(
       (sql.prepare << "SELECT d.tee_key, d.device_group, COALESCE(g.plan, ''), " TSM_SQL_STANDING
                       ", d.version, d.state, "
@@ -40,6 +42,24 @@ void Connection::prepare() {
   prune_ = std::make_unique<soci::statement>(
       (sql.prepare << "DELETE FROM events WHERE device_id = :device_id AND number <= :number",
        use(event_.device_id, "device_id"), use(number_, "number")));
+}
+
+Connection::Transaction::Transaction(Connection *connection) : connection_(connection) {
+  connection_->begin_->execute(true);
+}
+
+Connection::Transaction::~Transaction() {
+  if (connection_ == nullptr) return;
+  try {
+    connection_->sql.rollback();
+  } catch (const soci::soci_error &) {
+    // The connection is lost, and with it what was begun.
+  }
+}
+
+void Connection::Transaction::commit() {
+  connection_->commit_->execute(true);
+  connection_ = nullptr;
 }
 
 bool Connection::find(const std::string &device_id, StoredDevice *device) {

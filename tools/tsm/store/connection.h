@@ -23,6 +23,19 @@ class Connection {
   /// Once `sql` is open.
   void prepare();
 
+  /// Rolled back unless it comes to its end.
+  class Transaction {
+   public:
+    explicit Transaction(Connection *connection);
+    ~Transaction();
+    Transaction(const Transaction &) = delete;
+    Transaction &operator=(const Transaction &) = delete;
+    void commit();
+
+   private:
+    Connection *connection_;  // NULL: committed
+  };
+
   bool find(const std::string &device_id, StoredDevice *device);
 
   /// Inside a transaction; false when the row has another version by now.
@@ -40,6 +53,8 @@ class Connection {
   long long seen_ = 0;
   long long deadline_ = 0;
   long long time_ = 0;
+  std::unique_ptr<soci::statement> begin_;
+  std::unique_ptr<soci::statement> commit_;
   std::unique_ptr<soci::statement> find_;
   std::unique_ptr<soci::statement> update_;
   std::unique_ptr<soci::statement> insert_;

@@ -71,7 +71,7 @@ bool Store::save(const StoredDevice &device, Event event) {
   event.number = device.version + 1;
   const auto turn = database_->writers_turn();
   return database_->with([&](Connection &connection) {
-    soci::transaction transaction(connection.sql);
+    Connection::Transaction transaction(&connection);
     if (!connection.update(device)) return false;  // rolled back
     connection.insert(event);
     const int64_t last_number = event.number - int64_t{kNumKeptEvents};
