@@ -23,12 +23,12 @@ class Decider {
   Decision decide() {
     Decision blocked = {.obstacles = obstacles()};
     if (!blocked.obstacles.empty()) return blocked;
-    if (auto step = ask_for_owner()) return *step;
+    if (auto step = ask_for_owner()) return std::move(*step);
     blocked.obstacles = foreign_domains();
     if (!blocked.obstacles.empty()) return blocked;
-    if (auto step = delete_others()) return *step;
-    if (auto step = make_domains()) return *step;
-    if (auto step = make_apps()) return *step;
+    if (auto step = delete_others()) return std::move(*step);
+    if (auto step = make_domains()) return std::move(*step);
+    if (auto step = make_apps()) return std::move(*step);
     if (progress_.has_changed) return ask_for_state("to see what was done");
     return {};
   }

@@ -98,9 +98,10 @@ Json encrypted_ta(const RsaKey &aik, std::string_view image, std::string_view im
   const Bytes image_iv = iv ? *iv : random_bytes(kImageIvLen);
   const Bytes ciphertext =
       aes_cbc_encrypt(std::string_view(image_key).substr(kAesKeyLen), image_iv, image);
-  return {{"key", base64url_encode(rsa1_5_encrypt(aik, image_key))},
-          {"iv", base64url_encode(image_iv)},
-          {std::string(image_name), base64url_encode(ciphertext)}};
+  Json value = {{"key", base64url_encode(rsa1_5_encrypt(aik, image_key))},
+                {"iv", base64url_encode(image_iv)}};
+  value[std::string(image_name)] = base64url_encode(ciphertext);  // moved: a list would copy it
+  return value;
 }
 
 Json tbs_request(const Message &message, const RequestOptions &options, Json key_chain,
@@ -125,10 +126,11 @@ std::string seal_text(std::string_view payload, std::string_view request_name,
   const std::string protect = base64url_encode(kProtectedHeader);
   std::string payload_text = base64url_encode(payload);
   const Bytes signature = rs256_sign(key, {protect, ".", payload_text});
-  Json envelope = {{"payload", std::move(payload_text)},
-                   {"protect", protect},
-                   {"signature", base64url_encode(signature)},
-                   {"header", {{"tsmid", tsmid}}}};
+  Json envelope = Json::object();
+  envelope["payload"] = std::move(payload_text);  // which a list would copy
+  envelope["protect"] = protect;
+  envelope["signature"] = base64url_encode(signature);
+  envelope["header"] = {{"tsmid", tsmid}};
   envelope.update(extra);
   Json message = Json::object();
   message[std::string(request_name)] = std::move(envelope);
