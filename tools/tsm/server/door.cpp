@@ -26,7 +26,8 @@ bool is_device_id(std::string_view device_id) {
   const bool is_plain = std::ranges::none_of(
       device_id, [](unsigned char c) { return c < ' ' || c == 0x7F || c == '"' || c == '\\'; });
   if (device_id.empty() || device_id.size() > kMaxDeviceIdLen || !is_plain) return false;
-  return parse_json("\"" + std::string(device_id) + "\"").has_value();
+  const bool is_ascii = std::ranges::none_of(device_id, [](unsigned char c) { return c > 0x7F; });
+  return is_ascii || parse_json("\"" + std::string(device_id) + "\"").has_value();
 }
 
 DoorAnswer Door::post(const std::string &device_id, const std::string &body) {
