@@ -6,9 +6,11 @@
 
 #include <soci/postgresql/soci-postgresql.h>
 #include <soci/soci.h>
+#include <soci/sqlite3/soci-sqlite3.h>
 #include <unistd.h>
 
 #include <cstdlib>
+#include <cstring>
 #include <string>
 
 #include "support/temporary_folder.h"
@@ -28,6 +30,13 @@ class FreshStore {
 
   const std::string &uri() const { return uri_; }
   bool is_shared() const { return uri_.starts_with("postgresql:"); }
+
+  /// Past the store.
+  void execute(const std::string &statement) const {
+    soci::session sql = is_shared() ? soci::session(soci::postgresql, uri_)
+                                    : soci::session(soci::sqlite3, uri_.substr(strlen("sqlite:")));
+    sql << statement;
+  }
 
   /// As if the database was started anew.
   void end_connections() const {

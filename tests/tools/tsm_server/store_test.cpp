@@ -28,6 +28,17 @@ TEST(Store, TheSlowerOfTwoServersWritesNothing) {
   EXPECT_EQ(one.events_of("d1")[0].message, "first");
 }
 
+TEST(Store, WritesRowAndEventOrNeither) {
+  const otrp_test::FreshStore fresh;
+  Store store(fresh.uri());
+  store.enrol({{"d1", "key"}}, "g");
+  const StoredDevice device = store.find_device("d1").value();
+  fresh.execute("ALTER TABLE events RENAME TO elsewhere");
+  EXPECT_THROW(store.save(device, {.message = "m"}), StoreError);
+  fresh.execute("ALTER TABLE elsewhere RENAME TO events");
+  EXPECT_EQ(store.find_device("d1").value().version, device.version);
+}
+
 TEST(Store, NothingIsLostWhereManyWriteAtOnce) {
   const otrp_test::FreshStore fresh;
   Store stores[] = {Store(fresh.uri()), Store(fresh.uri())};
@@ -76,21 +87,6 @@ TEST(Store, APlanIsTheGroupsAndItsImagesAreWhole) {
   EXPECT_EQ(other.find_image("i2"), std::nullopt);
 }
 
-TEST(Store, CountsDevicesAndWhatTheyOwe) {
-  const otrp_test::FreshStore fresh;
-  Store store(fresh.uri());
-  store.enrol({{"d1", "key"}, {"d2", "key"}, {"d3", "key"}}, "g");
-  store.assign({"p1", "one", {}}, "g");
-  StoredDevice device = store.find_device("d1").value();
-  device.outcome = "current";
-  device.outcome_plan = "p1";
-  device.deadline = 100;
-  ASSERT_TRUE(store.save(device, {}));
-  EXPECT_EQ(store.count_open(99), 1u);
-  EXPECT_EQ(store.count_open(100), 0u);
-  EXPECT_EQ(store.count_devices(), (StandingCounts{1, 0, 0, 2, 0}));
-}
-
 TEST(Store, FindsDevicesPageByPageAndByWhereTheyStand) {
   const otrp_test::FreshStore fresh;
   Store store(fresh.uri());
@@ -102,6 +98,7 @@ TEST(Store, FindsDevicesPageByPageAndByWhereTheyStand) {
     device.outcome = outcome;
     device.outcome_plan = plan;
     device.reason = id;
+    device.deadline = 100;
     ASSERT_TRUE(store.save(device, {}));
   };
   stand("a0", "current", "p1");
@@ -124,6 +121,7 @@ TEST(Store, FindsDevicesPageByPageAndByWhereTheyStand) {
   EXPECT_EQ(found({.text = "'", .standing = Standing::kRefused}), "c'3:refused ");
   EXPECT_EQ(found({.text = "g", .standing = Standing::kCurrent}), "a0:current ");
   EXPECT_EQ(store.count_devices(), (StandingCounts{1, 1, 1, 1, 1}));
+  EXPECT_EQ(std::pair(store.count_open(99), store.count_open(100)), std::pair(3ul, 0ul));
 }
 
 TEST(Store, DevicesMoveAndGoWithAllThatIsKnownOfThem) {
@@ -162,13 +160,11 @@ TEST(Store, HistoryIsOneRowAMinuteOfTheLastWeek) {
 
 TEST(Store, OfAnotherVersionIsLeftAsItIs) {
   const otrp_test::FreshStore fresh;
-  const bool is_shared = fresh.is_shared();
-  soci::session sql(is_shared ? "postgresql" : "sqlite3",
-                    is_shared ? fresh.uri() : fresh.uri().substr(strlen("sqlite:")));
-  sql << "CREATE TABLE store_format (only_one INTEGER PRIMARY KEY, format INTEGER NOT NULL)";
-  sql << "INSERT INTO store_format VALUES (1, 1)";
+  fresh.execute(
+      "CREATE TABLE store_format (only_one INTEGER PRIMARY KEY, format INTEGER NOT NULL)");
+  fresh.execute("INSERT INTO store_format VALUES (1, 1)");
   EXPECT_THROW(Store{fresh.uri()}, tools::UsageError);
-  EXPECT_THROW(sql << "SELECT * FROM devices", soci::soci_error);
+  EXPECT_THROW(fresh.execute("SELECT * FROM devices"), soci::soci_error);
 }
 
 TEST(Store, ComesBackWithItsDatabase) {
