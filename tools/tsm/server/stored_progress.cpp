@@ -23,13 +23,6 @@ constexpr std::pair<const char *, std::string RequestOptions::*> kOrderTexts[] =
 
 }  // namespace
 
-DeviceInfo stored_device_info(const StoredDevice &row) {
-  const std::optional<Bytes> encoded = base64url_decode(row.key);
-  const std::optional<RsaKey> key = encoded ? RsaKey::from_encoded(*encoded) : std::nullopt;
-  if (!key) throw std::runtime_error("the stored key of device " + row.device_id + " is damaged");
-  return {row.device_id, *key};
-}
-
 Progress stored_progress(const StoredDevice &row) {
   const std::optional<Json> value = parse_json(row.progress);
   const Json *lasting = value ? find_object(*value, "lasting") : nullptr;

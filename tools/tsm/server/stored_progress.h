@@ -8,14 +8,10 @@
 
 #include "tsm/plan/progress.h"
 #include "tsm/protocol/order.h"
-#include "tsm/protocol/parties.h"
 #include "tsm/protocol/waiting.h"
 #include "tsm/store/store.h"
 
 namespace tsm {
-
-/// Throws std::runtime_error for a damaged key.
-DeviceInfo stored_device_info(const StoredDevice &row);
 
 /// All but the state, which few exchanges need. A row whose progress cannot be read is one without:
 /// the device is asked anew.

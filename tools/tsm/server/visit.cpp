@@ -39,8 +39,8 @@ Envelope envelope_of(const std::string &body) {
 
 }  // namespace
 
-Visit::Visit(const Identity &tsm, StoredDevice row, int64_t now)
-    : tsm_(tsm), row_(std::move(row)), now_(now), progress_(stored_progress(row_)) {
+Visit::Visit(const Identity &tsm, KeyShelf *keys, StoredDevice row, int64_t now)
+    : tsm_(tsm), keys_(keys), row_(std::move(row)), now_(now), progress_(stored_progress(row_)) {
   row_.seen = now;
   event_.time = now;
 }
@@ -57,7 +57,7 @@ void Visit::begin() {
 }
 
 const DeviceInfo &Visit::device() {
-  if (!device_) device_ = stored_device_info(row_);
+  if (!device_) device_ = keys_->device(row_);
   return *device_;
 }
 

@@ -2,7 +2,7 @@
 /// One POST of a device: its row as it was read, what the device says, and the row as it is to be
 /// written. The cryptography is here, and no database waits for it.
 ///
-///     Visit visit(tsm, row, now);
+///     Visit visit(tsm, keys, row, now);
 ///     visit.begin();  or  visit.hear(body);
 ///     request = visit.go_on(plan, time_to_answer);
 ///     write visit.row() and visit.event()
@@ -16,6 +16,7 @@
 #include "tsm/plan/decision.h"
 #include "tsm/protocol/parties.h"
 #include "tsm/protocol/waiting.h"
+#include "tsm/server/key_shelf.h"
 #include "tsm/store/store.h"
 
 namespace tsm {
@@ -36,8 +37,8 @@ class Refusal : public std::runtime_error {
 /// `now` is in seconds since 1970.
 class Visit {
  public:
-  /// `tsm` must live longer.
-  Visit(const Identity &tsm, StoredDevice row, int64_t now);
+  /// `tsm` and `keys` must live longer.
+  Visit(const Identity &tsm, KeyShelf *keys, StoredDevice row, int64_t now);
 
   /// The device asks whether there is something to do: a session begins, and a message that still
   /// waits for its answer gets none any more.
@@ -56,7 +57,6 @@ class Visit {
   const std::string &lost() const { return lost_; }
 
  private:
-  /// Read once: what its key needs to be used is kept with it.
   const DeviceInfo &device();
   Response verified(Envelope envelope);
   void set_outcome(const char *outcome, const std::string &reason);
@@ -65,6 +65,7 @@ class Visit {
   std::string send(Order order);
 
   const Identity &tsm_;
+  KeyShelf *keys_;
   StoredDevice row_;
   int64_t now_;
   Progress progress_;
