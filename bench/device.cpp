@@ -15,7 +15,7 @@ using otrp_test::word;
 
 namespace {
 
-constexpr size_t kOutputLen = 8 << 20;
+constexpr size_t kOutputLen = 4 << 20;
 constexpr char kNewSd[] = "new";
 
 void require(bool passed, const char *what) {

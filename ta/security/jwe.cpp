@@ -104,7 +104,7 @@ static bool set_encoded(JSON_Object *into, const char *key, const uint8_t *bytes
                         const char *failed, const char *as = __builtin_FUNCTION()) {
   tee_ptr<char> text(base64urlEncodeAddEndZero(bytes, len));
   CHECK_AS(as, text, false, "%s", failed);
-  return json_object_take_string(into, key, &text) == JSONSuccess;
+  return json_object_take_base64url(into, key, &text) == JSONSuccess;
 }
 
 JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,

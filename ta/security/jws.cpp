@@ -292,9 +292,9 @@ char *construct_json_signature(const char *name, const char *payload, const char
   CHECK(envelope, nullptr, "json_parse_string error");
   JSON_Object *members = json_value_get_object(envelope.get());
   const bool complete =
-      json_object_take_string(members, "payload", &payload_text) == JSONSuccess &&
-      json_object_take_string(members, "signature", &signature_text) == JSONSuccess &&
-      json_object_take_string(members, "protect", &protect_text) == JSONSuccess &&
+      json_object_take_base64url(members, "payload", &payload_text) == JSONSuccess &&
+      json_object_take_base64url(members, "signature", &signature_text) == JSONSuccess &&
+      json_object_take_base64url(members, "protect", &protect_text) == JSONSuccess &&
       add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
   if (!complete) return nullptr;
   if (own_header && json_object_take(members, "header", &own_header) != JSONSuccess) return nullptr;

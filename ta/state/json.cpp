@@ -391,15 +391,14 @@ JSON_Status json_object_set_string(JSON_Object *object, const char *name, const 
   return JSONSuccess;
 }
 
-JSON_Status json_object_take_string(JSON_Object *object, const char *name, tee_ptr<char> *string) {
-  if (object == nullptr || name == nullptr || !*string) return JSONFailure;
-  const text_form form = form_of(string->get());
+JSON_Status json_object_take_base64url(JSON_Object *object, const char *name, tee_ptr<char> *text) {
+  if (object == nullptr || name == nullptr || !*text) return JSONFailure;
+  const text_form form = {strlen(text->get()), true, true};
   member_place place;
-  if (!form.utf8 || form.len >= UINT32_MAX) return JSONFailure;
-  if (!find_place(object, name, &place)) return JSONFailure;
+  if (form.len >= UINT32_MAX || !find_place(object, name, &place)) return JSONFailure;
   JSON_Value *member = new_value(kJsonString, name, nullptr, {});
   if (member == nullptr) return JSONFailure;
-  set_text(member, string->release(), form);
+  set_text(member, text->release(), form);
   member->flags |= kOwnsText;
   put_member(object, place, member);
   return JSONSuccess;

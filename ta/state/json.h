@@ -83,9 +83,10 @@ JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
 [[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
 
 /// The same for a value, or a text, that has an owner, which holds it no longer after a success.
+/// A text is not looked at: it must have come from base64urlEncodeAddEndZero.
 [[nodiscard]] JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value);
-[[nodiscard]] JSON_Status json_object_take_string(JSON_Object *object, const char *name,
-                                                  tee_ptr<char> *string);
+[[nodiscard]] JSON_Status json_object_take_base64url(JSON_Object *object, const char *name,
+                                                     tee_ptr<char> *text);
 [[nodiscard]] JSON_Status json_array_take(JSON_Array *array, json_ptr *value);
 
 /// Frees an element; the array's last one moves there.
