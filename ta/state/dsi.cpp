@@ -52,14 +52,15 @@ namespace {
 struct list_forms {
   JSON_Value *dsi_t::*value;
   char *dsi_json_str_t::*text;
+  json_array_form dsi_json_str_t::*form;
   const char *value_name;
   const char *text_name;
 };
 
 const list_forms kLists[] = {
-    {&dsi_t::sdl, &dsi_json_str_t::sdl_json_str, "sdl", "sdl_json_str"},
-    {&dsi_t::spl, &dsi_json_str_t::spl_json_str, "spl", "spl_json_str"},
-    {&dsi_t::tal, &dsi_json_str_t::tal_json_str, "tal", "tal_json_str"},
+    {&dsi_t::sdl, &dsi_json_str_t::sdl_json_str, &dsi_json_str_t::sdl_form, "sdl", "sdl_json_str"},
+    {&dsi_t::spl, &dsi_json_str_t::spl_json_str, &dsi_json_str_t::spl_form, "spl", "spl_json_str"},
+    {&dsi_t::tal, &dsi_json_str_t::tal_json_str, &dsi_json_str_t::tal_form, "tal", "tal_json_str"},
 };
 constexpr size_t kNumLists = sizeof kLists / sizeof kLists[0];
 
@@ -96,7 +97,8 @@ TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out, JSON_Value *
     if (text == nullptr) continue;
     JSON_Value **value = &(out->*list.value);
     json_value_free(*value);
-    *value = list.value == tree ? json_parse_string(text) : json_value_init_verbatim(text);
+    *value = list.value == tree ? json_parse_string(text)
+                                : json_value_init_verbatim(text, in->*list.form);
     if (*value != nullptr) continue;
     drop_values(out);
     FAIL(OTRP_NO_MEMORY, "dsi_json_str_2_dsi %s string to json fail", list.text_name);
@@ -119,6 +121,7 @@ TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out) {
     if (!texts[i]) continue;
     TEE_Free(out->*kLists[i].text);
     out->*kLists[i].text = texts[i].release();
+    out->*kLists[i].form = json_look_through(out->*kLists[i].text);
   }
   return TEE_SUCCESS;
 }

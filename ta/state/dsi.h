@@ -24,7 +24,10 @@ struct dsi_json_str_t {
   char *sdl_json_str;  // SD entries
   char *spl_json_str;  // AIK entries
   char *tal_json_str;  // always an empty array
-  bool lacks_an_sd;    // an entry could not be loaded; until the next instance
+  json_array_form sdl_form;
+  json_array_form spl_form;
+  json_array_form tal_form;
+  bool lacks_an_sd;  // an entry could not be loaded; until the next instance
 };
 
 struct dsi_t {

@@ -32,10 +32,20 @@ JSON_Value *json_parse_string(const char *text);
 JSON_Value *json_value_init_object();
 JSON_Value *json_value_init_array();
 
-/// The array that `text` is, for a document that is only written: it stays its text, and has no
-/// elements that could be asked for. `text` must have come from json_serialize_to_string; it is
-/// borrowed, by copies too. NULL and what would be written are as with json_parse_string.
-JSON_Value *json_value_init_verbatim(const char *text);
+/// What is to be known of an array's text before it can stand in a document as it is. Zeros:
+/// nothing is known.
+struct json_array_form {
+  bool comes_back;  // it would be read, and written again as the same text
+  uint32_t num_elements;
+};
+
+/// Looks through a text that json_serialize_to_string has made.
+json_array_form json_look_through(const char *text);
+
+/// The array that `text` is, for a document that is only written: where it `is` one that comes back
+/// it stays its text, and has no elements that could be asked for; else it is parsed. `text` is
+/// borrowed, by copies too.
+JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &is);
 
 /// A document of its own, also when `value` is a part of one.
 JSON_Value *json_value_deep_copy(const JSON_Value *value);

@@ -397,17 +397,19 @@ JSON_Value *json_parse_string(const char *text) {
 
 // What has been serialized has no fault of grammar, but may be nested too deeply, or have control
 // characters, for which there are no escapes; and a fraction may have lost what was behind its
-// last digit, so that it is written otherwise the next time. Those are for the parser to judge.
-JSON_Value *json_value_init_verbatim(const char *text) {
-  if (text == nullptr) return nullptr;
+// last digit, so that it is written otherwise the next time.
+json_array_form json_look_through(const char *text) {
   json_measure found;
-  const bool comes_back =
-      *text == '[' && measure(text, text + strlen(text), &found) && !found.has_fraction;
-  if (!comes_back) return json_parse_string(text);
+  if (*text != '[' || !measure(text, text + strlen(text), &found)) return {};
+  return {!found.has_fraction, found.num_children};
+}
+
+JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &is) {
+  if (!is.comes_back) return json_parse_string(text);
   json_room room;
   JSON_Value *value = new_block({1, 0, 0}, kJsonVerbatim, &room);
   if (value == nullptr) return nullptr;
   value->text = const_cast<char *>(text);
-  value->count = found.num_children;
+  value->count = is.num_elements;
   return value;
 }
