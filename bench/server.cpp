@@ -63,7 +63,8 @@ tsm::Plan usual_plan() {
                       {"tickets", "bank", "certificate of the bank", {app("fare", 2)}}}};
 }
 
-std::string post(Service *service, const std::string &device_id, std::string body) {
+std::shared_ptr<const std::string> post(Service *service, const std::string &device_id,
+                                        std::string body) {
   http::Request request = {.method = "POST", .path = "/tam/" + device_id};
   request.headers = {{"Content-Length", std::to_string(body.size())}};
   if (!body.empty()) request.headers.push_back({"Content-Type", kOtrpJson});
@@ -74,7 +75,7 @@ std::string post(Service *service, const std::string &device_id, std::string bod
     throw std::runtime_error("the server answered " + std::to_string(answer.status) + " " +
                              answer.note);
   }
-  return answer.body ? *answer.body : "";
+  return answer.body;
 }
 
 std::string carry_out(AgentDevice *device, const std::string &request) {
@@ -90,7 +91,7 @@ Steps record_session(AgentDevice *device, const std::string &device_id, Store *s
   for (std::string body;;) {
     Step step = {.row = store->find_device(device_id).value(), .body = body};
     if (step.row.deadline != 0) step.row.deadline = kNeverDue;
-    step.request = post(service, device_id, body);
+    if (const auto request = post(service, device_id, body)) step.request = *request;
     steps.push_back(step);
     if (step.request.empty()) return steps;
     body = carry_out(device, step.request);
@@ -303,8 +304,8 @@ void Fleet::arrange(const Steps &steps) {
 
 void Fleet::exchange(const Steps &steps) {
   for (size_t i = 0; i < kNumExchanges; ++i) {
-    const std::string request = post(&service_, ids_[chosen_[i]], std::move(bodies_[i]));
-    if (request.empty() != steps[i % steps.size()].request.empty()) {
+    const auto request = post(&service_, ids_[chosen_[i]], std::move(bodies_[i]));
+    if ((request == nullptr) != steps[i % steps.size()].request.empty()) {
       throw std::runtime_error("the server decided otherwise than before");
     }
   }

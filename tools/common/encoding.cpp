@@ -54,16 +54,16 @@ void put_digits(uint32_t bits, const DigitPairs &pairs, char *out) {
   memcpy(out + 2, pairs[bits & 0xFFF].data(), 2);
 }
 
-std::string encode(std::string_view bytes, const DigitPairs &pairs) {
-  std::string text((bytes.size() + 2) / 3 * 4, '\0');
-  char *out = text.data();
+void append(std::string_view bytes, const DigitPairs &pairs, std::string *text) {
+  const size_t start = text->size();
+  text->resize(start + (bytes.size() + 2) / 3 * 4);
+  char *out = text->data() + start;
   const size_t whole = bytes.size() / 3 * 3;
   for (size_t at = 0; at < whole; at += 3, out += 4) {
     put_digits(number_of({bytes.data() + at, 3}), pairs, out);
   }
   if (whole < bytes.size()) put_digits(number_of(bytes.substr(whole)), pairs, out);
-  text.resize((bytes.size() * 4 + 2) / 3);
-  return text;
+  text->resize(start + (bytes.size() * 4 + 2) / 3);
 }
 
 std::optional<Bytes> decode(std::string_view text, const Digits &digits) {
@@ -91,13 +91,20 @@ std::optional<Bytes> decode(std::string_view text, const Digits &digits) {
 }  // namespace
 
 std::string base64_encode(std::string_view bytes) {
-  std::string text = encode(bytes, kBase64Pairs);
+  std::string text;
+  append(bytes, kBase64Pairs, &text);
   while (text.size() % 4 != 0) text += '=';
   return text;
 }
 
 std::string base64url_encode(std::string_view bytes) {
-  return encode(bytes, kBase64UrlPairs);
+  std::string text;
+  base64url_append(bytes, &text);
+  return text;
+}
+
+void base64url_append(std::string_view bytes, std::string *text) {
+  append(bytes, kBase64UrlPairs, text);
 }
 
 std::optional<Bytes> base64_decode(std::string_view text) {

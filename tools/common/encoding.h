@@ -16,6 +16,7 @@ using Bytes = std::string;  // any bytes, not only text
 
 std::string base64_encode(std::string_view bytes);     // with padding
 std::string base64url_encode(std::string_view bytes);  // without padding
+void base64url_append(std::string_view bytes, std::string *text);
 std::optional<Bytes> base64_decode(std::string_view text);
 std::optional<Bytes> base64url_decode(std::string_view text);
 

@@ -20,6 +20,7 @@ namespace tsm {
 
 using tools::base64_decode;
 using tools::base64_encode;
+using tools::base64url_append;
 using tools::base64url_decode;
 using tools::base64url_encode;
 using tools::Bytes;

@@ -14,6 +14,7 @@ using tools::UsageError;
 constexpr size_t kAesKeyLen = 16;
 constexpr size_t kImageKeyLen = 32;
 constexpr size_t kImageIvLen = 16;
+constexpr size_t kRoomForOthers = 4096;  // what is in a message besides its payload
 constexpr std::string_view kProtectedHeader = R"({"alg":"RS256"})";
 
 bool has_image(MessageId id) {
@@ -123,18 +124,20 @@ std::string seal(const Json &tbs, std::string_view request_name, std::string_vie
 
 std::string seal_text(std::string_view payload, std::string_view request_name,
                       std::string_view tsmid, const RsaKey &key, const Json &extra) {
+  // The payload can be long: it is encoded where it is to stand, and signed there.
+  std::string text = "{" + text_of(request_name) + ":{\"payload\":\"";
+  const size_t payload_at = text.size();
+  text.reserve(payload.size() / 3 * 4 + kRoomForOthers);
+  base64url_append(payload, &text);
   const std::string protect = base64url_encode(kProtectedHeader);
-  std::string payload_text = base64url_encode(payload);
-  const Bytes signature = rs256_sign(key, {protect, ".", payload_text});
-  Json envelope = Json::object();
-  envelope["payload"] = std::move(payload_text);  // which a list would copy
-  envelope["protect"] = protect;
-  envelope["signature"] = base64url_encode(signature);
-  envelope["header"] = {{"tsmid", tsmid}};
-  envelope.update(extra);
-  Json message = Json::object();
-  message[std::string(request_name)] = std::move(envelope);
-  return text_of(message);
+  const Bytes signature =
+      rs256_sign(key, {protect, ".", std::string_view(text).substr(payload_at)});
+  Json others = {{"protect", protect},
+                 {"signature", base64url_encode(signature)},
+                 {"header", {{"tsmid", tsmid}}}};
+  others.update(extra);
+  text += "\"," + text_of(others).substr(1) + "}";
+  return text;
 }
 
 Json ta_info_request(std::string_view spid, std::string_view taid) {
