@@ -41,21 +41,20 @@ Progress stored_progress(const StoredDevice &row) {
 }
 
 std::string progress_text(const Progress &progress) {
-  return Json{{"lasting", progress_json(progress)},
-              {"session",
-               {{"has_changed", progress.has_changed},
-                {"attempts", progress.attempts},
-                {"last_refusal", progress.last_refusal}}}}
-      .dump();
+  Json session = {{"has_changed", progress.has_changed}};
+  if (!progress.attempts.empty()) session["attempts"] = progress.attempts;
+  if (!progress.last_refusal.empty()) session["last_refusal"] = progress.last_refusal;
+  return compact({{"lasting", progress_json(progress)}, {"session", std::move(session)}});
 }
 
 std::string open_request_text(const Order &order, const SentRequest &sent) {
-  Json value = {{"renew_aik", order.options.renew_aik}};
+  Json value = Json::object();
+  if (order.options.renew_aik) value["renew_aik"] = true;
   for (const auto &[name, member] : kOrderTexts) {
     const std::string &text = order.options.*member;
     if (!text.empty()) value[name] = text;
   }
-  return Json{{"sent", sent_request_json(sent)}, {"order", std::move(value)}}.dump();
+  return compact({{"sent", sent_request_json(sent)}, {"order", std::move(value)}});
 }
 
 OpenRequest parse_open_request(const std::string &text) {
