@@ -191,11 +191,18 @@ inline uint64_t not_plain(uint64_t eight) {
   return special(eight) | (same_as(eight, '/') & ~eight & kHighBits);
 }
 
+/// The index of the first of the candidates, of which there is one at least: the bytes up to it are
+/// counted by their lowest bits. There are machines for which to count bits is a library's matter.
+inline uint32_t first_of(uint64_t candidates) {
+  const uint64_t below = (candidates - 1) & ~candidates;
+  return static_cast<uint32_t>((below & eight_times(1)) * eight_times(1) >> 56) - 1;
+}
+
 /// The first special character of a text that ends at `end` with a NUL.
 inline const char *find_special(const char *at, const char *end) {
   for (; end - at >= 8; at += 8) {
     const uint64_t found = special(load_eight(at));
-    if (found != 0) return at + __builtin_ctzll(found) / 8;
+    if (found != 0) return at + first_of(found);
   }
   while (!is_special(*at)) ++at;
   return at;
