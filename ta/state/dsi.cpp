@@ -66,14 +66,11 @@ constexpr size_t kNumLists = sizeof kLists / sizeof kLists[0];
 
 }  // namespace
 
-static void drop_value(JSON_Value **value) {
-  json_value_free(*value);
-  *value = nullptr;
-}
-
 static void drop_values(dsi_t *dsi, JSON_Value *dsi_t::*except = nullptr) {
   for (const list_forms &list : kLists) {
-    if (list.value != except) drop_value(&(dsi->*list.value));
+    if (list.value == except) continue;
+    json_value_free(dsi->*list.value);
+    dsi->*list.value = nullptr;
   }
 }
 

@@ -111,7 +111,7 @@ static JSON_Value *copy_child(const JSON_Value *from, JSON_Value *parent, JSON_V
   JSON_Value *child = new_node(room, from->type);
   if (from->name != nullptr) {
     child->name = new_text(room, from->name, name_len(from));
-    child->name_mark = from->name_mark;
+    child->capped_name_len = from->capped_name_len;
     child->flags |= from->flags & kPlainName;
   }
   copy_content(from, child, room);
@@ -155,24 +155,24 @@ static const char *value_text(const JSON_Value *value) {
   return value != nullptr && value->type == kJsonString ? value->text : nullptr;
 }
 
-static uint16_t mark_of(uint32_t len) {
+static uint16_t capped(uint32_t len) {
   return len < kLongName ? static_cast<uint16_t>(len) : kLongName;
 }
 
 void set_name(JSON_Value *member, char *name, uint32_t len, bool plain) {
   member->name = name;
-  member->name_mark = mark_of(len);
+  member->capped_name_len = capped(len);
   member->flags &= static_cast<uint8_t>(~kPlainName);
   if (plain) member->flags |= kPlainName;
 }
 
 JSON_Value *find_member(const JSON_Value *object, const char *name, uint32_t len,
                         JSON_Value **last) {
-  const uint16_t mark = mark_of(len);
+  const uint16_t capped_len = capped(len);
   *last = nullptr;
   JSON_Value *at = object->first;
   for (uint32_t i = 0; i < object->count; ++i, at = at->next) {
-    if (at->name_mark == mark && strcmp(at->name, name) == 0) return at;
+    if (at->capped_name_len == capped_len && strcmp(at->name, name) == 0) return at;
     *last = at;
   }
   return nullptr;

@@ -42,10 +42,10 @@ struct json_array_form {
 /// Looks through a text that json_serialize_to_string has made.
 json_array_form json_look_through(const char *text);
 
-/// The array that `text` is, for a document that is only written: where it `is` one that comes back
-/// it stays its text, and has no elements that could be asked for; else it is parsed. `text` is
+/// The array that `text` is, for a document that is only written. Where the text is known to come
+/// back it stays what it is, and has no elements that could be asked for; else it is parsed. It is
 /// borrowed, by copies too.
-JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &is);
+JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &form);
 
 /// A document of its own, also when `value` is a part of one.
 JSON_Value *json_value_deep_copy(const JSON_Value *value);

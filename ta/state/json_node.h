@@ -49,8 +49,8 @@ struct JSON_Value {
     char *text;
     JSON_Value *first;
   };
-  uint32_t count;      // children, of a verbatim array too, or bytes of the text
-  uint16_t name_mark;  // length of the name, at most kLongName
+  uint32_t count;            // children, of a verbatim array too, or bytes of the text
+  uint16_t capped_name_len;  // kLongName: or longer
   json_type type;
   uint8_t flags;
 };
@@ -112,7 +112,7 @@ inline char *new_text(json_room *room, const char *text, uint32_t len) {
 void set_name(JSON_Value *member, char *name, uint32_t len, bool plain);
 
 inline uint32_t name_len(const JSON_Value *member) {
-  if (member->name_mark != kLongName) return member->name_mark;
+  if (member->capped_name_len != kLongName) return member->capped_name_len;
   return static_cast<uint32_t>(strlen(member->name));
 }
 

@@ -404,12 +404,12 @@ json_array_form json_look_through(const char *text) {
   return {!found.has_fraction, found.num_children};
 }
 
-JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &is) {
-  if (!is.comes_back) return json_parse_string(text);
+JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &form) {
+  if (!form.comes_back) return json_parse_string(text);
   json_room room;
   JSON_Value *value = new_block({1, 0, 0}, kJsonVerbatim, &room);
   if (value == nullptr) return nullptr;
   value->text = const_cast<char *>(text);
-  value->count = is.num_elements;
+  value->count = form.num_elements;
   return value;
 }

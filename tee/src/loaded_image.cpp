@@ -38,6 +38,10 @@ bool is_same_time(const timespec &one, const timespec &other) {
   return one.tv_sec == other.tv_sec && one.tv_nsec == other.tv_nsec;
 }
 
+bool is_same_content(const struct stat &one, const struct stat &other) {
+  return one.st_size == other.st_size && is_same_time(one.st_mtim, other.st_mtim);
+}
+
 struct Segments {
   uintptr_t base;
   std::span<const ElfW(Phdr)> headers = {};
@@ -124,16 +128,14 @@ void LoadedImage::remember_variables() {
 }
 
 bool LoadedImage::is_of(const struct stat &status) const {
-  return is_same_file(status, status_) && status.st_size == status_.st_size &&
-         is_same_time(status.st_mtim, status_.st_mtim) &&
+  return is_same_file(status, status_) && is_same_content(status, status_) &&
          is_same_time(status.st_ctim, status_.st_ctim);
 }
 
 // A copy is nobody else's. Giving a file another name, or none, changes the time of its status.
 bool LoadedImage::is_intact() const {
   struct stat now;
-  return copy_.valid() || (::fstat(source_.get(), &now) == 0 && now.st_size == status_.st_size &&
-                           is_same_time(now.st_mtim, status_.st_mtim));
+  return copy_.valid() || (::fstat(source_.get(), &now) == 0 && is_same_content(now, status_));
 }
 
 bool LoadedImage::reset() {
