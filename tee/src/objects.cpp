@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <span>
 
 #include "error.h"
 #include "object.h"
@@ -12,9 +13,7 @@
 
 __TEE_ObjectHandle::__TEE_ObjectHandle() = default;
 
-__TEE_ObjectHandle::~__TEE_ObjectHandle() {
-  tee::cleanse(attributes);
-}
+__TEE_ObjectHandle::~__TEE_ObjectHandle() = default;
 
 namespace tee {
 
@@ -69,21 +68,33 @@ bool is_complete(const Attributes &attributes, uint32_t type) {
          (num_crt == 0 || num_crt == std::size(kCrtAttributes));
 }
 
-// Copies the attributes into the object; what does not fit its type is a programmer's error.
-void take_attributes(__TEE_ObjectHandle &object, const TEE_Attribute *attrs, uint32_t attrCount,
-                     const char *call) {
-  for (uint32_t i = 0; i < attrCount; ++i) {
-    const uint32_t id = attrs[i].attributeID;
-    if (!belongs_to(id, object.type)) panic(call, "attribute of another object type");
+// What does not fit the object's type is a programmer's error.
+Attributes::Value checked_value(const TEE_Attribute &attribute, const __TEE_ObjectHandle &object,
+                                const char *call) {
+  if (!belongs_to(attribute.attributeID, object.type)) {
+    panic(call, "attribute of another object type");
+  }
+  const auto *bytes = static_cast<const uint8_t *>(attribute.content.ref.buffer);
+  const TEE_LengthType len = attribute.content.ref.length;
+  if (bytes == nullptr && len != 0) panic(call, "attribute is NULL");
+  const Attributes::Value value(bytes, len);
+  const uint64_t size = is_rsa(object.type) ? num_bits(value) : uint64_t{8} * len;
+  if (size > object.max_size) panic(call, "attribute too big for the object");
+  return value;
+}
 
-    const auto *bytes = static_cast<const uint8_t *>(attrs[i].content.ref.buffer);
-    if (bytes == nullptr && attrs[i].content.ref.length != 0) panic(call, "attribute is NULL");
-    const auto [entry, added] =
-        object.attributes.try_emplace(id, bytes, bytes + attrs[i].content.ref.length);
-    if (!added) panic(call, "attribute given twice");
-    const std::vector<uint8_t> &value = entry->second;
-    const uint64_t size = is_rsa(object.type) ? num_bits(value) : uint64_t{8} * value.size();
-    if (size > object.max_size) panic(call, "attribute too big for the object");
+void take_attributes(__TEE_ObjectHandle &object, std::span<const TEE_Attribute> given,
+                     const char *call) {
+  size_t total_len = 0;
+  for (const TEE_Attribute &attribute : given) {
+    total_len += checked_value(attribute, object, call).size();
+  }
+  object.attributes.reset(total_len);
+  for (const TEE_Attribute &attribute : given) {
+    const auto *bytes = static_cast<const uint8_t *>(attribute.content.ref.buffer);
+    if (!object.attributes.add(attribute.attributeID, {bytes, attribute.content.ref.length})) {
+      panic(call, "attribute given twice");
+    }
   }
   if (!is_complete(object.attributes, object.type)) panic(call, "mandatory attribute missing");
 }
@@ -126,7 +137,7 @@ TEE_Result generate_pair(__TEE_ObjectHandle &object, uint32_t size,
                          const std::vector<uint8_t> &public_exponent) {
   SharedKey pair = generate_rsa_key(size, public_exponent);
   if (pair == nullptr) return TEE_ERROR_BAD_PARAMETERS;
-  object.attributes = export_rsa_key(*pair);
+  export_rsa_key(*pair, &object.attributes);
   object.rsa = std::move(pair);
   object.size = size;
   object.handle_flags |= TEE_HANDLE_FLAG_INITIALIZED;
@@ -136,7 +147,9 @@ TEE_Result generate_pair(__TEE_ObjectHandle &object, uint32_t size,
 TEE_Result generate_secret(__TEE_ObjectHandle &object, uint32_t size) {
   std::vector<uint8_t> secret(size / 8);
   if (RAND_priv_bytes_ex(nullptr, secret.data(), secret.size(), 0) != 1) return TEE_ERROR_GENERIC;
-  object.attributes[TEE_ATTR_SECRET_VALUE] = std::move(secret);
+  object.attributes.reset(secret.size());
+  object.attributes.add(TEE_ATTR_SECRET_VALUE, secret);
+  OPENSSL_cleanse(secret.data(), secret.size());
   return set_key(object) ? TEE_SUCCESS : TEE_ERROR_GENERIC;
 }
 
@@ -204,13 +217,12 @@ TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attrib
     return code;
   }
 
-  const auto found = known.attributes.find(attributeID);
-  if (found == known.attributes.end()) return TEE_ERROR_ITEM_NOT_FOUND;
-  const std::vector<uint8_t> &value = found->second;
-  const bool fits = value.size() <= *size;
-  *size = static_cast<TEE_LengthType>(value.size());
+  const auto value = known.attributes.find(attributeID);
+  if (!value) return TEE_ERROR_ITEM_NOT_FOUND;
+  const bool fits = value->size() <= *size;
+  *size = static_cast<TEE_LengthType>(value->size());
   if (!fits) return TEE_ERROR_SHORT_BUFFER;
-  std::copy(value.begin(), value.end(), static_cast<uint8_t *>(buffer));
+  std::ranges::copy(*value, static_cast<uint8_t *>(buffer));
   return TEE_SUCCESS;
 }
 
@@ -255,13 +267,10 @@ TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attrib
   }
   const char *const call = __func__;
   const TEE_Result result = result_of([&] {
-    take_attributes(blank, attrs, attrCount, call);
+    take_attributes(blank, {attrs, attrCount}, call);
     return set_key(blank) ? TEE_SUCCESS : TEE_ERROR_BAD_PARAMETERS;
   });
-  if (result != TEE_SUCCESS) {
-    cleanse(blank.attributes);
-    blank.attributes.clear();
-  }
+  if (result != TEE_SUCCESS) blank.attributes.reset(0);
   return result;
 }
 

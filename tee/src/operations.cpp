@@ -91,8 +91,7 @@ const EVP_CIPHER *cipher_for(uint32_t algorithm, uint32_t key_size) {
   return algorithm == TEE_ALG_AES_GCM ? algorithms().gcm[index] : algorithms().cbc[index];
 }
 
-bool set_cipher_key(__TEE_OperationHandle &operation, const std::vector<uint8_t> &key,
-                    uint32_t key_size) {
+bool set_cipher_key(__TEE_OperationHandle &operation, Attributes::Value key, uint32_t key_size) {
   EVP_CIPHER_CTX *context = operation.cipher.get();
   return EVP_CipherInit_ex2(context, cipher_for(operation.algorithm, key_size), key.data(), nullptr,
                             operation.mode == TEE_MODE_ENCRYPT, nullptr) == 1 &&
@@ -126,7 +125,7 @@ bool set_rsa_key(__TEE_OperationHandle &operation, EVP_PKEY *key) {
 
 bool set_key(__TEE_OperationHandle &operation, const __TEE_ObjectHandle &key) {
   if (key.rsa != nullptr) return set_rsa_key(operation, key.rsa.get());
-  const std::vector<uint8_t> &secret = key.attributes.at(TEE_ATTR_SECRET_VALUE);
+  const Attributes::Value secret = key.attributes.at(TEE_ATTR_SECRET_VALUE);
   if (operation.mac != nullptr) {
     return EVP_MAC_init(operation.mac.get(), secret.data(), secret.size(), nullptr) == 1;
   }

@@ -42,7 +42,7 @@ class Scratch {
     require(number != nullptr);
     return number;
   }
-  BIGNUM *number(const std::vector<uint8_t> &value) {
+  BIGNUM *number(Attributes::Value value) {
     BIGNUM *number = BN_bin2bn(value.data(), static_cast<int>(value.size()), this->number());
     require(number != nullptr);
     return number;
@@ -137,13 +137,13 @@ BIGNUM *exponent_for(const BIGNUM *prime, const BIGNUM *d, Scratch &scratch) {
 
 }  // namespace
 
-Attributes crt_part_of(const Attributes &key) {
+void find_crt_part(const Attributes &key, Attributes *part) {
   Scratch scratch;
   const BIGNUM *n = scratch.number(key.at(TEE_ATTR_RSA_MODULUS));
   const BIGNUM *e = scratch.number(key.at(TEE_ATTR_RSA_PUBLIC_EXPONENT));
   const BIGNUM *d = scratch.number(key.at(TEE_ATTR_RSA_PRIVATE_EXPONENT));
   const auto primes = find_primes(n, e, d, scratch);
-  if (!primes) return {};
+  if (!primes) return;
 
   // The flag chooses an inversion whose steps do not tell the numbers.
   BN_set_flags(primes->p, BN_FLG_CONSTTIME);
@@ -151,15 +151,16 @@ Attributes crt_part_of(const Attributes &key) {
       BN_mod_inverse(scratch.number(), primes->q, primes->p, scratch.context());
   const BIGNUM *exponent1 = exponent_for(primes->p, d, scratch);
   const BIGNUM *exponent2 = exponent_for(primes->q, d, scratch);
-  if (coefficient == nullptr || BN_is_zero(exponent1) || BN_is_zero(exponent2)) return {};
+  if (coefficient == nullptr || BN_is_zero(exponent1) || BN_is_zero(exponent2)) return;
 
-  Attributes part;
-  part.emplace(TEE_ATTR_RSA_PRIME1, value_of(*primes->p));
-  part.emplace(TEE_ATTR_RSA_PRIME2, value_of(*primes->q));
-  part.emplace(TEE_ATTR_RSA_EXPONENT1, value_of(*exponent1));
-  part.emplace(TEE_ATTR_RSA_EXPONENT2, value_of(*exponent2));
-  part.emplace(TEE_ATTR_RSA_COEFFICIENT, value_of(*coefficient));
-  return part;
+  // No number is longer than the prime that it is one modulo of.
+  const int total_len = 3 * BN_num_bytes(primes->p) + 2 * BN_num_bytes(primes->q);
+  part->reset(static_cast<size_t>(total_len));
+  part->add(TEE_ATTR_RSA_PRIME1, *primes->p);
+  part->add(TEE_ATTR_RSA_PRIME2, *primes->q);
+  part->add(TEE_ATTR_RSA_EXPONENT1, *exponent1);
+  part->add(TEE_ATTR_RSA_EXPONENT2, *exponent2);
+  part->add(TEE_ATTR_RSA_COEFFICIENT, *coefficient);
 }
 
 }  // namespace tee

@@ -8,7 +8,10 @@
 #include <tee_internal_api.h>
 
 #include <algorithm>
+#include <array>
 #include <bit>
+#include <iterator>
+#include <map>
 #include <mutex>
 
 #include "rsa_completion.h"
@@ -42,16 +45,15 @@ SharedKey share(EVP_PKEY *key) {
   return SharedKey(key, EVP_PKEY_free);
 }
 
-Number to_number(const std::vector<uint8_t> &value) {
+Number to_number(Attributes::Value value) {
   return Number(BN_bin2bn(value.data(), static_cast<int>(value.size()), nullptr));
 }
 
-bool is_odd(const std::vector<uint8_t> &number) {
+bool is_odd(Attributes::Value number) {
   return (number.back() & 1) != 0;
 }
 
-bool is_product(const std::vector<uint8_t> &n, const std::vector<uint8_t> &p,
-                const std::vector<uint8_t> &q) {
+bool is_product(Attributes::Value n, Attributes::Value p, Attributes::Value q) {
   const std::unique_ptr<BN_CTX, FreedBy<BN_CTX_free>> scratch(BN_CTX_secure_new());
   const Number product(BN_new());
   return scratch && product &&
@@ -59,7 +61,7 @@ bool is_product(const std::vector<uint8_t> &n, const std::vector<uint8_t> &p,
          BN_cmp(product.get(), to_number(n).get()) == 0;
 }
 
-bool is_exponent(const std::vector<uint8_t> &e, uint32_t modulus_size) {
+bool is_exponent(Attributes::Value e, uint32_t modulus_size) {
   const uint32_t max_bits = modulus_size > OPENSSL_RSA_SMALL_MODULUS_BITS
                                 ? OPENSSL_RSA_MAX_PUBEXP_BITS
                                 : modulus_size - 1;
@@ -69,38 +71,42 @@ bool is_exponent(const std::vector<uint8_t> &e, uint32_t modulus_size) {
 // Whatever would make OpenSSL refuse to work with the key later. A wrong private exponent or CRT
 // component that passes gives wrong results, as it would on any device.
 bool is_plausible(const Attributes &attributes) {
-  const auto zero = [](const auto &attribute) { return num_bits(attribute.second) == 0; };
-  if (std::any_of(attributes.begin(), attributes.end(), zero)) return false;
+  const auto is_zero = [&](const RsaAttribute &known) {
+    const auto value = attributes.find(known.id);
+    return value && num_bits(*value) == 0;
+  };
+  if (std::ranges::any_of(kRsaAttributes, is_zero)) return false;
 
-  const auto &n = attributes.at(TEE_ATTR_RSA_MODULUS);
+  const Attributes::Value n = attributes.at(TEE_ATTR_RSA_MODULUS);
   const uint32_t size = num_bits(n);
   if (size < kMinRsaSize || size > kMaxRsaSize || !is_odd(n)) return false;
   if (!is_exponent(attributes.at(TEE_ATTR_RSA_PUBLIC_EXPONENT), size)) return false;
 
   const auto p = attributes.find(TEE_ATTR_RSA_PRIME1);
-  return p == attributes.end() || is_product(n, p->second, attributes.at(TEE_ATTR_RSA_PRIME2));
+  return !p || is_product(n, *p, attributes.at(TEE_ATTR_RSA_PRIME2));
 }
 
-SharedKey make_key(const Attributes &attributes) {
+// `completion` has the CRT part where it was not given.
+SharedKey make_key(const Attributes &given, const Attributes &completion) {
   static_assert(std::endian::native == std::endian::little);
   // OpenSSL takes numbers in the byte order of the machine.
-  size_t total = 0;
-  for (const auto &[id, value] : attributes) total += value.size();
-  std::vector<uint8_t> numbers(total);
+  std::vector<uint8_t> numbers(given.total_len() + completion.total_len());
   uint8_t *at = numbers.data();
-  std::vector<OSSL_PARAM> params;
+  std::array<OSSL_PARAM, std::size(kRsaAttributes) + 1> params;
+  auto param = params.begin();
   for (const RsaAttribute &known : kRsaAttributes) {
-    const auto found = attributes.find(known.id);
-    if (found == attributes.end()) continue;
-    std::reverse_copy(found->second.begin(), found->second.end(), at);
-    params.push_back(OSSL_PARAM_construct_BN(known.param, at, found->second.size()));
-    at += found->second.size();
+    auto value = given.find(known.id);
+    if (!value) value = completion.find(known.id);
+    if (!value) continue;
+    std::ranges::reverse_copy(*value, at);
+    *param++ = OSSL_PARAM_construct_BN(known.param, at, value->size());
+    at += value->size();
   }
-  params.push_back(OSSL_PARAM_construct_end());
+  *param = OSSL_PARAM_construct_end();
 
   // Importing leaves nothing in a context, and making one takes half as long as importing.
   static thread_local const KeyContext context = rsa_context();
-  const bool pair = attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT);
+  const bool pair = given.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT);
   EVP_PKEY *key = nullptr;
   const bool made =
       context && EVP_PKEY_fromdata_init(context.get()) == 1 &&
@@ -112,18 +118,8 @@ SharedKey make_key(const Attributes &attributes) {
 
 }  // namespace
 
-void cleanse(Attributes &attributes) {
-  for (auto &[id, value] : attributes) OPENSSL_cleanse(value.data(), value.size());
-}
-
-std::vector<uint8_t> value_of(const BIGNUM &number) {
-  std::vector<uint8_t> value(static_cast<size_t>(BN_num_bytes(&number)));
-  BN_bn2bin(&number, value.data());
-  return value;
-}
-
-uint32_t num_bits(const std::vector<uint8_t> &number) {
-  const auto first = std::find_if(number.begin(), number.end(), [](uint8_t b) { return b != 0; });
+uint32_t num_bits(Attributes::Value number) {
+  const auto first = std::ranges::find_if(number, [](uint8_t b) { return b != 0; });
   if (first == number.end()) return 0;
   const auto rest = static_cast<uint32_t>(number.end() - first - 1);
   return 8 * rest + static_cast<uint32_t>(std::bit_width(*first));
@@ -132,15 +128,12 @@ uint32_t num_bits(const std::vector<uint8_t> &number) {
 SharedKey import_rsa_key(const Attributes &attributes) {
   const QuietErrors quiet;
   if (!is_plausible(attributes)) return nullptr;
-  if (!attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT) ||
-      attributes.contains(TEE_ATTR_RSA_PRIME1)) {
-    return make_key(attributes);
+  Attributes completion;
+  if (attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT) &&
+      !attributes.contains(TEE_ATTR_RSA_PRIME1)) {
+    find_crt_part(attributes, &completion);
   }
-  Attributes completed = attributes;
-  completed.merge(crt_part_of(attributes));
-  SharedKey key = make_key(completed);
-  cleanse(completed);
-  return key;
+  return make_key(attributes, completion);
 }
 
 namespace {
@@ -198,16 +191,19 @@ SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exp
   return key;
 }
 
-Attributes export_rsa_key(const EVP_PKEY &key) {
-  Attributes attributes;
-  for (const RsaAttribute &known : kRsaAttributes) {
+void export_rsa_key(const EVP_PKEY &key, Attributes *attributes) {
+  std::array<Number, std::size(kRsaAttributes)> values;
+  size_t total_len = 0;
+  for (size_t i = 0; i < values.size(); ++i) {
     BIGNUM *value = nullptr;
-    if (EVP_PKEY_get_bn_param(&key, known.param, &value) != 1) {
+    if (EVP_PKEY_get_bn_param(&key, kRsaAttributes[i].param, &value) != 1) {
       panic("OpenSSL", "a generated key lacks a component");
     }
-    attributes.emplace(known.id, value_of(*Number(value)));
+    values[i].reset(value);
+    total_len += static_cast<size_t>(BN_num_bytes(value));
   }
-  return attributes;
+  attributes->reset(total_len);
+  for (size_t i = 0; i < values.size(); ++i) attributes->add(kRsaAttributes[i].id, *values[i]);
 }
 
 }  // namespace tee

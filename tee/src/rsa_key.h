@@ -4,9 +4,9 @@
 #define TEE_RSA_KEY_H
 
 #include <cstdint>
-#include <map>
 #include <vector>
 
+#include "attributes.h"
 #include "evp.h"
 
 namespace tee {
@@ -15,17 +15,8 @@ namespace tee {
 constexpr uint32_t kMinRsaSize = 512;
 constexpr uint32_t kMaxRsaSize = 4096;
 
-/// Attribute values by ID: unsigned big-endian numbers.
-using Attributes = std::map<uint32_t, std::vector<uint8_t>>;
-
-/// Overwrites the values.
-void cleanse(Attributes &attributes);
-
-/// A number as the value of an attribute.
-std::vector<uint8_t> value_of(const BIGNUM &number);
-
 /// Bits of an unsigned big-endian number, leading zeros left out.
-uint32_t num_bits(const std::vector<uint8_t> &number);
+uint32_t num_bits(Attributes::Value number);
 
 /// The key that the attributes describe: modulus and public exponent, a private exponent, and
 /// five CRT components or none. A pair without them works with those that can be found. NULL when
@@ -39,8 +30,8 @@ SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exp
 /// 0, as at the start, makes every key a new one. Keys with an exponent on order are always new.
 void reuse_generated_keys(size_t limit);
 
-/// All eight attributes of a generated key, without leading zeros.
-Attributes export_rsa_key(const EVP_PKEY &key);
+/// Gives `attributes` all eight of a generated key, without leading zeros.
+void export_rsa_key(const EVP_PKEY &key, Attributes *attributes);
 
 }  // namespace tee
 

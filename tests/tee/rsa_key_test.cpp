@@ -53,10 +53,11 @@ TEST(RsaKey, APairIsCompletedOrWorksAsItIs) {
     for (const BIGNUM *order : {phi, lambda}) {
       BIGNUM *d = number(BN_mod_inverse, e, order, scratch.get());
       BN_add_word(d, c.error);
-      const tee::SharedKey key =
-          tee::import_rsa_key({{TEE_ATTR_RSA_MODULUS, tee::value_of(*n)},
-                               {TEE_ATTR_RSA_PUBLIC_EXPONENT, tee::value_of(*e)},
-                               {TEE_ATTR_RSA_PRIVATE_EXPONENT, tee::value_of(*d)}});
+      tee::Attributes attributes(3 * size_t{tee::kMaxRsaSize / 8});
+      attributes.add(TEE_ATTR_RSA_MODULUS, *n);
+      attributes.add(TEE_ATTR_RSA_PUBLIC_EXPONENT, *e);
+      attributes.add(TEE_ATTR_RSA_PRIVATE_EXPONENT, *d);
+      const tee::SharedKey key = tee::import_rsa_key(attributes);
       const tee::KeyContext context(EVP_PKEY_CTX_new_from_pkey(nullptr, key.get(), nullptr));
       EXPECT_EQ(EVP_PKEY_check(context.get()) == 1,
                 order == phi ? c.found_modulo_phi : c.found_modulo_lambda);
