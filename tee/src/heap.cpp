@@ -5,31 +5,58 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <cstring>
 #include <new>
+#include <utility>
 
 #include "ta_instance.h"
 
 namespace tee {
 
 namespace {
-constexpr uint32_t kAlignment = 16;
 constexpr uint32_t kHeaderLen = 16;
 constexpr size_t kFirstSlots = 64;
+
+#if defined(__SANITIZE_ADDRESS__)
+constexpr bool kSanitized = true;
+#elif defined(__has_feature)
+constexpr bool kSanitized = __has_feature(address_sanitizer);
+#else
+constexpr bool kSanitized = false;
+#endif
 }  // namespace
 
 Heap::~Heap() {
   for (size_t i = 0; i < num_slots_; ++i) std::free(slots_[i].block);
+  for (Spare *spare : spares_) {
+    while (spare != nullptr) std::free(std::exchange(spare, spare->next));
+  }
 }
 
 uint64_t Heap::charge_of(uint32_t len) {
   return (uint64_t{len} + kAlignment - 1) / kAlignment * kAlignment + kHeaderLen;
 }
 
+void *Heap::take_block(uint32_t len) {
+  if (kSanitized || len > kMaxSmall) return std::calloc(1, len);
+  const uint32_t units = (len + kAlignment - 1) / kAlignment;
+  Spare *&spare = spares_[units];
+  // One that is new is as long as any that may be asked for in its place.
+  if (spare == nullptr) return std::calloc(std::max(units, 1u), kAlignment);
+  return std::memset(std::exchange(spare, spare->next), 0, len);
+}
+
+void Heap::give_block(void *block, uint32_t len) {
+  if (kSanitized || len > kMaxSmall) return std::free(block);
+  Spare *&spare = spares_[(len + kAlignment - 1) / kAlignment];
+  spare = new (block) Spare{spare};
+}
+
 void *Heap::allocate(uint32_t len) {
   const uint64_t charge = charge_of(len);
   if (charge > size_ - in_use_) return nullptr;
   if (2 * (size_t{live_} + 1) > num_slots_ && !grow()) return nullptr;
-  void *block = std::calloc(1, len);
+  void *block = take_block(len);
   if (block == nullptr) return nullptr;
   insert({block, len});
   in_use_ += static_cast<uint32_t>(charge);
@@ -46,10 +73,11 @@ const uint32_t *Heap::length_of(const void *block) const {
 
 void Heap::release(void *block) {
   const size_t slot = find(block);
-  in_use_ -= static_cast<uint32_t>(charge_of(slots_[slot].len));
+  const uint32_t len = slots_[slot].len;
+  in_use_ -= static_cast<uint32_t>(charge_of(len));
   --live_;
   erase(slot);
-  std::free(block);
+  give_block(block, len);
 }
 
 // The slot of the block, or a free one.

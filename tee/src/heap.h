@@ -3,15 +3,19 @@
 #ifndef TEE_HEAP_H
 #define TEE_HEAP_H
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
 
 namespace tee {
 
-/// Memory comes from the host in exactly the size asked for, so that a sanitizer sees one byte too
-/// far; the charge is what a small allocator inside a TEE would take. Live blocks are kept in a
-/// hash table beside them: a pointer is judged without being read.
+/// Memory comes from the host; the charge is what a small allocator inside a TEE would take. Live
+/// blocks are kept in a hash table beside them: a pointer is judged without being read.
+///
+/// Small blocks that were given back are handed out again by their size. Under a sanitizer, which
+/// is to see one byte too far and one use too late, each block is the host's, in exactly the size
+/// asked for.
 class Heap {
  public:
   explicit Heap(uint32_t size) : size_(size) {}
@@ -42,6 +46,15 @@ class Heap {
     void *block;  // NULL: free
     uint32_t len;
   };
+  struct Spare {
+    Spare *next;
+  };
+
+  static constexpr uint32_t kAlignment = 16;
+  static constexpr uint32_t kMaxSmall = 1024;
+
+  void *take_block(uint32_t len);
+  void give_block(void *block, uint32_t len);
 
   size_t home(const void *block) const;
   size_t find(const void *block) const;
@@ -58,6 +71,7 @@ class Heap {
   // Open addressing with linear probing, a power of two, at most half full.
   std::unique_ptr<Slot[]> slots_;
   size_t num_slots_ = 0;
+  std::array<Spare *, kMaxSmall / kAlignment + 1> spares_ = {};  // by their length, rounded up
 };
 
 }  // namespace tee
