@@ -15,7 +15,7 @@ static void destroy_bytes(uint8_t *bytes, uint32_t len) {
 
 static void destroy_item(void *value) {
   auto *item = static_cast<tlv_item *>(value);
-  if (item->owns_value) destroy_bytes(item->value, item->len);
+  destroy_bytes(item->value, item->len);
   TEE_Free(item);
 }
 
@@ -35,39 +35,26 @@ void tlv_box_destroy(tlv_box *box) {
   TEE_Free(box);
 }
 
-static int new_item(uint16_t type, uint32_t len, item_ptr *item,
-                    const char *as = __builtin_FUNCTION()) {
-  item->reset(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
-  CHECK_AS(as, *item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
-           static_cast<unsigned>(sizeof(tlv_item)));
-  (*item)->type = type;
-  (*item)->len = static_cast<uint16_t>(len);
-  return 0;
-}
-
-static int add_item(tlv_box *box, item_ptr *item) {
-  // All types at their full length would be more than a length can say.
-  const uint32_t record_len = kRecordHeaderLen + (*item)->len;
-  if (record_len > UINT32_MAX - box->serialized_len) return TLV_ERROR;
-  const int added = key_list_add(box->items, (*item)->type, item->get());
-  if (added != 0) return added;
-  (void)item->release();
-  box->serialized_len += record_len;
-  return 0;
-}
-
 int tlv_box_putobject(tlv_box *box, uint16_t type, const void *value, uint32_t len) {
   if (box->serialized != nullptr) return TLV_SERIALIZED;
   if (len > UINT16_MAX || (value == nullptr && len != 0)) return TLV_ERROR;
-  item_ptr item;
-  const int made = new_item(type, len, &item);
-  if (made != 0) return made;
+  item_ptr item(reinterpret_cast<tlv_item *>(allocate_bytes(sizeof(tlv_item))));
+  CHECK(item, TLV_OUT_OF_MEMORY, "Out of memory, need %uB",
+        static_cast<unsigned>(sizeof(tlv_item)));
+  item->type = type;
+  item->len = static_cast<uint16_t>(len);
   item->value = allocate_bytes(len);
   CHECK(item->value != nullptr, TLV_OUT_OF_MEMORY, "Out of memory, need %dB",
         static_cast<int>(len));
-  item->owns_value = true;
   if (len != 0) memcpy(item->value, value, len);
-  return add_item(box, &item);
+  // All types at their full length would be more than a length can say.
+  const uint32_t record_len = kRecordHeaderLen + len;
+  if (record_len > UINT32_MAX - box->serialized_len) return TLV_ERROR;
+  const int added = key_list_add(box->items, type, item.get());
+  if (added != 0) return added;
+  (void)item.release();
+  box->serialized_len += record_len;
+  return 0;
 }
 
 int tlv_box_put_int(tlv_box *box, uint16_t type, uint32_t value) {
@@ -104,17 +91,33 @@ uint32_t tlv_box_get_size(const tlv_box *box) {
   return box->serialized_len;
 }
 
-// Its value stays where it is.
-static bool take_record(reader *in, tlv_box *box) {
-  uint16_t type = 0;
+// Steps over the next record.
+static bool take_record(reader *in, uint16_t *type, reader *value) {
   uint16_t len = 0;
-  if (!take_u16(in, &type) || !take_u16(in, &len)) return false;
-  const uint8_t *value = in->at;
-  if (len != 0 && !take(in, len, &value)) return false;
-  item_ptr item;
-  if (new_item(type, len, &item, "tlv_box_putobject") != 0) return false;
-  item->value = const_cast<uint8_t *>(value);
-  return add_item(box, &item) == 0;
+  if (!take_u16(in, type) || !take_u16(in, &len)) return false;
+  *value = {in->at, len};
+  const uint8_t *bytes = nullptr;
+  return len == 0 || take(in, len, &bytes);
+}
+
+// Among whole records.
+static bool find_record(reader in, uint16_t wanted, reader *value) {
+  uint16_t type = 0;
+  while (take_record(&in, &type, value)) {
+    if (type == wanted) return true;
+  }
+  return false;
+}
+
+// Whether the bytes are whole records of distinct types.
+static bool is_box(const uint8_t *bytes, uint32_t len) {
+  for (reader in = {bytes, len}; in.left != 0;) {
+    const reader before = {bytes, len - in.left};
+    uint16_t type = 0;
+    reader value = {};
+    if (!take_record(&in, &type, &value) || find_record(before, type, &value)) return false;
+  }
+  return true;
 }
 
 tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len) {
@@ -125,40 +128,42 @@ tlv_box *tlv_box_parse(const uint8_t *bytes, uint32_t len) {
   CHECK(copy.data != nullptr, nullptr, "Out of memory, need %dB", static_cast<int>(len));
   copy.len = len;
   if (len != 0) memcpy(copy.data, bytes, len);
-
-  for (reader in = {copy.data, len}; in.left != 0;) {
-    if (!take_record(&in, box.get())) return nullptr;
-  }
+  if (!is_box(copy.data, len)) return nullptr;
+  box->serialized_len = len;
   box->serialized = copy.release();
   return box.release();
 }
 
-static const tlv_item *find_item(const tlv_box *box, uint16_t type) {
-  void *value = nullptr;
-  if (key_list_get(box->items, type, &value) != 0) return nullptr;
-  return static_cast<const tlv_item *>(value);
+// A closed box is read where it is serialized.
+static bool find_value(const tlv_box *box, uint16_t type, reader *value) {
+  if (box->serialized != nullptr) {
+    return find_record({box->serialized, box->serialized_len}, type, value);
+  }
+  void *found = nullptr;
+  if (key_list_get(box->items, type, &found) != 0) return false;
+  const auto *item = static_cast<const tlv_item *>(found);
+  *value = {item->value, item->len};
+  return true;
 }
 
 int tlv_box_get_int(const tlv_box *box, uint16_t type, uint32_t *value) {
-  const tlv_item *item = find_item(box, type);
-  if (item == nullptr) return TLV_ERROR;
-  reader in = {item->value, item->len};
-  return take_u32(&in, value) ? 0 : TLV_ERROR;
+  reader bytes = {};
+  return find_value(box, type, &bytes) && take_u32(&bytes, value) ? 0 : TLV_ERROR;
 }
 
 int tlv_box_get_bytes(const tlv_box *box, uint16_t type, uint8_t *bytes, uint32_t *len) {
-  const tlv_item *item = find_item(box, type);
-  if (item == nullptr || *len < item->len) return TLV_ERROR;
+  reader value = {};
+  if (!find_value(box, type, &value) || *len < value.left) return TLV_ERROR;
   if (*len != 0) memset(bytes, 0, *len);
-  if (item->len != 0) memcpy(bytes, item->value, item->len);
-  *len = item->len;
+  if (value.left != 0) memcpy(bytes, value.at, value.left);
+  *len = value.left;
   return 0;
 }
 
 int tlv_box_get_bytes_ptr(const tlv_box *box, uint16_t type, const uint8_t **bytes, uint32_t *len) {
-  const tlv_item *item = find_item(box, type);
-  if (item == nullptr) return TLV_NOT_FOUND;
-  *bytes = item->value;
-  *len = item->len;
+  reader value = {};
+  if (!find_value(box, type, &value)) return TLV_NOT_FOUND;
+  *bytes = value.at;
+  *len = value.left;
   return 0;
 }

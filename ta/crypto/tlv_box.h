@@ -27,12 +27,11 @@ enum tlv_result : int {
 struct tlv_item {
   uint16_t type;
   uint16_t len;
-  bool owns_value;  // else it lies in the serialized box
   uint8_t *value;
 };
 
 struct tlv_box {
-  key_list *items;      // under their types
+  key_list *items;      // under their types; none in a parsed box
   uint8_t *serialized;  // NULL while the box is open
   uint32_t serialized_len;
 };
