@@ -22,9 +22,9 @@ struct __TEE_ObjectHandle {
   uint32_t max_size = 0;  // bits
   uint32_t size = 0;      // bits; 0 until populated or generated
   uint32_t usage = 0xFFFFFFFF;
-  uint32_t handle_flags = 0;   // TEE_HANDLE_FLAG_*, and TEE_DATA_FLAG_* of a persistent object
+  uint32_t handle_flags = 0;  // TEE_HANDLE_FLAG_*, and TEE_DATA_FLAG_* of a persistent object
   tee::Attributes attributes;
-  tee::SharedKey rsa;          // made of them once; NULL unless an RSA key is set
+  tee::SharedKey rsa;                         // made of them once; NULL unless an RSA key is set
   std::unique_ptr<tee::OpenData> persistent;  // NULL for a transient object
 };
 

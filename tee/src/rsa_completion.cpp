@@ -4,7 +4,7 @@
 #include <tee_internal_api.h>
 
 #include <algorithm>
-#include <bit>
+#include <cmath>
 #include <new>
 #include <optional>
 
@@ -20,6 +20,8 @@ constexpr int kMaxFactor = 256;
 
 // By how many bits k(p + q − 1) is shorter than n, which one of 256 other numbers is as well.
 constexpr int kBitsMissing = 8;
+
+constexpr int kWordBits = 8 * sizeof(BN_ULONG);
 
 // Of what is computed here nothing fails but for want of memory.
 void require(int done) {
@@ -59,24 +61,44 @@ struct Primes {
   BIGNUM *q;
 };
 
-// By Newton's method, which doubles the bits that are right in each step: so each works on no more
-// of the leading bits than it takes. Of a number that is no square the last bit may be wrong.
-BIGNUM *root_of(const BIGNUM *square, Scratch &scratch) {
-  constexpr int kSpareBits = 3;
-  const int num_bits = (BN_num_bits(square) + 1) / 2;
-  BIGNUM *root = scratch.number(), *leading = scratch.number(), *other = scratch.number();
-  int known = kSpareBits;
-  require(BN_set_bit(root, known));
-  for (auto halvings = static_cast<int>(std::bit_width(static_cast<unsigned>(num_bits)));
-       halvings >= 0; --halvings) {
-    const int wanted = std::min((num_bits >> halvings) + kSpareBits, num_bits);
-    require(BN_lshift(root, root, wanted - known));
-    require(BN_rshift(leading, square, 2 * (num_bits - wanted)));
-    require(BN_div(other, nullptr, leading, root, scratch.context()));
-    require(BN_add(root, root, other));
-    require(BN_rshift1(root, root));
-    known = wanted;
+BN_ULONG root_of_word(BN_ULONG word) {
+  constexpr BN_ULONG kMaxRoot = UINT32_MAX;
+  const auto root = static_cast<BN_ULONG>(std::sqrt(static_cast<double>(word)));
+  return std::min(root, kMaxRoot);
+}
+
+// By Zimmermann's method, which doubles the leading bits that it knows the root of: what the known
+// half of the root leaves of them, divided by twice that half, is the other half, or too much by
+// little.
+BIGNUM *root_of(const BIGNUM *number, Scratch &scratch) {
+  BIGNUM *root = scratch.number(), *square = scratch.number();
+  BIGNUM *leading = scratch.number(), *half = scratch.number(), *shifted = scratch.number();
+  int size = kWordBits;
+  int total = size;
+  while (total < BN_num_bits(number)) total *= 2;
+  const int shift = (total - BN_num_bits(number)) / 2;
+  require(BN_lshift(shifted, number, 2 * shift));
+
+  require(BN_rshift(leading, shifted, total - size));
+  require(BN_set_word(root, root_of_word(BN_get_word(leading))));
+  for (;;) {
+    require(BN_sqr(square, root, scratch.context()));
+    while (BN_cmp(square, leading) > 0) {
+      require(BN_sub_word(root, 1));
+      require(BN_sqr(square, root, scratch.context()));
+    }
+    if (size == total) break;
+    size *= 2;
+    require(BN_rshift(leading, shifted, total - size));
+    require(BN_lshift(square, square, size / 2));
+    require(BN_sub(half, leading, square));
+    require(BN_rshift(half, half, size / 4));
+    require(BN_lshift1(square, root));
+    require(BN_div(half, nullptr, half, square, scratch.context()));
+    require(BN_lshift(root, root, size / 4));
+    require(BN_add(root, root, half));
   }
+  require(BN_rshift(root, root, shift));
   return root;
 }
 
