@@ -59,6 +59,31 @@ static bool same(const Json &a, const Json &b) {
   return true;
 }
 
+// An array by its slices, and the tree that the same text is.
+static void check_slices(const ExactText &text, const JSON_Value *tree) {
+  const json_ptr sliced(json_value_init_slices(text.get(), json_look_through(text.get())));
+  require(bool(sliced) == (tree != nullptr), "an array can be taken apart if it can be read");
+  JSON_Array *slices = json_value_get_array(sliced.get());
+  constexpr size_t kMaxCount = 50;
+  if (slices == nullptr || json_array_get_count(slices) > kMaxCount) return;
+  const json_ptr copy(json_value_deep_copy(tree));
+  JSON_Array *elements = json_value_get_array(copy.get());
+  require(serialized(sliced.get()) == serialized(tree), "its slices are its elements");
+  while (const size_t count = json_array_get_count(slices)) {
+    for (const char *name : {"name", "spid", "a"}) {
+      const char *member = json_object_get_string(json_array_get_object(elements, count / 2), name);
+      for (const char *wanted : {member, "a", static_cast<const char *>(nullptr)}) {
+        require(json_array_match(slices, count / 2, name, wanted) ==
+                    json_array_match(elements, count / 2, name, wanted),
+                "a slice has the same members");
+      }
+    }
+    require(json_array_remove(slices, count / 2) == json_array_remove(elements, count / 2) &&
+                serialized(sliced.get()) == serialized(copy.get()),
+            "without one the rest is the same");
+  }
+}
+
 static void check_rewriting(const JSON_Value *value, const std::string &text) {
   const json_ptr copy(json_value_deep_copy(value));
   require(copy && serialized(copy.get()) == text, "a copy is the same document");
@@ -72,6 +97,7 @@ static void check_rewriting(const JSON_Value *value, const std::string &text) {
   require(json_value_count_elements(kept.get()) ==
               json_array_get_count(json_value_get_array(again.get())),
           "it has as many elements");
+  check_slices(kept_text, again.get());
   const json_ptr spread = parsed(take_text(json_serialize_to_string_pretty(value)));
   require(bool(spread) == bool(again), "white space makes no difference");
   if (spread) require_same(spread.get(), text);

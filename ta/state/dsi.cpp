@@ -86,7 +86,7 @@ void dsi_json_str_free(dsi_json_str_t *dsi) {
   TEE_Free(dsi);
 }
 
-TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out, JSON_Value *dsi_t::*tree) {
+TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out, JSON_Value *dsi_t::*edited) {
   CHECK(in != nullptr && out != nullptr, OTRP_MISSING, "dsi_json_str_2_dsi input is NULL");
 
   for (const list_forms &list : kLists) {
@@ -94,8 +94,8 @@ TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out, JSON_Value *
     if (text == nullptr) continue;
     JSON_Value **value = &(out->*list.value);
     json_value_free(*value);
-    *value = list.value == tree ? json_parse_string(text)
-                                : json_value_init_verbatim(text, in->*list.form);
+    *value = list.value == edited ? json_value_init_slices(text, in->*list.form)
+                                  : json_value_init_verbatim(text, in->*list.form);
     if (*value != nullptr) continue;
     drop_values(out);
     FAIL(OTRP_NO_MEMORY, "dsi_json_str_2_dsi %s string to json fail", list.text_name);
@@ -123,13 +123,13 @@ TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out) {
   return TEE_SUCCESS;
 }
 
-TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*tree, TEE_Result no_memory,
+TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*edited, TEE_Result no_memory,
                     dsi_ptr *working, const char *as) {
   working->reset(allocate_zeroed<dsi_t>());
   CHECK_AS(as, *working, no_memory, "malloc dsi fail");
-  TRY_LOG_AS(as, dsi_json_str_2_dsi(dsi, working->get(), tree),
+  TRY_LOG_AS(as, dsi_json_str_2_dsi(dsi, working->get(), edited),
              "dsi_json_str_2_dsi error code: 0x%x");
-  if (tree != nullptr) drop_values(working->get(), tree);
+  if (edited != nullptr) drop_values(working->get(), edited);
   return TEE_SUCCESS;
 }
 
@@ -139,9 +139,9 @@ TEE_Result judge_sp_exist(const JSON_Value *spl, const char *spid) {
   const JSON_Array *entries = json_value_get_array(spl);
   const size_t num_entries = json_array_get_count(entries);
   for (size_t i = 0; i < num_entries; ++i) {
-    const char *listed = json_object_get_string(json_array_get_object(entries, i), "spid");
-    CHECK(listed != nullptr, TEE_ERROR_GENERIC, "No spid fieldin sp json");
-    if (strcmp(listed, spid) == 0) return TEE_SUCCESS;
+    const json_match listed = json_array_match(entries, i, "spid", spid);
+    CHECK(listed >= kJsonOtherText, TEE_ERROR_GENERIC, "No spid fieldin sp json");
+    if (listed == kJsonSameText) return TEE_SUCCESS;
   }
   return TEE_ERROR_ITEM_NOT_FOUND;
 }

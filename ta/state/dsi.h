@@ -4,9 +4,10 @@
 /// then edited in step with them.
 ///
 /// At rest it is three compact JSON texts (`dsi_json_str_t`), which take less of the heap than
-/// trees. They are sent and hashed as they are; only an edit makes a tree, of the one list that it
-/// changes, and comes into force when the new text is there. Until then the DSI is what it was. A
-/// text that cannot be read as JSON fails whatever is done with the DSI. Entries are
+/// trees. They are sent and hashed as they are, and an edit takes the one that it changes apart
+/// into its entries, no further. It comes into force when the new text is there; until then the DSI
+/// is what it was. A text that cannot be read as JSON fails whatever is done with the DSI. Entries
+/// are
 ///
 ///     SD:   {"name", "spid", "talist"}          AIK:   {"spaik", "spaiktype", "spid"}
 ///
@@ -49,18 +50,18 @@ using dsi_text_ptr = owned<dsi_json_str_t *, dsi_json_str_free>;
 /// SD list where there is none.
 dsi_json_str_t *init_dsi();
 
-/// Replaces the values of `out` by those of the texts: a tree for the list `tree`, the texts
-/// themselves for the others. OTRP_NO_MEMORY when one does not parse.
+/// Replaces the values of `out` by those of the texts: an array of entries for the list `edited`,
+/// the texts themselves for the others. OTRP_NO_MEMORY when one does not parse.
 [[nodiscard]] TEE_Result dsi_json_str_2_dsi(const dsi_json_str_t *in, dsi_t *out,
-                                            JSON_Value *dsi_t::*tree = nullptr);
+                                            JSON_Value *dsi_t::*edited = nullptr);
 
 /// Replaces the texts of `out` by those of the values: all of them or, after a failure, none.
 [[nodiscard]] TEE_Result dsi_2_dsi_json_str(const dsi_t *in, dsi_json_str_t *out);
 
-/// The working form of `dsi`, for the operation named `as`, which logs: the list `tree` alone, as a
-/// tree, or with NULL all of them as texts. `no_memory` is the code when there is no room for the
-/// structure.
-[[nodiscard]] TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*tree,
+/// The working form of `dsi`, for the operation named `as`, which logs: the list `edited` alone, by
+/// its entries, or with NULL all of them as texts. It borrows the texts of `dsi`. `no_memory` is
+/// the code when there is no room for the structure.
+[[nodiscard]] TEE_Result open_dsi(const dsi_json_str_t *dsi, JSON_Value *dsi_t::*edited,
                                   TEE_Result no_memory, dsi_ptr *working,
                                   const char *as = __builtin_FUNCTION());
 

@@ -8,14 +8,8 @@
 #include "state/dsi.h"
 #include "state/object_store.h"
 
-// Has `change` edit one of the lists, and puts it back unless that fails.
-template <class Change>
-static TEE_Result edit_dsi(dsi_json_str_t *dsi, JSON_Value *dsi_t::*list, TEE_Result no_memory,
-                           const Change &change, const char *as = __builtin_FUNCTION()) {
-  dsi_ptr working;
-  TRY(open_dsi(dsi, list, no_memory, &working, as));
-  TRY(change(working.get()->*list));
-  TRY_LOG_AS(as, dsi_2_dsi_json_str(working.get(), dsi), "dsi_2_dsi_json_str error code: 0x%x");
+static TEE_Result put_back(const dsi_t *working, dsi_json_str_t *dsi, const char *as) {
+  TRY_LOG_AS(as, dsi_2_dsi_json_str(working, dsi), "dsi_2_dsi_json_str error code: 0x%x");
   return TEE_SUCCESS;
 }
 
@@ -25,10 +19,9 @@ static TEE_Result find_entry(const JSON_Array *entries, const char *key, const c
                              size_t *index) {
   const size_t num_entries = json_array_get_count(entries);
   for (size_t i = 0; i < num_entries; ++i) {
-    const JSON_Object *entry = json_array_get_object(entries, i);
-    if (entry == nullptr) return OTRP_MISSING;
-    const char *member = json_object_get_string(entry, key);
-    if (member != nullptr && value != nullptr && strcmp(member, value) == 0) {
+    const json_match member = json_array_match(entries, i, key, value);
+    if (member == kJsonNoObject) return OTRP_MISSING;
+    if (member == kJsonSameText) {
       *index = i;
       return TEE_SUCCESS;
     }
@@ -55,9 +48,10 @@ TEE_Result dsi_add_sp_aik(dsi_json_str_t *dsi, const char *spid, const uint8_t *
   const char *as = __builtin_FUNCTION();
   CHECK(dsi != nullptr && spid != nullptr && key != nullptr && key_len != 0 && spaiktype != nullptr,
         TEE_ERROR_NO_DATA, "dsi_add_sp_aik input is null");
-  return edit_dsi(
-      dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY,
-      [=](JSON_Value *spl) { return add_aik(spl, spid, key, key_len, spaiktype, as); }, as);
+  dsi_ptr working;
+  TRY(open_dsi(dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY, &working, as));
+  TRY(add_aik(working->spl, spid, key, key_len, spaiktype, as));
+  return put_back(working.get(), dsi, as);
 }
 
 static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
@@ -69,8 +63,10 @@ static TEE_Result remove_aik(JSON_Value *spl, const char *spid) {
 }
 
 TEE_Result delete_dsi_spl_item_with_spid(dsi_json_str_t *dsi, const char *spid) {
-  return edit_dsi(dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY,
-                  [=](JSON_Value *spl) { return remove_aik(spl, spid); });
+  dsi_ptr working;
+  TRY(open_dsi(dsi, &dsi_t::spl, TEE_ERROR_OUT_OF_MEMORY, &working));
+  TRY(remove_aik(working->spl, spid));
+  return put_back(working.get(), dsi, __func__);
 }
 
 // ---- SD entries
@@ -100,9 +96,10 @@ static TEE_Result add_sd(JSON_Value *sdl, const char *sdname, const char *as) {
 
 TEE_Result dsi_load_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
   const char *as = __builtin_FUNCTION();
-  const TEE_Result result = edit_dsi(
-      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
-      [=](JSON_Value *sdl) { return add_sd(sdl, sdname, as); }, as);
+  dsi_ptr working;
+  TEE_Result result = open_dsi(dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY, &working, as);
+  if (result == TEE_SUCCESS) result = add_sd(working->sdl, sdname, as);
+  if (result == TEE_SUCCESS) result = put_back(working.get(), dsi, as);
   if (result != TEE_SUCCESS) dsi->lacks_an_sd = true;
   return result;
 }
@@ -122,13 +119,12 @@ static TEE_Result remove_sd_if_there(JSON_Value *sdl, const char *sdname,
   CHECK_AS(as, entries != nullptr, TEE_ERROR_BAD_FORMAT, "get array from dsi->sdl is NULL");
   const size_t num_entries = json_array_get_count(entries);
   for (size_t i = 0; i < num_entries; ++i) {
-    const JSON_Object *entry = json_array_get_object(entries, i);
-    CHECK_AS(as, entry != nullptr, OTRP_RESPONSE_FAILED, "json_array_get_object idx %u error",
+    const json_match name = json_array_match(entries, i, "name", sdname);
+    CHECK_AS(as, name != kJsonNoObject, OTRP_RESPONSE_FAILED, "json_array_get_object idx %u error",
              static_cast<unsigned>(i));
-    const char *name = json_object_get_string(entry, "name");
-    CHECK_AS(as, name != nullptr, OTRP_RESPONSE_FAILED,
+    CHECK_AS(as, name != kJsonNoText, OTRP_RESPONSE_FAILED,
              "json_object_get_string from sdl item is null");
-    if (sdname == nullptr || strcmp(name, sdname) != 0) continue;
+    if (name != kJsonSameText) continue;
     CHECK_AS(as, json_array_remove(entries, i) == JSONSuccess, OTRP_RESPONSE_FAILED,
              "json array remove object fail");
     return TEE_SUCCESS;
@@ -138,14 +134,15 @@ static TEE_Result remove_sd_if_there(JSON_Value *sdl, const char *sdname,
 
 TEE_Result dsi_delete_sd_by_name(dsi_json_str_t *dsi, const char *sdname) {
   const char *as = __builtin_FUNCTION();
-  return edit_dsi(
-      dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY,
-      [=](JSON_Value *sdl) { return remove_sd_if_there(sdl, sdname, as); }, as);
+  dsi_ptr working;
+  TRY(open_dsi(dsi, &dsi_t::sdl, TEE_ERROR_OUT_OF_MEMORY, &working, as));
+  TRY(remove_sd_if_there(working->sdl, sdname, as));
+  return put_back(working.get(), dsi, as);
 }
 
 // ---- Refreshing an SD
 //
-// Both steps edit one tree, which goes back after the second one, whether or not that failed: a
+// Both steps edit one list, which goes back after the second one, whether or not that failed: a
 // record that cannot be read takes its SD out.
 
 static TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname, dsi_ptr *working) {
@@ -156,11 +153,8 @@ static TEE_Result remove_g_dsi_sdl_item_by_sdname(const char *sdname, dsi_ptr *w
 
 static TEE_Result load_g_dsi_sdl_item_by_sdname(const char *sdname, dsi_t *working) {
   const TEE_Result added = add_sd(working->sdl, sdname, "dsi_load_sd_by_name");
-  const TEE_Result put_back = dsi_2_dsi_json_str(working, g_dsi);
-  if (put_back != TEE_SUCCESS) {
-    trace_error("dsi_load_sd_by_name", __LINE__, "dsi_2_dsi_json_str error code: 0x%x", put_back);
-  }
-  const TEE_Result result = added != TEE_SUCCESS ? added : put_back;
+  const TEE_Result stored = put_back(working, g_dsi, "dsi_load_sd_by_name");
+  const TEE_Result result = added != TEE_SUCCESS ? added : stored;
   if (result != TEE_SUCCESS) g_dsi->lacks_an_sd = true;
   TRY_LOG(result, "dsi_load_sd_by_name error code: 0x%x");
   return TEE_SUCCESS;

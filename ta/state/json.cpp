@@ -100,7 +100,7 @@ static json_extent measure_tree(const JSON_Value *root) {
 
 static void copy_content(const JSON_Value *from, JSON_Value *to, json_room *room) {
   if (from->type == kJsonNumber) to->number = from->number;
-  if (from->type != kJsonString && from->type != kJsonVerbatim) return;
+  if (from->type != kJsonString && from->type != kJsonVerbatim && from->type != kJsonSlice) return;
   to->text = from->type == kJsonString ? new_text(room, from->text, from->count) : from->text;
   to->count = from->count;
   to->flags |= from->flags & kPlainText;
@@ -229,6 +229,17 @@ const char *json_array_get_string(const JSON_Array *array, size_t index) {
 
 JSON_Object *json_array_get_object(const JSON_Array *array, size_t index) {
   return json_value_get_object(element(array, index));
+}
+
+json_match json_array_match(const JSON_Array *array, size_t index, const char *name,
+                            const char *text) {
+  const JSON_Value *value = element(array, index);
+  if (value != nullptr && value->type == kJsonSlice) return slice_match(value, name, text);
+  const JSON_Object *object = json_value_get_object(value);
+  if (object == nullptr) return kJsonNoObject;
+  const char *member = json_object_get_string(object, name);
+  if (member == nullptr) return kJsonNoText;
+  return text != nullptr && strcmp(member, text) == 0 ? kJsonSameText : kJsonOtherText;
 }
 
 // ---- Edits

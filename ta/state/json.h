@@ -47,6 +47,10 @@ json_array_form json_look_through(const char *text);
 /// borrowed, by copies too.
 JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &form);
 
+/// The same for an array that is to be edited: its elements stay the parts of the text that they
+/// are. They can be written, removed, and asked by json_array_match().
+JSON_Value *json_value_init_slices(const char *text, const json_array_form &form);
+
 /// A document of its own, also when `value` is a part of one.
 JSON_Value *json_value_deep_copy(const JSON_Value *value);
 
@@ -74,6 +78,13 @@ size_t json_value_count_elements(const JSON_Value *value);
 /// A walk by ascending index takes constant time per step.
 const char *json_array_get_string(const JSON_Array *array, size_t index);
 JSON_Object *json_array_get_object(const JSON_Array *array, size_t index);
+
+enum json_match { kJsonNoObject, kJsonNoText, kJsonOtherText, kJsonSameText };
+
+/// What the element at `index`, if it is an object, has as its member `name`: no text, or which one
+/// beside `text`. A NULL `text` is like no other.
+json_match json_array_match(const JSON_Array *array, size_t index, const char *name,
+                            const char *text);
 
 // ---- Edits
 

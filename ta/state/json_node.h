@@ -28,6 +28,7 @@ enum json_type : uint8_t {
   kJsonNumber,
   kJsonString,
   kJsonVerbatim,  // an array as its text, which is someone else's
+  kJsonSlice,     // a value as a part of such a text
   kJsonArray,
   kJsonObject,
 };
@@ -49,7 +50,7 @@ struct JSON_Value {
     char *text;
     JSON_Value *first;
   };
-  uint32_t count;            // children, of a verbatim array too, or bytes of the text
+  uint32_t count;            // children, of a verbatim array too, or bytes of the text or slice
   uint16_t capped_name_len;  // kLongName: or longer
   json_type type;
   uint8_t flags;
@@ -142,6 +143,9 @@ inline void append_child(JSON_Value *parent, JSON_Value *last, JSON_Value *child
   }
 }
 
+/// How a slice, which is of a text that comes back, answers json_array_match().
+json_match slice_match(const JSON_Value *slice, const char *name, const char *text);
+
 // ---- Characters
 //
 // Texts are looked through eight characters at a time. Each has a byte of a number, the first one
@@ -185,6 +189,9 @@ inline uint64_t special(uint64_t eight) {
 inline bool is_special(char c) {
   return static_cast<uint8_t>(c) < 0x20 || c == '"' || c == '\\';
 }
+
+/// The letter that stands for a character behind a backslash; 0 when it stands for itself.
+char escape_letter(char c);
 
 /// Not plain: what is not written as it stands, and control characters.
 inline uint64_t not_plain(uint64_t eight) {

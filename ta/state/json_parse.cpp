@@ -413,3 +413,74 @@ JSON_Value *json_value_init_verbatim(const char *text, const json_array_form &fo
   value->count = form.num_elements;
   return value;
 }
+
+// ---- Slices
+//
+// Of a text that comes back: it has no white space, and each bracket and quote has its partner.
+
+// From behind the opening quote to behind the closing one.
+static const char *skip_string(const char *at, const char *end) {
+  for (at = find_special(at, end); *at != '"'; at = find_special(at + 2, end)) {
+  }
+  return at + 1;
+}
+
+// To the comma or the closing bracket behind the value.
+static const char *skip_value(const char *at, const char *end) {
+  for (uint32_t depth = 0;;) {
+    const char c = *at;
+    if (depth == 0 && (c == ',' || c == ']' || c == '}')) return at;
+    ++at;
+    if (c == '"') {
+      at = skip_string(at, end);
+    } else if (c == '[' || c == '{') {
+      ++depth;
+    } else if (c == ']' || c == '}') {
+      --depth;
+    }
+  }
+}
+
+JSON_Value *json_value_init_slices(const char *text, const json_array_form &form) {
+  if (!form.comes_back) return json_parse_string(text);
+  json_room room;
+  JSON_Value *array = new_block({uint64_t{form.num_elements} + 1, 1, 0}, kJsonArray, &room);
+  if (array == nullptr) return nullptr;
+  const char *end = text + strlen(text);
+  JSON_Value *last = nullptr;
+  for (const char *at = text; array->count != form.num_elements;) {
+    ++at;  // a bracket or a comma
+    JSON_Value *slice = new_node(&room, kJsonSlice);
+    slice->text = const_cast<char *>(at);
+    at = skip_value(at, end);
+    slice->count = static_cast<uint32_t>(at - slice->text);
+    append_child(array, last, slice);
+    last = slice;
+  }
+  return array;
+}
+
+// Whether the string that `at` is inside of, up to its closing quote, is written for `text`.
+static bool is_written_for(const char *at, const char *text) {
+  for (; *text != 0; ++text) {
+    const char letter = escape_letter(*text);
+    if (letter != 0 && *at++ != '\\') return false;
+    if (*at++ != (letter != 0 ? letter : *text)) return false;
+  }
+  return *at == '"';
+}
+
+json_match slice_match(const JSON_Value *slice, const char *name, const char *text) {
+  const char *at = slice->text;
+  const char *end = at + slice->count;
+  if (*at != '{') return kJsonNoObject;
+  while (*at != '}' && at[1] == '"') {
+    const bool wanted = is_written_for(at + 2, name);
+    at = skip_string(at + 2, end) + 1;
+    if (wanted && *at != '"') return kJsonNoText;
+    if (wanted)
+      return text != nullptr && is_written_for(at + 1, text) ? kJsonSameText : kJsonOtherText;
+    at = skip_value(at, end);
+  }
+  return kJsonNoText;
+}

@@ -2,98 +2,63 @@
 #include "state/json_node.h"
 
 // ---- Where the characters go
-//
-// The same walk feeds both: one counts what the other then writes.
 
 namespace {
 
-struct text_counter {
-  uint64_t len = 0;
+// One walk counts the characters, `text` being NULL, and the next one writes them.
+struct text_sink {
+  char *text;
+  uint64_t len;
 
-  void put(char) { ++len; }
-  void put_run(const char *, uint32_t run_len) { len += run_len; }
-  void put_escaped(const char *text, uint32_t text_len);
-  void put_number(double value);
-};
-
-struct text_writer {
-  char *at;
-
-  void put(char c) { *at++ = c; }
+  void put(char c) {
+    if (text != nullptr) text[len] = c;
+    ++len;
+  }
   void put_run(const char *run, uint32_t run_len) {
-    memcpy(at, run, run_len);
-    at += run_len;
-  }
-  void put_escaped(const char *text, uint32_t text_len);
-  void put_number(double value);
-};
-
-// The letter that stands for a character behind a backslash; 0 when it stands for itself.
-struct escape_letters {
-  char letters[256] = {};
-
-  constexpr escape_letters() {
-    const char pairs[] = "\"\"\\\\//\bb\ff\nn\rr\tt";
-    for (const char *at = pairs; *at != 0; at += 2) letters[static_cast<uint8_t>(at[0])] = at[1];
-  }
-};
-constexpr escape_letters kEscapes;
-
-}  // namespace
-
-static char escape_letter(char c) {
-  return kEscapes.letters[static_cast<uint8_t>(c)];
-}
-
-void text_counter::put_escaped(const char *text, uint32_t text_len) {
-  len += text_len;
-  for (uint32_t i = 0; i < text_len;) {
-    if (text_len - i >= 8 && not_plain(load_eight(text + i)) == 0) {
-      i += 8;
-      continue;
-    }
-    for (const uint32_t end = text_len - i >= 8 ? i + 8 : text_len; i < end; ++i) {
-      len += escape_letter(text[i]) != 0 ? 1 : 0;
-    }
-  }
-}
-
-void text_writer::put_escaped(const char *text, uint32_t text_len) {
-  for (uint32_t i = 0; i < text_len;) {
-    const uint32_t left = text_len - i;
-    if (left >= 8) {
-      const uint64_t word = load_eight(text + i);
-      if (not_plain(word) == 0) {
-        memcpy(at, &word, sizeof word);
-        at += sizeof word;
-        i += 8;
-        continue;
-      }
-    }
-    for (const uint32_t end = left >= 8 ? i + 8 : text_len; i < end; ++i) {
-      const char letter = escape_letter(text[i]);
-      if (letter != 0) *at++ = '\\';
-      *at++ = letter != 0 ? letter : text[i];
-    }
-  }
-}
-
-// ---- Numbers
-
-namespace {
-
-// Numbers are few: the same code counts and writes them. `at` is NULL where they are only counted.
-struct number_sink {
-  char *at;
-  uint32_t len = 0;
-
-  void put_run(const char *run, uint32_t run_len) {
-    if (at != nullptr) memcpy(at + len, run, run_len);
+    if (text != nullptr) memcpy(text + len, run, run_len);
     len += run_len;
   }
 };
 
 }  // namespace
+
+char escape_letter(char c) {
+  switch (c) {
+    case '"':
+    case '\\':
+    case '/':
+      return c;
+    case '\b':
+      return 'b';
+    case '\f':
+      return 'f';
+    case '\n':
+      return 'n';
+    case '\r':
+      return 'r';
+    case '\t':
+      return 't';
+    default:
+      return 0;
+  }
+}
+
+static void put_escaped(text_sink *out, const char *text, uint32_t len) {
+  for (uint32_t i = 0; i < len;) {
+    if (len - i >= 8 && not_plain(load_eight(text + i)) == 0) {
+      out->put_run(text + i, 8);
+      i += 8;
+      continue;
+    }
+    for (const uint32_t end = len - i >= 8 ? i + 8 : len; i < end; ++i) {
+      const char letter = escape_letter(text[i]);
+      if (letter != 0) out->put('\\');
+      out->put(letter != 0 ? letter : text[i]);
+    }
+  }
+}
+
+// ---- Numbers
 
 // `digits` ends at `end`; returns where it starts.
 static char *put_digits_before(char *end, uint64_t number, uint32_t min_digits) {
@@ -104,7 +69,7 @@ static char *put_digits_before(char *end, uint64_t number, uint32_t min_digits) 
   return end;
 }
 
-static void put_digits(number_sink *out, uint64_t number, uint32_t min_digits) {
+static void put_digits(text_sink *out, uint64_t number, uint32_t min_digits) {
   char digits[20];  // 2^64 has as many
   char *end = digits + sizeof digits;
   const char *start = put_digits_before(end, number, min_digits);
@@ -153,7 +118,7 @@ static uint32_t millionths(uint64_t fraction, int shift) {
   return quotient + (up ? 1 : 0);
 }
 
-static void put_fraction(number_sink *out, const binary_number &number) {
+static void put_fraction(text_sink *out, const binary_number &number) {
   const int shift = -number.exponent;
   uint64_t whole = shift < 64 ? number.mantissa >> shift : 0;
   const uint64_t fraction =
@@ -173,7 +138,7 @@ static constexpr uint32_t kMaxBillions = 35;  // limbs of 2^1024
 
 // An integer of 2^63 or more, exactly, and six zeros: limbs of nine digits, doubled as often as it
 // takes.
-static void put_large(number_sink *out, const binary_number &number) {
+static void put_large(text_sink *out, const binary_number &number) {
   uint32_t limbs[kMaxBillions] = {};
   uint32_t num_limbs = 0;
   for (uint64_t rest = number.mantissa; rest != 0; rest /= kBillion) {
@@ -194,7 +159,7 @@ static void put_large(number_sink *out, const binary_number &number) {
   out->put_run(".000000", 7);
 }
 
-static void put_decimal(number_sink *out, double value) {
+static void put_decimal(text_sink *out, double value) {
   constexpr double kInt64Limit = 9223372036854775808.0;
   const bool in_range = value >= -kInt64Limit && value < kInt64Limit;
   const bool integral = !in_range || static_cast<double>(static_cast<int64_t>(value)) == value;
@@ -209,34 +174,20 @@ static void put_decimal(number_sink *out, double value) {
   }
 }
 
-void text_counter::put_number(double value) {
-  number_sink digits = {nullptr};
-  put_decimal(&digits, value);
-  len += digits.len;
-}
-
-void text_writer::put_number(double value) {
-  number_sink digits = {at};
-  put_decimal(&digits, value);
-  at += digits.len;
-}
-
 // ---- Documents
 
-template <class Sink>
-static void put_string(Sink *out, const char *text, uint32_t len, bool plain) {
+static void put_string(text_sink *out, const char *text, uint32_t len, bool plain) {
   out->put('"');
   if (plain) {
     out->put_run(text, len);
   } else {
-    out->put_escaped(text, len);
+    put_escaped(out, text, len);
   }
   out->put('"');
 }
 
 // A whole value, of a container the opening bracket.
-template <class Sink>
-static void put_value(Sink *out, const JSON_Value *value) {
+static void put_value(text_sink *out, const JSON_Value *value) {
   switch (value->type) {
     case kJsonNull:
       return out->put_run("null", 4);
@@ -245,11 +196,13 @@ static void put_value(Sink *out, const JSON_Value *value) {
     case kJsonTrue:
       return out->put_run("true", 4);
     case kJsonNumber:
-      return out->put_number(value->number);
+      return put_decimal(out, value->number);
     case kJsonString:
       return put_string(out, value->text, value->count, (value->flags & kPlainText) != 0);
     case kJsonVerbatim:
       return out->put_run(value->text, static_cast<uint32_t>(strlen(value->text)));
+    case kJsonSlice:
+      return out->put_run(value->text, value->count);
     case kJsonArray:
       return out->put('[');
     case kJsonObject:
@@ -257,8 +210,7 @@ static void put_value(Sink *out, const JSON_Value *value) {
   }
 }
 
-template <class Sink>
-static void put_closing(Sink *out, const JSON_Value *container) {
+static void put_closing(text_sink *out, const JSON_Value *container) {
   out->put(container->type == kJsonArray ? ']' : '}');
 }
 
@@ -268,8 +220,7 @@ struct line_layout {
   bool pretty;
   uint32_t level = 0;
 
-  template <class Sink>
-  void new_line(Sink *out) const {
+  void new_line(text_sink *out) const {
     if (!pretty) return;
     out->put('\n');
     for (uint32_t i = 0; i < level; ++i) out->put_run("    ", 4);
@@ -278,16 +229,14 @@ struct line_layout {
 
 }  // namespace
 
-template <class Sink>
-static void put_name(Sink *out, const JSON_Value *member, const line_layout &layout) {
+static void put_name(text_sink *out, const JSON_Value *member, const line_layout &layout) {
   if (member->name == nullptr) return;
   put_string(out, member->name, name_len(member), (member->flags & kPlainName) != 0);
   out->put(':');
   if (layout.pretty) out->put(' ');
 }
 
-template <class Sink>
-static void put_document(Sink *out, const JSON_Value *root, bool pretty) {
+static void put_document(text_sink *out, const JSON_Value *root, bool pretty) {
   line_layout layout = {pretty};
   put_value(out, root);
   for (const JSON_Value *at = root;;) {
@@ -313,14 +262,14 @@ static void put_document(Sink *out, const JSON_Value *root, bool pretty) {
 
 static char *serialize(const JSON_Value *value, bool pretty) {
   if (value == nullptr) return nullptr;
-  text_counter counter;
-  put_document(&counter, value, pretty);
-  if (counter.len >= UINT32_MAX) return nullptr;
-  auto *text = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(counter.len) + 1));
+  text_sink out = {};
+  put_document(&out, value, pretty);
+  if (out.len >= UINT32_MAX) return nullptr;
+  auto *text = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(out.len) + 1));
   if (text == nullptr) return nullptr;
-  text_writer writer = {text};
-  put_document(&writer, value, pretty);
-  *writer.at = 0;
+  out = {text, 0};
+  put_document(&out, value, pretty);
+  text[out.len] = 0;
   return text;
 }
 

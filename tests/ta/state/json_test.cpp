@@ -83,6 +83,22 @@ TEST_F(Json, KeepsTexts) {
   }
 }
 
+TEST_F(Json, ASliceAnswersAsTheElementThatItIs) {
+  const std::string text =
+      R"(["a",{"a":"x"},{"b":{"a":"x"},"a":"\/\"\\\n"},{"b":"a","c":[{"a":"x"}]},{"a":["x"]},{}])";
+  const json_ptr kept(json_value_init_slices(text.c_str(), json_look_through(text.c_str()))),
+      read = parse(text);
+  for (const char *wanted : {"x", "/\"\\\n", "xy", "", static_cast<const char *>(nullptr)}) {
+    for (size_t i = 0; i < 6; ++i) {
+      EXPECT_EQ(json_array_match(json_value_get_array(kept.get()), i, "a", wanted),
+                json_array_match(json_value_get_array(read.get()), i, "a", wanted))
+          << i << (wanted ? wanted : " NULL");
+    }
+  }
+  EXPECT_EQ(json_array_match(json_value_get_array(kept.get()), 2, "a", "/\"\\\n"), kJsonSameText);
+  EXPECT_EQ(json_array_match(json_value_get_array(kept.get()), 3, "a", "x"), kJsonNoText);
+}
+
 TEST_F(Json, ParsesNumbers) {
   for (const std::string &c :
        words("0=0 -0=0 3735879681=3735879681 -12=-12 0.5=0.500000 -.5=-0.500000 1.=1 1e2=100 "
