@@ -15,6 +15,8 @@ TEST(DeviceJson, IsWrittenAsTheDeviceWritesIt) {
       {R"("\u00e9\ud83d\ude00")", "\"\xC3\xA9\xF0\x9F\x98\x80\""},
       {R"({"a/b":null})", R"({"a\/b":null})"},
       {"[3735879681,0,-1,3.0,0.5,true]", "[3735879681,0,-1,3,0.500000,true]"},
+      {"[18446744073709551615,1e2,12E1]", "[18446744073709551615,100,120]"},
+      {"\t{ \"a\" : 1 , \"b\":\n2,\"a\":[false]}\r", R"({"a":[false],"b":2})"},
   };
   for (const auto &[in, out] : kCases) {
     const std::optional<Json> value = parse_json(in);
@@ -24,7 +26,10 @@ TEST(DeviceJson, IsWrittenAsTheDeviceWritesIt) {
   }
   for (const std::string &text :
        {std::string("{"), std::string("{}x"), std::string(), std::string("\"\xFF\""),
-        std::string(100000, '['), "[" + std::string(64, '[') + std::string(65, ']')}) {
+        std::string(100000, '['), "[" + std::string(64, '[') + std::string(65, ']'),
+        std::string("[1,]"), std::string("[,1]"), std::string("[1 2]"), std::string("[01]"),
+        std::string("[truefalse]"), std::string("{,}"), std::string(R"({"a":1,})"),
+        std::string(R"({"a" 1})"), std::string("{1:1}"), std::string("\v1")}) {
     EXPECT_FALSE(parse_json(text)) << text.substr(0, 10);
   }
 }
