@@ -5,14 +5,15 @@
 #include <openssl/core_names.h>
 #include <openssl/crypto.h>
 #include <openssl/err.h>
-#include <openssl/hmac.h>
 #include <openssl/param_build.h>
 #include <openssl/pem.h>
 #include <openssl/rand.h>
 #include <openssl/rsa.h>
 
+#include <array>
 #include <climits>
 #include <cstdint>
+#include <mutex>
 #include <stdexcept>
 
 namespace tsm {
@@ -35,7 +36,9 @@ using BioPtr = std::unique_ptr<BIO, FreedBy<BIO_free_all>>;
 using BigNumber = std::unique_ptr<BIGNUM, FreedBy<BN_clear_free>>;
 using CipherContext = std::unique_ptr<EVP_CIPHER_CTX, FreedBy<EVP_CIPHER_CTX_free>>;
 using DigestContext = std::unique_ptr<EVP_MD_CTX, FreedBy<EVP_MD_CTX_free>>;
+using Key = std::unique_ptr<EVP_PKEY, FreedBy<EVP_PKEY_free>>;
 using KeyContext = std::unique_ptr<EVP_PKEY_CTX, FreedBy<EVP_PKEY_CTX_free>>;
+using MacContext = std::unique_ptr<EVP_MAC_CTX, FreedBy<EVP_MAC_CTX_free>>;
 using ParamBuilder = std::unique_ptr<OSSL_PARAM_BLD, FreedBy<OSSL_PARAM_BLD_free>>;
 using Params = std::unique_ptr<OSSL_PARAM, FreedBy<OSSL_PARAM_free>>;
 
@@ -114,6 +117,52 @@ bool have_usual_lengths(const PublicNumbers &numbers) {
          numbers.e.size() <= numbers.n.size();
 }
 
+// Algorithms are found once, and what is begun with them is copied: looking for them takes longer
+// than most of what they do here.
+
+const EVP_MD *sha256_algorithm() {
+  static const std::unique_ptr<EVP_MD, FreedBy<EVP_MD_free>> found(
+      EVP_MD_fetch(nullptr, "SHA256", nullptr));
+  require(found != nullptr, "no SHA-256");
+  return found.get();
+}
+
+const EVP_CIPHER *aes_cbc_algorithm() {
+  static const std::unique_ptr<EVP_CIPHER, FreedBy<EVP_CIPHER_free>> found(
+      EVP_CIPHER_fetch(nullptr, "AES-128-CBC", nullptr));
+  require(found != nullptr, "no AES-CBC");
+  return found.get();
+}
+
+MacContext begin_hmac_anew() {
+  const std::unique_ptr<EVP_MAC, FreedBy<EVP_MAC_free>> hmac(
+      EVP_MAC_fetch(nullptr, OSSL_MAC_NAME_HMAC, nullptr));
+  MacContext context(hmac == nullptr ? nullptr : EVP_MAC_CTX_new(hmac.get()));
+  char digest[] = "SHA256";
+  const OSSL_PARAM params[] = {OSSL_PARAM_construct_utf8_string(OSSL_MAC_PARAM_DIGEST, digest, 0),
+                               OSSL_PARAM_construct_end()};
+  require(context != nullptr && EVP_MAC_CTX_set_params(context.get(), params) == 1, "no HMAC");
+  return context;
+}
+
+MacContext begin_hmac() {
+  static const MacContext begun = begin_hmac_anew();
+  return MacContext(EVP_MAC_CTX_dup(begun.get()));
+}
+
+KeyContext begin_rsa_anew(EVP_PKEY *key, RsaKey::Operation operation) {
+  constexpr int (*kStarts[])(EVP_PKEY_CTX *) = {EVP_PKEY_sign_init, EVP_PKEY_verify_init,
+                                                EVP_PKEY_encrypt_init, EVP_PKEY_decrypt_init};
+  KeyContext context(EVP_PKEY_CTX_new(key, nullptr));
+  bool ok = context != nullptr && kStarts[static_cast<size_t>(operation)](context.get()) == 1 &&
+            EVP_PKEY_CTX_set_rsa_padding(context.get(), RSA_PKCS1_PADDING) == 1;
+  if (operation == RsaKey::Operation::kSign || operation == RsaKey::Operation::kVerify) {
+    ok = ok && EVP_PKEY_CTX_set_signature_md(context.get(), sha256_algorithm()) == 1;
+  }
+  require(ok, "cannot start an RSA operation");
+  return context;
+}
+
 /// A failed decryption or verification is an answer; a failed encryption is not.
 enum class Direction { kDecrypt = 0, kEncrypt = 1 };
 
@@ -171,28 +220,63 @@ std::optional<Bytes> gcm_open(std::string_view cek, std::string_view iv, std::st
 /// RFC 7518 section 5.2.2.1: the MAC key is the first half of the CEK, and AL counts bits.
 Bytes cbc_tag(std::string_view cek, std::string_view iv, std::string_view aad,
               std::string_view ciphertext) {
-  Bytes input = Bytes(aad) + Bytes(iv) + Bytes(ciphertext);
   const uint64_t num_bits = static_cast<uint64_t>(aad.size()) * 8;
-  for (int shift = 56; shift >= 0; shift -= 8) input += static_cast<char>(num_bits >> shift & 0xFF);
+  Bytes al;
+  for (int shift = 56; shift >= 0; shift -= 8) al += static_cast<char>(num_bits >> shift & 0xFF);
 
+  const MacContext context = begin_hmac();
   Bytes mac(EVP_MAX_MD_SIZE, '\0');
-  unsigned mac_len = 0;
-  require(HMAC(EVP_sha256(), cek.data(), kAesKeyLen, in(input), input.size(), out(mac), &mac_len) !=
-              nullptr,
-          "HMAC failed");
+  size_t mac_len = 0;
+  bool ok = context != nullptr && EVP_MAC_init(context.get(), in(cek), kAesKeyLen, nullptr) == 1;
+  for (const std::string_view part : {aad, iv, ciphertext, std::string_view(al)}) {
+    ok = ok && EVP_MAC_update(context.get(), in(part), part.size()) == 1;
+  }
+  require(ok && EVP_MAC_final(context.get(), out(mac), &mac_len, mac.size()) == 1, "HMAC failed");
   mac.resize(kTagLen);
   return mac;
 }
 
-KeyContext start_rsa(const RsaKey &key, int (*start)(EVP_PKEY_CTX *)) {
-  KeyContext context(EVP_PKEY_CTX_new(key.get(), nullptr));
-  require(context != nullptr && start(context.get()) == 1 &&
-              EVP_PKEY_CTX_set_rsa_padding(context.get(), RSA_PKCS1_PADDING) == 1,
-          "cannot start an RSA operation");
-  return context;
+Bytes sha256_of(std::initializer_list<std::string_view> parts) {
+  const DigestContext context(EVP_MD_CTX_new());
+  Bytes digest(EVP_MAX_MD_SIZE, '\0');
+  unsigned len = 0;
+  bool ok =
+      context != nullptr && EVP_DigestInit_ex2(context.get(), sha256_algorithm(), nullptr) == 1;
+  for (const std::string_view part : parts) {
+    ok = ok && EVP_DigestUpdate(context.get(), part.data(), part.size()) == 1;
+  }
+  require(ok && EVP_DigestFinal_ex(context.get(), out(digest), &len) == 1, "SHA-256 failed");
+  digest.resize(len);
+  return digest;
 }
 
 }  // namespace
+
+struct RsaKey::Shared {
+  explicit Shared(EVP_PKEY *owned) : key(owned) {}
+
+  struct Begun {
+    std::once_flag once;
+    KeyContext context;
+  };
+
+  const Key key;
+  std::array<Begun, 4> begun;  // by Operation, when it is first needed
+};
+
+RsaKey::RsaKey(EVP_PKEY *key) : shared_(std::make_shared<Shared>(key)) {}
+
+EVP_PKEY *RsaKey::get() const {
+  return shared_->key.get();
+}
+
+EVP_PKEY_CTX *RsaKey::begin(Operation operation) const {
+  Shared::Begun &begun = shared_->begun[static_cast<size_t>(operation)];
+  std::call_once(begun.once, [&] { begun.context = begin_rsa_anew(get(), operation); });
+  EVP_PKEY_CTX *context = EVP_PKEY_CTX_dup(begun.context.get());
+  require(context != nullptr, "cannot start an RSA operation");
+  return context;
+}
 
 RsaKey RsaKey::generate(int num_bits) {
   EVP_PKEY *key = EVP_RSA_gen(static_cast<unsigned>(num_bits));
@@ -300,12 +384,7 @@ Bytes random_bytes(size_t len) {
 }
 
 Bytes sha256(std::string_view data) {
-  Bytes digest(EVP_MAX_MD_SIZE, '\0');
-  unsigned len = 0;
-  require(EVP_Digest(data.data(), data.size(), out(digest), &len, EVP_sha256(), nullptr) == 1,
-          "SHA-256 failed");
-  digest.resize(len);
-  return digest;
+  return sha256_of({data});
 }
 
 bool same_secret(std::string_view a, std::string_view b) {
@@ -318,31 +397,27 @@ Bytes rs256_sign(const RsaKey &key, std::string_view data) {
 }
 
 Bytes rs256_sign(const RsaKey &key, std::initializer_list<std::string_view> parts) {
-  const DigestContext context(EVP_MD_CTX_new());
+  const Bytes digest = sha256_of(parts);
+  const KeyContext context(key.begin(RsaKey::Operation::kSign));
   Bytes signature(key.modulus_len(), '\0');
   size_t len = signature.size();
-  bool ok = context != nullptr &&
-            EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, key.get()) == 1;
-  for (const std::string_view part : parts) {
-    ok = ok && EVP_DigestSignUpdate(context.get(), part.data(), part.size()) == 1;
-  }
-  require(ok && EVP_DigestSignFinal(context.get(), out(signature), &len) == 1, "cannot sign");
+  require(EVP_PKEY_sign(context.get(), out(signature), &len, in(digest), digest.size()) == 1,
+          "cannot sign");
   signature.resize(len);
   return signature;
 }
 
 bool rs256_verify(const RsaKey &key, std::string_view data, std::string_view signature) {
-  const DigestContext context(EVP_MD_CTX_new());
-  require(context != nullptr, "no memory");
-  const bool verified =
-      EVP_DigestVerifyInit(context.get(), nullptr, EVP_sha256(), nullptr, key.get()) == 1 &&
-      EVP_DigestVerify(context.get(), in(signature), signature.size(), in(data), data.size()) == 1;
+  const Bytes digest = sha256(data);
+  const KeyContext context(key.begin(RsaKey::Operation::kVerify));
+  const bool verified = EVP_PKEY_verify(context.get(), in(signature), signature.size(), in(digest),
+                                        digest.size()) == 1;
   if (!verified) ERR_clear_error();
   return verified;
 }
 
 Bytes rsa1_5_encrypt(const RsaKey &key, std::string_view data) {
-  const KeyContext context = start_rsa(key, EVP_PKEY_encrypt_init);
+  const KeyContext context(key.begin(RsaKey::Operation::kEncrypt));
   Bytes encrypted(key.modulus_len(), '\0');
   size_t len = encrypted.size();
   require(EVP_PKEY_encrypt(context.get(), out(encrypted), &len, in(data), data.size()) == 1,
@@ -352,7 +427,7 @@ Bytes rsa1_5_encrypt(const RsaKey &key, std::string_view data) {
 }
 
 std::optional<Bytes> rsa1_5_decrypt(const RsaKey &key, std::string_view data) {
-  const KeyContext context = start_rsa(key, EVP_PKEY_decrypt_init);
+  const KeyContext context(key.begin(RsaKey::Operation::kDecrypt));
   Bytes decrypted(key.modulus_len(), '\0');
   size_t len = decrypted.size();
   if (EVP_PKEY_decrypt(context.get(), out(decrypted), &len, in(data), data.size()) != 1) {
@@ -363,7 +438,7 @@ std::optional<Bytes> rsa1_5_decrypt(const RsaKey &key, std::string_view data) {
 }
 
 Bytes aes_cbc_encrypt(std::string_view key, std::string_view iv, std::string_view plaintext) {
-  const CipherContext context = start_cipher(EVP_aes_128_cbc(), key, iv, Direction::kEncrypt);
+  const CipherContext context = start_cipher(aes_cbc_algorithm(), key, iv, Direction::kEncrypt);
   std::optional<Bytes> ciphertext = run_cipher(context.get(), plaintext);
   require(ciphertext.has_value(), "AES-CBC failed");
   return std::move(*ciphertext);
@@ -372,7 +447,7 @@ Bytes aes_cbc_encrypt(std::string_view key, std::string_view iv, std::string_vie
 std::optional<Bytes> aes_cbc_decrypt(std::string_view key, std::string_view iv,
                                      std::string_view ciphertext) {
   if (key.size() != kAesKeyLen || iv.size() != kCbcIvLen) return std::nullopt;
-  const CipherContext context = start_cipher(EVP_aes_128_cbc(), key, iv, Direction::kDecrypt);
+  const CipherContext context = start_cipher(aes_cbc_algorithm(), key, iv, Direction::kDecrypt);
   return run_cipher(context.get(), ciphertext);
 }
 

@@ -52,12 +52,18 @@ class RsaKey {
   /// The first 16 hex digits of the SHA-256 digest of the encoded form: a name for people.
   std::string fingerprint() const;
 
-  EVP_PKEY *get() const { return key_.get(); }
+  EVP_PKEY *get() const;
+
+  /// With the padding of PKCS#1 v1.5; signatures are of SHA-256 digests.
+  enum class Operation { kSign, kVerify, kEncrypt, kDecrypt };
+  /// Begun, and the caller's to free.
+  EVP_PKEY_CTX *begin(Operation operation) const;
 
  private:
-  explicit RsaKey(EVP_PKEY *key) : key_(key, EVP_PKEY_free) {}
+  struct Shared;
+  explicit RsaKey(EVP_PKEY *key);
 
-  std::shared_ptr<EVP_PKEY> key_;
+  std::shared_ptr<Shared> shared_;
 };
 
 Bytes random_bytes(size_t len);
