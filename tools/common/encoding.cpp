@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -41,16 +42,24 @@ constexpr DigitPairs kBase64Pairs = pairs_of(kBase64);
 constexpr DigitPairs kBase64UrlPairs = pairs_of(kBase64Url);
 
 /// Up to three bytes, as one number.
-uint32_t number_of(std::string_view bytes) {
-  uint32_t bits = 0;
+uint64_t number_of(std::string_view bytes) {
+  uint64_t bits = 0;
   for (size_t i = 0; i < 3; ++i) {
     bits = bits << 8 | (i < bytes.size() ? static_cast<uint8_t>(bytes[i]) : 0u);
   }
   return bits;
 }
 
-void put_digits(uint32_t bits, const DigitPairs &pairs, char *out) {
-  memcpy(out, pairs[bits >> 12].data(), 2);
+/// Six bytes, as one number; reads two more.
+uint64_t number_of_six(const char *bytes) {
+  uint64_t bits = 0;
+  memcpy(&bits, bytes, sizeof(bits));
+  if constexpr (std::endian::native == std::endian::little) bits = __builtin_bswap64(bits);
+  return bits >> 16;
+}
+
+void put_digits(uint64_t bits, const DigitPairs &pairs, char *out) {
+  memcpy(out, pairs[bits >> 12 & 0xFFF].data(), 2);
   memcpy(out + 2, pairs[bits & 0xFFF].data(), 2);
 }
 
@@ -58,11 +67,15 @@ void append(std::string_view bytes, const DigitPairs &pairs, std::string *text) 
   const size_t start = text->size();
   text->resize(start + (bytes.size() + 2) / 3 * 4);
   char *out = text->data() + start;
-  const size_t whole = bytes.size() / 3 * 3;
-  for (size_t at = 0; at < whole; at += 3, out += 4) {
-    put_digits(number_of({bytes.data() + at, 3}), pairs, out);
+  size_t at = 0;
+  for (; at + sizeof(uint64_t) <= bytes.size(); at += 6, out += 8) {
+    const uint64_t bits = number_of_six(bytes.data() + at);
+    put_digits(bits >> 24, pairs, out);
+    put_digits(bits, pairs, out + 4);
   }
-  if (whole < bytes.size()) put_digits(number_of(bytes.substr(whole)), pairs, out);
+  for (; at < bytes.size(); at += 3, out += 4) {
+    put_digits(number_of(bytes.substr(at)), pairs, out);
+  }
   text->resize(start + (bytes.size() * 4 + 2) / 3);
 }
 
