@@ -22,16 +22,33 @@ void Connection::prepare() {
        use(d.device_id, "device_id"), into(d.key), into(d.group), into(d.plan), into(standing_),
        into(version_), into(d.state), into(d.progress), into(d.outcome), into(d.outcome_plan),
        into(d.reason), into(seen_), into(d.open_message), into(d.open_request), into(deadline_)));
+  // An index that a statement names a column of is written by SQLite, changed or not. In the midst
+  // of a session it does not change.
+  if (sql.get_backend_name() == "sqlite3") {
+    update_in_place_ = std::make_unique<soci::statement>(
+        (sql.prepare << "UPDATE devices SET version = version + 1, state = :state, "
+                        "progress = :progress, reason = :reason, seen = :seen, "
+                        "open_message = :open_message, open_request = :open_request, "
+                        "deadline = :deadline WHERE device_id = :device_id AND "
+                        "version = :version AND outcome = :outcome AND "
+                        "outcome_plan = :outcome_plan AND waits = :waits",
+         use(d.state, "state"), use(d.progress, "progress"), use(d.reason, "reason"),
+         use(seen_, "seen"), use(d.open_message, "open_message"),
+         use(d.open_request, "open_request"), use(deadline_, "deadline"),
+         use(d.device_id, "device_id"), use(version_, "version"), use(d.outcome, "outcome"),
+         use(d.outcome_plan, "outcome_plan"), use(waits_, "waits")));
+  }
   update_ = std::make_unique<soci::statement>(
       (sql.prepare << "UPDATE devices SET version = version + 1, state = :state, "
                       "progress = :progress, outcome = :outcome, outcome_plan = :outcome_plan, "
                       "reason = :reason, seen = :seen, open_message = :open_message, "
-                      "open_request = :open_request, deadline = :deadline "
-                      "WHERE device_id = :device_id AND version = :version",
+                      "open_request = :open_request, deadline = :deadline, "
+                      "waits = :waits WHERE device_id = :device_id AND version = :version",
        use(d.state, "state"), use(d.progress, "progress"), use(d.outcome, "outcome"),
        use(d.outcome_plan, "outcome_plan"), use(d.reason, "reason"), use(seen_, "seen"),
        use(d.open_message, "open_message"), use(d.open_request, "open_request"),
-       use(deadline_, "deadline"), use(d.device_id, "device_id"), use(version_, "version")));
+       use(deadline_, "deadline"), use(waits_, "waits"), use(d.device_id, "device_id"),
+       use(version_, "version")));
   insert_ = std::make_unique<soci::statement>(
       (sql.prepare << "INSERT INTO events (device_id, number, time, message, outcome, reason, "
                       "next_message) VALUES (:device_id, :number, :time, :message, :outcome, "
@@ -81,6 +98,11 @@ bool Connection::update(const StoredDevice &device) {
   version_ = device.version;
   seen_ = device.seen;
   deadline_ = device.deadline;
+  waits_ = device.deadline > 0 ? 1 : 0;
+  if (update_in_place_) {
+    update_in_place_->execute(true);
+    if (update_in_place_->get_affected_rows() == 1) return true;
+  }
   update_->execute(true);
   return update_->get_affected_rows() == 1;
 }

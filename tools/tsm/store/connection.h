@@ -48,6 +48,7 @@ class Connection {
   StoredDevice device_;
   Event event_;
   int standing_ = 0;
+  int waits_ = 0;
   long long version_ = 0;
   long long number_ = 0;
   long long seen_ = 0;
@@ -56,6 +57,7 @@ class Connection {
   std::unique_ptr<soci::statement> begin_;
   std::unique_ptr<soci::statement> commit_;
   std::unique_ptr<soci::statement> find_;
+  std::unique_ptr<soci::statement> update_in_place_;  // NULL: the database needs none
   std::unique_ptr<soci::statement> update_;
   std::unique_ptr<soci::statement> insert_;
   std::unique_ptr<soci::statement> prune_;

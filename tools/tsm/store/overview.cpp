@@ -112,8 +112,9 @@ uint64_t Store::count_open(int64_t now) {
   return database_->with([&](Connection &connection) {
     long long num = 0;
     long long after = now;
-    connection.sql << "SELECT COUNT(*) FROM devices WHERE deadline > :now", use(after, "now"),
-        into(num);
+    connection.sql << "SELECT COUNT(*) FROM devices WHERE deadline > :now AND device_id IN "
+                      "(SELECT device_id FROM devices WHERE waits = 1)",
+        use(after, "now"), into(num);
     return static_cast<uint64_t>(num);
   });
 }

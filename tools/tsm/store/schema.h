@@ -5,7 +5,7 @@
 
 namespace tsm {
 
-constexpr int kSchemaFormat = 2;
+constexpr int kSchemaFormat = 3;
 
 constexpr char kFormatTable[] =
     "CREATE TABLE IF NOT EXISTS store_format ("
@@ -35,19 +35,18 @@ constexpr const char *kSchema[] = {
     "  outcome_plan TEXT NOT NULL DEFAULT '',"
     "  seen BIGINT NOT NULL DEFAULT 0,"
     "  deadline BIGINT NOT NULL DEFAULT 0,"
+    "  waits INTEGER NOT NULL DEFAULT 0,"  // 1 with a deadline
     "  open_message TEXT NOT NULL DEFAULT '',"
     "  open_request TEXT NOT NULL DEFAULT '',"
     "  reason TEXT NOT NULL DEFAULT '',"
     "  progress TEXT NOT NULL DEFAULT '',"
     "  state TEXT NOT NULL DEFAULT '')",
 
-    // For counting and looking through all: neither reads a row of a device. There is one such
-    // index, since each exchange has to write it.
+    // For counting and looking through all: neither reads a row of a device, but of those whose
+    // message waits. There is one such index, and in it nothing that changes with each exchange,
+    // which would have to write it.
     "CREATE INDEX IF NOT EXISTS devices_at_a_glance"
-    "  ON devices (device_id, device_group, outcome, outcome_plan, deadline)",
-    // A store may have them from before.
-    "DROP INDEX IF EXISTS devices_to_look_through",
-    "DROP INDEX IF EXISTS devices_that_owe",
+    "  ON devices (device_id, device_group, outcome, outcome_plan, waits)",
 
     "CREATE TABLE IF NOT EXISTS history ("
     "  time BIGINT PRIMARY KEY,"
