@@ -13,6 +13,8 @@
 #include <array>
 #include <climits>
 #include <cstdint>
+#include <deque>
+#include <map>
 #include <mutex>
 #include <stdexcept>
 
@@ -163,6 +165,33 @@ KeyContext begin_rsa_anew(EVP_PKEY *key, RsaKey::Operation operation) {
   return context;
 }
 
+/// The keys that were made last, by their encoded forms. For any number of threads.
+class KeyShelf {
+ public:
+  std::optional<RsaKey> find(std::string_view encoded) {
+    const std::lock_guard guard(lock_);
+    const auto found = keys_.find(encoded);
+    return found == keys_.end() ? std::nullopt : std::optional(found->second);
+  }
+
+  void put(std::string_view encoded, const RsaKey &key) {
+    const std::lock_guard guard(lock_);
+    const auto [at, is_new] = keys_.emplace(encoded, key);
+    if (is_new) by_age_.push_back(at);
+    if (by_age_.size() <= kNumKeys) return;
+    keys_.erase(by_age_.front());
+    by_age_.pop_front();
+  }
+
+ private:
+  static constexpr size_t kNumKeys = 512;  // of some 5 KB each
+  using Keys = std::map<Bytes, RsaKey, std::less<>>;
+
+  std::mutex lock_;  // of all below
+  Keys keys_;
+  std::deque<Keys::iterator> by_age_;  // the oldest first
+};
+
 /// A failed decryption or verification is an answer; a failed encryption is not.
 enum class Direction { kDecrypt = 0, kEncrypt = 1 };
 
@@ -306,8 +335,13 @@ bool RsaKey::is_encoded(std::string_view encoded) {
 }
 
 std::optional<RsaKey> RsaKey::from_encoded(std::string_view encoded) {
+  static KeyShelf &shelf = *new KeyShelf;  // for ever: OpenSSL may be gone before what is static
+  std::optional<RsaKey> key = shelf.find(encoded);
+  if (key) return key;
   const std::optional<PublicNumbers> numbers = take_apart(encoded);
-  return numbers ? from_numbers(numbers->n, numbers->e) : std::nullopt;
+  if (numbers) key = from_numbers(numbers->n, numbers->e);
+  if (key) shelf.put(encoded, *key);
+  return key;
 }
 
 std::optional<RsaKey> RsaKey::from_numbers(std::string_view n, std::string_view e,

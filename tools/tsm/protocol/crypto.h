@@ -37,6 +37,7 @@ class RsaKey {
  public:
   static RsaKey generate(int num_bits = 2048);
   static std::optional<RsaKey> from_pem(std::string_view pem);  // private or public
+  /// Of keys that were made last, the same key: to make one takes as long as to use it.
   static std::optional<RsaKey> from_encoded(std::string_view encoded);
   static bool is_encoded(std::string_view encoded);  // without making the key
   /// Big-endian numbers; an empty `d` makes a public key.

@@ -39,6 +39,12 @@ const Json &members_of(const Message &message, const Json &payload) {
   return *members;
 }
 
+Json take_members(const Message &message, Json payload) {
+  (void)members_of(message, payload);
+  return message.tbs_response.empty() ? std::move(payload)
+                                      : std::move(payload[std::string(message.tbs_response)]);
+}
+
 RsaKey key_for(const Envelope &envelope, const ResponseKeys &keys) {
   if (envelope.message->id != MessageId::kGetTaInfo) return keys.tee_key;
   if (keys.dsi == nullptr) {
@@ -121,7 +127,7 @@ Response open_response(Envelope envelope, const ResponseKeys &keys) {
   Response response = {.message = envelope.message,
                        .payload_text = std::move(envelope.payload_text),
                        .header = std::move(envelope.header),
-                       .members = members_of(*envelope.message, envelope.payload)};
+                       .members = take_members(*envelope.message, std::move(envelope.payload))};
   if (response.message->id == MessageId::kGetTaInfo) return response;
   if (response.message->id == MessageId::kGetDeviceState) {
     decrypt_member("edsi", keys, &response);

@@ -43,7 +43,7 @@ DoorAnswer Door::post(const std::string &device_id, const std::string &body) {
 
 DoorAnswer Door::serve(StoredDevice row, const std::string &body) {
   const std::shared_ptr<const Plan> plan = plans_.find(row.plan);
-  Visit visit(tsm_, &keys_, std::move(row), seconds_now());
+  Visit visit(tsm_, std::move(row), seconds_now());
   if (body.empty()) {
     visit.begin();
   } else {

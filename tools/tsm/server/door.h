@@ -7,7 +7,6 @@
 #include <string>
 
 #include "tsm/protocol/parties.h"
-#include "tsm/server/key_shelf.h"
 #include "tsm/server/plan_shelf.h"
 #include "tsm/store/store.h"
 
@@ -43,7 +42,6 @@ class Door {
   const Identity &tsm_;
   Store *store_;
   PlanShelf plans_;
-  KeyShelf keys_;
   std::chrono::seconds time_to_answer_;
 };
 

@@ -29,6 +29,13 @@ SentRequest sent_request(const Order &order) {
   return sent;
 }
 
+DeviceInfo stored_device(const StoredDevice &row) {
+  const std::optional<Bytes> encoded = base64url_decode(row.key);
+  const std::optional<RsaKey> key = encoded ? RsaKey::from_encoded(*encoded) : std::nullopt;
+  if (!key) throw std::runtime_error("the stored key of device " + row.device_id + " is damaged");
+  return {row.device_id, *key};
+}
+
 Envelope envelope_of(const std::string &body) {
   try {
     return parse_envelope(body);
@@ -39,8 +46,8 @@ Envelope envelope_of(const std::string &body) {
 
 }  // namespace
 
-Visit::Visit(const Identity &tsm, KeyShelf *keys, StoredDevice row, int64_t now)
-    : tsm_(tsm), keys_(keys), row_(std::move(row)), now_(now), progress_(stored_progress(row_)) {
+Visit::Visit(const Identity &tsm, StoredDevice row, int64_t now)
+    : tsm_(tsm), row_(std::move(row)), now_(now), progress_(stored_progress(row_)) {
   row_.seen = now;
   event_.time = now;
 }
@@ -57,7 +64,7 @@ void Visit::begin() {
 }
 
 const DeviceInfo &Visit::device() {
-  if (!device_) device_ = keys_->device(row_);
+  if (!device_) device_ = stored_device(row_);
   return *device_;
 }
 

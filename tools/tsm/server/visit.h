@@ -16,7 +16,6 @@
 #include "tsm/plan/decision.h"
 #include "tsm/protocol/parties.h"
 #include "tsm/protocol/waiting.h"
-#include "tsm/server/key_shelf.h"
 #include "tsm/store/store.h"
 
 namespace tsm {
@@ -38,7 +37,7 @@ class Refusal : public std::runtime_error {
 class Visit {
  public:
   /// `tsm` and `keys` must live longer.
-  Visit(const Identity &tsm, KeyShelf *keys, StoredDevice row, int64_t now);
+  Visit(const Identity &tsm, StoredDevice row, int64_t now);
 
   /// The device asks whether there is something to do: a session begins, and a message that still
   /// waits for its answer gets none any more.
@@ -65,7 +64,6 @@ class Visit {
   std::string send(Order order);
 
   const Identity &tsm_;
-  KeyShelf *keys_;
   StoredDevice row_;
   int64_t now_;
   Progress progress_;

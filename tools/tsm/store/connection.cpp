@@ -82,7 +82,7 @@ void Connection::Transaction::commit() {
 bool Connection::find(const std::string &device_id, StoredDevice *device) {
   device_.device_id = device_id;
   if (!find_->execute(true)) return false;
-  *device = device_;
+  *device = std::move(device_);
   device->standing = static_cast<Standing>(standing_);
   device->version = version_;
   device->seen = seen_;
