@@ -17,15 +17,15 @@ constexpr size_t kWordWidth = 12;
 constexpr size_t kNameWidth = 14;
 constexpr char kPlain[] = "\x1b[0m";
 
-Look look_of(Outcome outcome) {
-  switch (outcome) {
-    case Outcome::kVerified:
+Look look_of(Verdict verdict) {
+  switch (verdict) {
+    case Verdict::kVerified:
       return {"verified", "\x1b[32m"};
-    case Outcome::kFailed:
+    case Verdict::kFailed:
       return {"FAILED", "\x1b[31;1m"};
-    case Outcome::kNotChecked:
+    case Verdict::kNotChecked:
       return {"not checked", "\x1b[33m"};
-    case Outcome::kFact:
+    case Verdict::kFact:
       break;
   }
   return {"", ""};
@@ -37,7 +37,7 @@ std::string padded(std::string text, size_t width) {
 }
 
 std::string finding_line(const Finding &finding, bool has_colours) {
-  const Look look = look_of(finding.outcome);
+  const Look look = look_of(finding.verdict);
   const std::string word = padded(look.word, kWordWidth);
   const bool is_coloured = has_colours && *look.colour != '\0';
   return "  " + (is_coloured ? look.colour + word + kPlain : word) +
@@ -46,17 +46,17 @@ std::string finding_line(const Finding &finding, bool has_colours) {
 
 Json finding_json(const Finding &finding) {
   Json json = {{"name", finding.name}};
-  if (finding.outcome != Outcome::kFact) json["check"] = look_of(finding.outcome).word;
+  if (finding.verdict != Verdict::kFact) json["check"] = look_of(finding.verdict).word;
   json["text"] = finding.text;
   return json;
 }
 
 }  // namespace
 
-void Report::add(Outcome outcome, std::string_view name, std::string_view text) {
+void Report::add(Verdict verdict, std::string_view name, std::string_view text) {
   if (sections_.empty()) begin("");
-  sections_.back().findings.push_back({outcome, std::string(name), std::string(text)});
-  has_failure_ = has_failure_ || outcome == Outcome::kFailed;
+  sections_.back().findings.push_back({verdict, std::string(name), std::string(text)});
+  has_failure_ = has_failure_ || verdict == Verdict::kFailed;
 }
 
 std::string report_text(const Report &report, bool has_colours) {

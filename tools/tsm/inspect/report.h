@@ -11,10 +11,10 @@
 
 namespace tsm {
 
-enum class Outcome { kFact, kVerified, kFailed, kNotChecked };
+enum class Verdict { kFact, kVerified, kFailed, kNotChecked };
 
 struct Finding {
-  Outcome outcome;
+  Verdict verdict;
   std::string name;
   std::string text;  // of a failure the reason, of what was not checked what is needed for it
 };
@@ -27,20 +27,20 @@ struct Section {
 class Report {
  public:
   void begin(std::string title) { sections_.push_back({std::move(title)}); }
-  void fact(std::string_view name, std::string_view text) { add(Outcome::kFact, name, text); }
+  void fact(std::string_view name, std::string_view text) { add(Verdict::kFact, name, text); }
   void verified(std::string_view name, std::string_view text) {
-    add(Outcome::kVerified, name, text);
+    add(Verdict::kVerified, name, text);
   }
-  void failed(std::string_view name, std::string_view text) { add(Outcome::kFailed, name, text); }
+  void failed(std::string_view name, std::string_view text) { add(Verdict::kFailed, name, text); }
   void not_checked(std::string_view name, std::string_view text) {
-    add(Outcome::kNotChecked, name, text);
+    add(Verdict::kNotChecked, name, text);
   }
 
   const std::vector<Section> &sections() const { return sections_; }
   bool has_failure() const { return has_failure_; }
 
  private:
-  void add(Outcome outcome, std::string_view name, std::string_view text);
+  void add(Verdict verdict, std::string_view name, std::string_view text);
 
   std::vector<Section> sections_;
   bool has_failure_ = false;
