@@ -11,7 +11,7 @@
 namespace bench {
 namespace {
 
-void require(bool passed, const JoseLibrary &library, const char *what) {
+void demand(bool passed, const JoseLibrary &library, const char *what) {
   if (!passed) throw std::runtime_error(std::string(library.name) + " did not " + what);
 }
 
@@ -47,34 +47,34 @@ RsaNumbers numbers_of(const tsm::RsaKey &key, bool with_primes) {
 
 Rival::Rival(const JoseLibrary &library, const RsaNumbers &numbers)
     : library_(library), key_(library.make_key(numbers)) {
-  require(key_ != nullptr, library, "take a key");
+  demand(key_ != nullptr, library, "take a key");
   stored_ = library.store_public_key(key_);
 }
 
 void Rival::verify(const std::string &compact, size_t payload_len) const {
-  require(library_.verify(compact, key_) == payload_len, library_, "verify a message");
+  demand(library_.verify(compact, key_) == payload_len, library_, "verify a message");
 }
 
 void Rival::verify_with_stored_key(const std::string &compact, size_t payload_len) const {
   void *loaded = library_.load_key(stored_);
-  require(library_.verify(compact, loaded) == payload_len, library_, "verify a message");
+  demand(library_.verify(compact, loaded) == payload_len, library_, "verify a message");
   library_.free_key(loaded);
 }
 
 std::string Rival::sign(const std::string &payload) const {
   std::string compact = library_.sign(payload, key_);
-  require(!compact.empty(), library_, "sign a message");
+  demand(!compact.empty(), library_, "sign a message");
   return compact;
 }
 
 std::string Rival::encrypt(const std::string &plain) const {
   std::string compact = library_.encrypt(plain, key_);
-  require(!compact.empty(), library_, "encrypt a text");
+  demand(!compact.empty(), library_, "encrypt a text");
   return compact;
 }
 
 void Rival::decrypt(const std::string &compact, size_t plain_len) const {
-  require(library_.decrypt(compact, key_) == plain_len, library_, "decrypt a text");
+  demand(library_.decrypt(compact, key_) == plain_len, library_, "decrypt a text");
 }
 
 Work same_work(const JoseLibrary &library, const JoseParts &parts) {

@@ -12,7 +12,7 @@ namespace {
 
 using enum tee::test::Fault;
 
-const FaultKind kKinds[] = {
+const FaultKind kStartKinds[] = {
     {"Allocation", kAllocation},
     {"Storage", kStorage},
     {"Crypto", kCrypto},
@@ -63,7 +63,7 @@ class FirstStart : public testing::Test {
 };
 
 TEST_F(FirstStart, MayFailAnywhere) {
-  for (const FaultKind &kind : kKinds) {
+  for (const FaultKind &kind : kStartKinds) {
     SCOPED_TRACE(kind.name);
     unsigned num_points = 0;
     for (const TEE_UUID &ta : {kCorvelUuid, kAgentUuid}) {

@@ -26,7 +26,7 @@ using std::chrono::milliseconds;
 constexpr uint32_t kMaxReplyLen = 1u << 30;
 constexpr uint32_t kMaxMessages = 1'000'000;
 constexpr uint32_t kMaxRetries = 1'000;
-constexpr uint32_t kMaxSeconds = 10 * 365 * 86'400u;
+constexpr uint32_t kMaxInterval = 10 * 365 * 86'400u;
 constexpr uint32_t kMaxMilliseconds = 86'400'000;
 
 // ---- The agent
@@ -134,7 +134,7 @@ uint32_t number(const char *name, const std::string &text, uint32_t fallback, ui
 
 milliseconds seconds(const char *name, const std::string &text, milliseconds fallback) {
   const auto whole = static_cast<uint32_t>(fallback.count() / 1000);
-  return std::chrono::seconds(number(name, text, whole, 1, kMaxSeconds));
+  return std::chrono::seconds(number(name, text, whole, 1, kMaxInterval));
 }
 
 http::ClientOptions client_options(const ConnectArguments &arguments) {

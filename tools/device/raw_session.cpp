@@ -13,14 +13,14 @@ namespace {
 
 using tools::UsageError;
 
-constexpr std::string_view kBlanks = " \t\r";  // a carriage return ends lines of other systems
+constexpr std::string_view kGaps = " \t\r";  // a carriage return ends lines of other systems
 
 std::vector<std::string_view> split(std::string_view line) {
   std::vector<std::string_view> fields;
   for (;;) {
-    line.remove_prefix(std::min(line.find_first_not_of(kBlanks), line.size()));
+    line.remove_prefix(std::min(line.find_first_not_of(kGaps), line.size()));
     if (line.empty()) return fields;
-    fields.push_back(line.substr(0, line.find_first_of(kBlanks)));
+    fields.push_back(line.substr(0, line.find_first_of(kGaps)));
     line.remove_prefix(fields.back().size());
   }
 }

@@ -17,7 +17,7 @@ namespace {
 constexpr uint32_t kMaxServedLen = 1u << 30;  // what a request and its answer can have at once
 constexpr uint32_t kMaxHeaderLen = 1u << 20;
 constexpr uint32_t kMaxConnections = 100'000;
-constexpr uint32_t kMaxSeconds = 86'400;
+constexpr uint32_t kMaxTimeLimit = 86'400;
 
 /// What stands there is kept unless the command line says otherwise.
 template <class Value>
@@ -42,9 +42,9 @@ http::ServerOptions server_options(const ServeArguments &arguments) {
              options.max_connections);
   set_number("--max-per-address", arguments.max_per_address, kMaxConnections,
              options.max_connections_per_address);
-  set_number("--request-time", arguments.request_time, kMaxSeconds, options.request_time);
-  set_number("--answer-time", arguments.answer_time, kMaxSeconds, options.answer_time);
-  set_number("--idle-time", arguments.idle_time, kMaxSeconds, options.idle_time);
+  set_number("--request-time", arguments.request_time, kMaxTimeLimit, options.request_time);
+  set_number("--answer-time", arguments.answer_time, kMaxTimeLimit, options.answer_time);
+  set_number("--idle-time", arguments.idle_time, kMaxTimeLimit, options.idle_time);
   if (arguments.log == "json") {
     options.log = [](const http::LogEntry &entry) {
       fprintf(stderr, "%s\n", http::log_json(entry).c_str());

@@ -20,7 +20,7 @@ namespace {
 
 using tools::UsageError;
 
-constexpr char kProgram[] = "otrp-tsm";
+constexpr char kServerName[] = "otrp-tsm";
 constexpr size_t kNumAtOnce = 1000;  // devices in a transaction: servers wait meanwhile
 constexpr uint32_t kMaxBodyLen = 1u << 30;
 constexpr uint32_t kMaxConnections = 100'000;
@@ -119,7 +119,7 @@ StoredPlan plan_for(const Identity &tsm, const std::string &file) {
 
 http::ServerOptions server_options(const ServeArguments &arguments) {
   http::ServerOptions options;
-  options.name = std::string(kProgram) + "/" + OTRP_VERSION;
+  options.name = std::string(kServerName) + "/" + OTRP_VERSION;
   options.num_workers = std::clamp(std::thread::hardware_concurrency(), 2u, kMaxWorkers);
   set_number("--workers", arguments.workers, kMaxWorkers, &options.num_workers);
   set_number("--max-body", arguments.max_body, kMaxBodyLen, &options.limits.max_body_len);
@@ -142,7 +142,7 @@ std::function<void(const http::LogEntry &)> log_of(const ServeArguments &argumen
     if (is_json) {
       fprintf(stderr, "%s\n", http::log_json(entry).c_str());
     } else {
-      tools::print_error_line(kProgram, http::log_text(entry));
+      tools::print_error_line(kServerName, http::log_text(entry));
     }
   };
 }

@@ -16,14 +16,15 @@ namespace tsm {
 namespace {
 
 /// A line on a terminal that is written again and again.
-class Progress {
+class ProgressLine {
  public:
-  explicit Progress(size_t num_jobs) : num_jobs_(num_jobs), is_shown_(isatty(STDERR_FILENO) != 0) {
+  explicit ProgressLine(size_t num_jobs)
+      : num_jobs_(num_jobs), is_shown_(isatty(STDERR_FILENO) != 0) {
     draw();
   }
-  Progress(const Progress &) = delete;
-  Progress &operator=(const Progress &) = delete;
-  ~Progress() { wipe(); }
+  ProgressLine(const ProgressLine &) = delete;
+  ProgressLine &operator=(const ProgressLine &) = delete;
+  ~ProgressLine() { wipe(); }
 
   void add(const std::string &name, const Outcome &outcome, bool wants_log) {
     const std::lock_guard guard(lock_);
@@ -62,7 +63,7 @@ class Progress {
 std::vector<Outcome> run_jobs(const Jobs &jobs) {
   const size_t num_jobs = jobs.names.size();
   std::vector<Outcome> outcomes(num_jobs);
-  Progress progress(num_jobs);
+  ProgressLine progress(num_jobs);
   std::atomic<size_t> next = 0;
   const auto work = [&] {
     for (size_t i = next++; i < num_jobs; i = next++) {

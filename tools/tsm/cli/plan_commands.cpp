@@ -34,7 +34,7 @@ class KeptProgress {
   std::string file_;
 };
 
-struct Wish {
+struct PlanWish {
   const Arguments &arguments;
   const Home &home;
   const Identity &tsm;
@@ -45,7 +45,7 @@ struct Wish {
 /// One device on its way.
 class Walk {
  public:
-  Walk(const Wish &wish, Channel *channel, DeviceRecord *record)
+  Walk(const PlanWish &wish, Channel *channel, DeviceRecord *record)
       : wish_(wish), channel_(channel), record_(record), kept_(*record), progress_(kept_.load()) {}
 
   Outcome go() {
@@ -111,7 +111,7 @@ class Walk {
     return outcome;
   }
 
-  const Wish &wish_;
+  const PlanWish &wish_;
   Channel *channel_;
   DeviceRecord *record_;
   KeptProgress kept_;
@@ -120,7 +120,7 @@ class Walk {
   std::string lines_;
 };
 
-Outcome walk(const Wish &wish, const Target &target) {
+Outcome walk(const PlanWish &wish, const Target &target) {
   std::unique_ptr<Channel> channel;
   Outcome outcome = outcome_of([&] {
     channel = open_channel(target);
@@ -153,7 +153,7 @@ int run(const Arguments &arguments, bool only_tells) {
   const Home home(arguments.home);
   const Identity tsm = home.load_identity();
   const std::vector<Target> targets = targets_of(arguments, home);
-  const Wish wish = {arguments, home, tsm, plan, only_tells};
+  const PlanWish wish = {arguments, home, tsm, plan, only_tells};
   if (!names_several(arguments)) {
     return print_outcome(walk(wish, targets.front()), arguments.trace);
   }

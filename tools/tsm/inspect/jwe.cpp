@@ -7,9 +7,9 @@
 namespace tsm {
 namespace {
 
-constexpr size_t kRsaLen = 256;
+constexpr size_t kWrappedKeyLen = 256;
 constexpr size_t kTagLen = 16;
-constexpr size_t kAesBlockLen = 16;
+constexpr size_t kCbcBlockLen = 16;
 
 const std::string *encrypted_key_text(const Json &jwe) {
   const Json *recipients = find_array(jwe, "recipients");
@@ -43,14 +43,14 @@ void inspect_recipient(const Json &jwe, Report *report) {
   const Json *header = object_field(recipients->front(), "header", report);
   const std::string *alg = header == nullptr ? nullptr : text_field(*header, "alg", report);
   if (alg != nullptr && *alg != "RSA1_5") report->failed("alg", *alg + ": expected RSA1_5");
-  sized_field(recipients->front(), "encrypted_key", kRsaLen, report);
+  sized_field(recipients->front(), "encrypted_key", kWrappedKeyLen, report);
 }
 
 void inspect_sealed(const Json &jwe, std::optional<ContentCipher> cipher, Report *report) {
   sized_field(jwe, "iv", cipher ? iv_len(*cipher) : 0, report);
   const std::optional<Bytes> ciphertext = bytes_field(jwe, "ciphertext", report);
   const bool has_blocks = cipher == ContentCipher::kA128CbcHs256;
-  if (ciphertext && has_blocks && ciphertext->size() % kAesBlockLen != 0) {
+  if (ciphertext && has_blocks && ciphertext->size() % kCbcBlockLen != 0) {
     report->failed("ciphertext", bytes_text(ciphertext->size()) + ": expected blocks of 16");
   } else if (ciphertext) {
     report->fact("ciphertext", bytes_text(ciphertext->size()));

@@ -11,7 +11,6 @@ namespace {
 
 using tools::UsageError;
 
-constexpr size_t kAesKeyLen = 16;
 constexpr size_t kImageKeyLen = 32;
 constexpr size_t kImageIvLen = 16;
 constexpr size_t kRoomForOthers = 4096;  // what is in a message besides its payload
@@ -98,7 +97,7 @@ Json encrypted_ta(const RsaKey &aik, std::string_view image, std::string_view im
   const Bytes image_key = key ? *key : random_bytes(kImageKeyLen);
   const Bytes image_iv = iv ? *iv : random_bytes(kImageIvLen);
   const Bytes ciphertext =
-      aes_cbc_encrypt(std::string_view(image_key).substr(kAesKeyLen), image_iv, image);
+      aes_cbc_encrypt(std::string_view(image_key).substr(kImageKeyLen / 2), image_iv, image);
   Json value = {{"key", base64url_encode(rsa1_5_encrypt(aik, image_key))},
                 {"iv", base64url_encode(image_iv)}};
   value[std::string(image_name)] = base64url_encode(ciphertext);  // moved: a list would copy it
