@@ -155,8 +155,9 @@ class TraceSink {
 };
 
 /// RSA keys are slow to make. From here on the first `count` keys that are generated of a size
-/// serve again and again, in turn, in this process; 0 makes every key a new one again.
-void reuse_generated_keys(unsigned count);
+/// serve again and again, in turn, in this process; 0 makes every key a new one again. With a
+/// `folder` for their files, all processes that name it have the same ones.
+void reuse_generated_keys(unsigned count, const std::string &folder = {});
 
 /// Names the folder from which TA images are loaded, before the places that programs look in.
 void set_ta_directory(const std::string &directory);

@@ -4,12 +4,15 @@
 #include <openssl/core_names.h>
 #include <openssl/crypto.h>
 #include <openssl/params.h>
+#include <openssl/pem.h>
 #include <openssl/rsa.h>
 #include <tee_internal_api.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <bit>
+#include <cstdio>
 #include <cstring>
 #include <iterator>
 #include <map>
@@ -151,22 +154,53 @@ SharedKey import_rsa_key(const Attributes &attributes) {
 
 namespace {
 
+using File = std::unique_ptr<FILE, FreedBy<fclose>>;
+
+SharedKey read_key(const std::string &path) {
+  const File file(fopen(path.c_str(), "re"));
+  EVP_PKEY *key = file ? PEM_read_PrivateKey(file.get(), nullptr, nullptr, nullptr) : nullptr;
+  return key != nullptr ? share(key) : nullptr;
+}
+
+// Other processes see a whole key or none. What cannot be kept is generated again.
+void write_key(const std::string &path, const SharedKey &key) {
+  const std::string part = path + "." + std::to_string(getpid());
+  File file(fopen(part.c_str(), "wxe"));
+  if (!file) return;
+  const bool is_whole =
+      PEM_write_PrivateKey(file.get(), key.get(), nullptr, nullptr, 0, nullptr, nullptr) == 1 &&
+      fflush(file.get()) == 0;
+  file.reset();
+  if (!is_whole || rename(part.c_str(), path.c_str()) != 0) unlink(part.c_str());
+}
+
 // See reuse_generated_keys().
 struct KeyPool {
   std::mutex lock;
-  size_t limit = 0;  // of keys for each size
+  size_t limit = 0;    // of keys for each size
+  std::string folder;  // of their files; empty: none
   std::map<uint32_t, std::vector<SharedKey>> keys;
   size_t next = 0;
 
   SharedKey take(uint32_t size) {
     const std::lock_guard guard(lock);
-    const std::vector<SharedKey> &known = keys[size];
-    return limit != 0 && known.size() == limit ? known[next++ % limit] : nullptr;
+    std::vector<SharedKey> &known = keys[size];
+    if (limit != 0 && known.size() == limit) return known[next++ % limit];
+    SharedKey key = limit == 0 || folder.empty() ? nullptr : read_key(next_file(size));
+    if (key != nullptr) known.push_back(key);
+    return key;
   }
 
   void keep(uint32_t size, const SharedKey &key) {
     const std::lock_guard guard(lock);
-    if (keys[size].size() < limit) keys[size].push_back(key);
+    if (keys[size].size() == limit) return;
+    if (!folder.empty()) write_key(next_file(size), key);
+    keys[size].push_back(key);
+  }
+
+ private:
+  std::string next_file(uint32_t size) {
+    return folder + "/" + std::to_string(size) + "-" + std::to_string(keys[size].size()) + ".pem";
   }
 };
 KeyPool key_pool;
@@ -189,9 +223,10 @@ SharedKey make_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exponen
 
 }  // namespace
 
-void reuse_generated_keys(size_t limit) {
+void reuse_generated_keys(size_t limit, const std::string &folder) {
   const std::lock_guard guard(key_pool.lock);
   key_pool.limit = limit;
+  key_pool.folder = folder;
   key_pool.keys.clear();
 }
 

@@ -4,6 +4,7 @@
 #define TEE_RSA_KEY_H
 
 #include <cstdint>
+#include <string>
 #include <vector>
 
 #include "attributes.h"
@@ -28,7 +29,8 @@ SharedKey generate_rsa_key(uint32_t size, const std::vector<uint8_t> &public_exp
 
 /// For tests: once `limit` keys of a size have been generated they are handed out again, in turn.
 /// 0, as at the start, makes every key a new one. Keys with an exponent on order are always new.
-void reuse_generated_keys(size_t limit);
+/// Where `folder` is not empty, keys are taken from it first, and those generated are kept in it.
+void reuse_generated_keys(size_t limit, const std::string &folder);
 
 /// Gives `attributes` all eight of a generated key, without leading zeros.
 void export_rsa_key(const EVP_PKEY &key, Attributes *attributes);

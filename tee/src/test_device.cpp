@@ -127,8 +127,8 @@ uint64_t Device::durable_writes() const {
   return impl_->power->durable_writes();
 }
 
-void reuse_generated_keys(unsigned count) {
-  tee::reuse_generated_keys(count);
+void reuse_generated_keys(unsigned count, const std::string &folder) {
+  tee::reuse_generated_keys(count, folder);
 }
 
 struct InsideTa::Impl {

@@ -6,6 +6,7 @@
 #include <map>
 
 #include "common/files.h"
+#include "support/kept_key.h"
 #include "tsm/protocol/dsi.h"
 #include "tsm/protocol/image.h"
 #include "tsm/protocol/jwe.h"
@@ -22,7 +23,7 @@ std::string environment(const char *name, const std::string &otherwise) {
 
 const tsm::RsaKey &key_named(const std::string &name) {
   static std::map<std::string, tsm::RsaKey> keys;
-  if (!keys.contains(name)) keys.emplace(name, tsm::RsaKey::generate());
+  if (!keys.contains(name)) keys.emplace(name, kept_key("key " + name));
   return keys.at(name);
 }
 
@@ -34,7 +35,9 @@ const tsm::RsaKey &dev_ca() {
 
 const tsm::Identity &tsm_named(const std::string &tsmid) {
   static std::map<std::string, tsm::Identity> identities;
-  if (!identities.contains(tsmid)) identities.emplace(tsmid, tsm::make_identity(tsmid, dev_ca()));
+  if (!identities.contains(tsmid)) {
+    identities.emplace(tsmid, tsm::admit(tsmid, kept_key("TSM " + tsmid), dev_ca()));
+  }
   return identities.at(tsmid);
 }
 

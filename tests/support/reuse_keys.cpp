@@ -3,4 +3,7 @@
 // compares, so that those still differ.
 #include <tee_test.h>
 
-[[maybe_unused]] static const bool is_reusing = (tee::test::reuse_generated_keys(8), true);
+#include "support/kept_key.h"
+
+[[maybe_unused]] static const bool is_reusing =
+    (tee::test::reuse_generated_keys(8, otrp_test::key_folder()), true);

@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "support/kept_key.h"
 #include "tsm/protocol/jwe.h"
 #include "tsm/protocol/messages.h"
 #include "tsm/protocol/parties.h"
@@ -14,13 +15,14 @@ namespace tsm {
 /// Making a key takes a while: one for each role, made once in a process.
 enum Role { kTee, kAik, kCa, kStranger };
 inline const RsaKey &key_of(Role role) {
-  static const RsaKey keys[] = {RsaKey::generate(), RsaKey::generate(), RsaKey::generate(),
-                                RsaKey::generate()};
+  using otrp_test::kept_key;
+  static const RsaKey keys[] = {kept_key("TEE"), kept_key("AIK"), kept_key("CA"),
+                                kept_key("stranger")};
   return keys[role];
 }
 
 inline const Identity &test_tsm() {
-  static const Identity tsm = make_identity("tsm1", key_of(kCa));
+  static const Identity tsm = admit("tsm1", otrp_test::kept_key("TSM"), key_of(kCa));
   return tsm;
 }
 
