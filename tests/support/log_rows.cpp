@@ -33,8 +33,8 @@ std::string said(tee::test::TraceSink &log) {
   std::string text;
   for (const auto &line : log.lines()) text += line.function + ": " + line.message + "\n";
   log.clear();
-  return std::regex_replace(text, std::regex("(data_buf|length|_value|_object) 0x[0-9a-f]+"),
-                            "$1 ADDRESS");
+  static const std::regex address("(data_buf|length|_value|_object) 0x[0-9a-f]+");
+  return std::regex_replace(text, address, "$1 ADDRESS");
 }
 
 }  // namespace otrp_test
