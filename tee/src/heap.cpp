@@ -7,7 +7,6 @@
 #include <cstdlib>
 #include <cstring>
 #include <new>
-#include <utility>
 
 #include "ta_instance.h"
 
@@ -28,8 +27,8 @@ constexpr bool kSanitized = false;
 
 Heap::~Heap() {
   for (size_t i = 0; i < num_slots_; ++i) std::free(slots_[i].block);
-  for (Spare *spare : spares_) {
-    while (spare != nullptr) std::free(std::exchange(spare, spare->next));
+  for (Spares &spares : spares_) {
+    while (spares.count != 0) std::free(spares.blocks[--spares.count]);
   }
 }
 
@@ -40,16 +39,17 @@ uint64_t Heap::charge_of(uint32_t len) {
 void *Heap::take_block(uint32_t len) {
   if (kSanitized || len > kMaxSmall) return std::calloc(1, len);
   const uint32_t units = (len + kAlignment - 1) / kAlignment;
-  Spare *&spare = spares_[units];
+  Spares &spares = spares_[units];
   // One that is new is as long as any that may be asked for in its place.
-  if (spare == nullptr) return std::calloc(std::max(units, 1u), kAlignment);
-  return std::memset(std::exchange(spare, spare->next), 0, len);
+  if (spares.count == 0) return std::calloc(std::max(units, 1u), kAlignment);
+  return std::memset(spares.blocks[--spares.count], 0, len);
 }
 
 void Heap::give_block(void *block, uint32_t len) {
   if (kSanitized || len > kMaxSmall) return std::free(block);
-  Spare *&spare = spares_[(len + kAlignment - 1) / kAlignment];
-  spare = new (block) Spare{spare};
+  Spares &spares = spares_[(len + kAlignment - 1) / kAlignment];
+  if (spares.count == spares.blocks.size()) return std::free(block);
+  spares.blocks[spares.count++] = block;
 }
 
 void *Heap::allocate(uint32_t len) {

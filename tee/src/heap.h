@@ -46,8 +46,11 @@ class Heap {
     void *block;  // NULL: free
     uint32_t len;
   };
-  struct Spare {
-    Spare *next;
+  /// Blocks of one size that were given back. They are not touched until they are asked for again:
+  /// what lies in them has left the caches by then.
+  struct Spares {
+    size_t count;
+    std::array<void *, 7> blocks;
   };
 
   static constexpr uint32_t kAlignment = 16;
@@ -71,7 +74,7 @@ class Heap {
   // Open addressing with linear probing, a power of two, at most half full.
   std::unique_ptr<Slot[]> slots_;
   size_t num_slots_ = 0;
-  std::array<Spare *, kMaxSmall / kAlignment + 1> spares_ = {};  // by their length, rounded up
+  std::array<Spares, kMaxSmall / kAlignment + 1> spares_ = {};  // by their length, rounded up
 };
 
 }  // namespace tee
