@@ -76,7 +76,7 @@ class Manager {
   /// Of a device in the state that `other` knows of its own.
   Manager(ClientDevice &device, const Manager &other);
 
-  const tsm::DeviceInfo info;
+  tsm::DeviceInfo info;
 
   /// Bytes of the buffer for an answer: enough for a few SDs. A long request gets more.
   size_t capacity = 1 << 15;
