@@ -32,22 +32,26 @@ Heap::~Heap() {
   }
 }
 
+// Alignments that hold `len` bytes.
+uint32_t Heap::units_of(uint32_t len) {
+  return len / kAlignment + (len % kAlignment != 0 ? 1 : 0);
+}
+
 uint64_t Heap::charge_of(uint32_t len) {
-  return (uint64_t{len} + kAlignment - 1) / kAlignment * kAlignment + kHeaderLen;
+  return uint64_t{units_of(len)} * kAlignment + kHeaderLen;
 }
 
 void *Heap::take_block(uint32_t len) {
   if (kSanitized || len > kMaxSmall) return std::calloc(1, len);
-  const uint32_t units = (len + kAlignment - 1) / kAlignment;
-  Spares &spares = spares_[units];
+  Spares &spares = spares_[units_of(len)];
   // One that is new is as long as any that may be asked for in its place.
-  if (spares.count == 0) return std::calloc(std::max(units, 1u), kAlignment);
+  if (spares.count == 0) return std::calloc(std::max(units_of(len), 1u), kAlignment);
   return std::memset(spares.blocks[--spares.count], 0, len);
 }
 
 void Heap::give_block(void *block, uint32_t len) {
   if (kSanitized || len > kMaxSmall) return std::free(block);
-  Spares &spares = spares_[(len + kAlignment - 1) / kAlignment];
+  Spares &spares = spares_[units_of(len)];
   if (spares.count == spares.blocks.size()) return std::free(block);
   spares.blocks[spares.count++] = block;
 }

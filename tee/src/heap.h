@@ -56,6 +56,7 @@ class Heap {
   static constexpr uint32_t kAlignment = 16;
   static constexpr uint32_t kMaxSmall = 1024;
 
+  static uint32_t units_of(uint32_t len);
   void *take_block(uint32_t len);
   void give_block(void *block, uint32_t len);
 
@@ -74,7 +75,7 @@ class Heap {
   // Open addressing with linear probing, a power of two, at most half full.
   std::unique_ptr<Slot[]> slots_;
   size_t num_slots_ = 0;
-  std::array<Spares, kMaxSmall / kAlignment + 1> spares_ = {};  // by their length, rounded up
+  std::array<Spares, kMaxSmall / kAlignment + 1> spares_ = {};  // by units_of(len)
 };
 
 }  // namespace tee
