@@ -96,6 +96,8 @@ void Floor::add_image(const Json &encrypted_ta, const char *image_name) {
 
 void Floor::add_sealing(const Json &jwe) {
   const size_t len = bytes_in(len_of(jwe, "ciphertext"));
+  add(draw(kAesBlockLen));
+  add(draw(kCekLen));
   for (const char *name : {"protect", "iv", "ciphertext", "tag"}) {
     add(encode(bytes_in(len_of(jwe, name))));
   }

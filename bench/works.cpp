@@ -5,6 +5,7 @@
 #include <openssl/core_names.h>
 #include <openssl/crypto.h>
 #include <openssl/evp.h>
+#include <openssl/rand.h>
 
 #include <cctype>
 #include <cstdlib>
@@ -40,6 +41,10 @@ Work encode(size_t len) {
   return [len = static_cast<int>(len)] {
     EVP_EncodeBlock(scratch().out.data(), scratch().in.data(), len);
   };
+}
+
+Work draw(size_t len) {
+  return [len = static_cast<int>(len)] { require(RAND_bytes(scratch().out.data(), len)); };
 }
 
 Work digest(size_t len) {

@@ -33,6 +33,7 @@ Work in_order(std::vector<Work> works);
 
 Work decode(size_t text_len);
 Work encode(size_t len);
+Work draw(size_t len);  // of random bytes
 Work digest(size_t len);
 Work hmac(size_t len);
 Work aes(size_t len, bool encrypt);
