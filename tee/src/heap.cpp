@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 #include <new>
 
 #include "ta_instance.h"
@@ -27,61 +26,50 @@ constexpr bool kSanitized = false;
 
 Heap::~Heap() {
   for (size_t i = 0; i < num_slots_; ++i) std::free(slots_[i].block);
-  for (Spares &spares : spares_) {
-    while (spares.count != 0) std::free(spares.blocks[--spares.count]);
-  }
 }
 
-// Alignments that hold `len` bytes.
-uint32_t Heap::units_of(uint32_t len) {
-  return len / kAlignment + (len % kAlignment != 0 ? 1 : 0);
-}
-
+// A length of almost 4 GiB must not wrap.
 uint64_t Heap::charge_of(uint32_t len) {
-  return uint64_t{units_of(len)} * kAlignment + kHeaderLen;
-}
-
-void *Heap::take_block(uint32_t len) {
-  if (kSanitized || len > kMaxSmall) return std::calloc(1, len);
-  Spares &spares = spares_[units_of(len)];
-  // One that is new is as long as any that may be asked for in its place.
-  if (spares.count == 0) return std::calloc(std::max(units_of(len), 1u), kAlignment);
-  return std::memset(spares.blocks[--spares.count], 0, len);
-}
-
-void Heap::give_block(void *block, uint32_t len) {
-  if (kSanitized || len > kMaxSmall) return std::free(block);
-  Spares &spares = spares_[units_of(len)];
-  if (spares.count == spares.blocks.size()) return std::free(block);
-  spares.blocks[spares.count++] = block;
+  constexpr uint64_t kMask = Arena::kAlignment - 1;
+  return ((len + kMask) & ~kMask) + kHeaderLen;
 }
 
 void *Heap::allocate(uint32_t len) {
   const uint64_t charge = charge_of(len);
   if (charge > size_ - in_use_) return nullptr;
-  if (2 * (size_t{live_} + 1) > num_slots_ && !grow()) return nullptr;
-  void *block = take_block(len);
+  void *block = kSanitized || len > Arena::kMaxLen ? nullptr : arena_.take(len);
+  if (block == nullptr) block = take_from_host(len);
   if (block == nullptr) return nullptr;
-  insert({block, len});
   in_use_ += static_cast<uint32_t>(charge);
   peak_ = std::max(peak_, in_use_);
   peak_live_ = std::max(peak_live_, ++live_);
   return block;
 }
 
-const uint32_t *Heap::length_of(const void *block) const {
-  if (live_ == 0) return nullptr;
-  const Slot &slot = slots_[find(block)];
-  return slot.block == block ? &slot.len : nullptr;
+void *Heap::take_from_host(uint32_t len) {
+  if (2 * (num_listed_ + 1) > num_slots_ && !grow()) return nullptr;
+  void *block = std::calloc(1, len);
+  if (block == nullptr) return nullptr;
+  insert({block, len});
+  ++num_listed_;
+  return block;
 }
 
-void Heap::release(void *block) {
-  const size_t slot = find(block);
-  const uint32_t len = slots_[slot].len;
+std::optional<uint32_t> Heap::length_of(const void *block) const {
+  if (arena_.holds(block)) return arena_.length_of(block);
+  if (num_listed_ == 0) return std::nullopt;
+  const Slot &slot = slots_[find(block)];
+  if (slot.block != block) return std::nullopt;
+  return slot.len;
+}
+
+void Heap::release(void *block, uint32_t len) {
   in_use_ -= static_cast<uint32_t>(charge_of(len));
   --live_;
-  erase(slot);
-  give_block(block, len);
+  if (arena_.holds(block)) return arena_.give_back(block, len);
+  erase(find(block));
+  --num_listed_;
+  std::free(block);
 }
 
 // The slot of the block, or a free one.
@@ -94,7 +82,7 @@ size_t Heap::find(const void *block) const {
 // Neighbours in memory are neighbours in the table: allocations that follow each other share its
 // cache lines, which a hash that scatters would not let them do.
 size_t Heap::home(const void *block) const {
-  return reinterpret_cast<uintptr_t>(block) / kAlignment & (num_slots_ - 1);
+  return reinterpret_cast<uintptr_t>(block) / Arena::kAlignment & (num_slots_ - 1);
 }
 
 bool Heap::grow() {
@@ -146,8 +134,8 @@ void *TEE_Malloc(TEE_LengthType size, uint32_t) {
 void TEE_Free(void *buffer) {
   if (buffer == nullptr) return;
   Heap &heap = current_instance().heap;
-  const uint32_t *len = heap.length_of(buffer);
-  if (len == nullptr) panic("TEE_Free", "not a live block of this instance");
+  const std::optional<uint32_t> len = heap.length_of(buffer);
+  if (!len) panic("TEE_Free", "not a live block of this instance");
   show_freed({static_cast<const char *>(buffer), *len});
-  heap.release(buffer);
+  heap.release(buffer, *len);
 }

@@ -3,19 +3,21 @@
 #ifndef TEE_HEAP_H
 #define TEE_HEAP_H
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
+
+#include "arena.h"
 
 namespace tee {
 
 /// Memory comes from the host; the charge is what a small allocator inside a TEE would take. Live
-/// blocks are kept in a hash table beside them: a pointer is judged without being read.
+/// blocks that an arena has no room for are kept in a hash table beside them: a pointer is judged
+/// without being read.
 ///
-/// Small blocks that were given back are handed out again by their size. Under a sanitizer, which
-/// is to see one byte too far and one use too late, each block is the host's, in exactly the size
-/// asked for.
+/// Under a sanitizer, which is to see one byte too far and one use too late, there is no arena:
+/// each block is the host's, in exactly the size asked for.
 class Heap {
  public:
   explicit Heap(uint32_t size) : size_(size) {}
@@ -29,11 +31,11 @@ class Heap {
   /// Zero-filled; NULL when the heap is full.
   void *allocate(uint32_t len);
 
-  /// NULL unless `block` is a live block of this heap, otherwise its length.
-  const uint32_t *length_of(const void *block) const;
+  /// Nothing unless `block` is a live block of this heap, otherwise its length.
+  std::optional<uint32_t> length_of(const void *block) const;
 
-  /// Gives a live block back.
-  void release(void *block);
+  /// Gives a live block of `len` bytes back.
+  void release(void *block, uint32_t len);
 
   uint32_t size() const { return size_; }
   uint32_t in_use() const { return in_use_; }
@@ -46,19 +48,8 @@ class Heap {
     void *block;  // NULL: free
     uint32_t len;
   };
-  /// Blocks of one size that were given back. They are not touched until they are asked for again:
-  /// what lies in them has left the caches by then.
-  struct Spares {
-    size_t count;
-    std::array<void *, 7> blocks;
-  };
 
-  static constexpr uint32_t kAlignment = 16;
-  static constexpr uint32_t kMaxSmall = 1024;
-
-  static uint32_t units_of(uint32_t len);
-  void *take_block(uint32_t len);
-  void give_block(void *block, uint32_t len);
+  void *take_from_host(uint32_t len);
 
   size_t home(const void *block) const;
   size_t find(const void *block) const;
@@ -72,10 +63,11 @@ class Heap {
   uint32_t peak_ = 0;
   uint32_t live_ = 0;
   uint32_t peak_live_ = 0;
+  Arena arena_;
   // Open addressing with linear probing, a power of two, at most half full.
   std::unique_ptr<Slot[]> slots_;
   size_t num_slots_ = 0;
-  std::array<Spares, kMaxSmall / kAlignment + 1> spares_ = {};  // by units_of(len)
+  size_t num_listed_ = 0;
 };
 
 }  // namespace tee
