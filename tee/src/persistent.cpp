@@ -80,14 +80,8 @@ bool may_join(const std::vector<uint32_t> &handles, uint32_t flags) {
 }
 
 std::shared_ptr<OpenObject> find_open(HostDevice &device, const ObjectKey &key) {
-  const auto open = device.open_objects.find(key);
-  return open != device.open_objects.end() ? open->second.lock() : nullptr;
-}
-
-std::shared_ptr<OpenObject> add_open(HostDevice &device, const ObjectKey &key) {
-  auto object = std::make_shared<OpenObject>(device.open_objects, key);
-  device.open_objects[key] = object;
-  return object;
+  const auto open = std::ranges::find(device.open_objects, key, &OpenObject::key);
+  return open != device.open_objects.end() ? (*open)->shared_from_this() : nullptr;
 }
 
 // NULL when there is no such object.
@@ -95,7 +89,7 @@ std::shared_ptr<OpenObject> find_or_load(HostDevice &device, const ObjectKey &ke
   if (auto open = find_open(device, key)) return open;
   std::optional<Bytes> data = device.storage->load(key);
   if (!data) return nullptr;
-  auto object = add_open(device, key);
+  auto object = std::make_shared<OpenObject>(device.open_objects, key);
   object->data = std::move(*data);
   return object;
 }
@@ -127,8 +121,9 @@ TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
   }
   if (data.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
 
-  auto opened = std::make_unique<OpenData>(device, add_open(device, key),
-                                           flags & (kAccessFlags | kShareFlags));
+  auto object = std::make_shared<OpenObject>(device.open_objects, key);
+  auto opened =
+      std::make_unique<OpenData>(device, std::move(object), flags & (kAccessFlags | kShareFlags));
   opened->object->creation_waits = true;
   if (!data.empty() || device.creates_at_once) opened->store({data.begin(), data.end()});
   *handle = hand_out(std::move(opened));

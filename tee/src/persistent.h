@@ -13,7 +13,6 @@
 #ifndef TEE_PERSISTENT_H
 #define TEE_PERSISTENT_H
 
-#include <map>
 #include <memory>
 #include <vector>
 
@@ -24,12 +23,14 @@ namespace tee {
 class HostDevice;
 struct OpenObject;
 
-/// The objects of a device that have an open handle.
-using OpenObjects = std::map<ObjectKey, std::weak_ptr<OpenObject>>;
+/// The objects of a device that have an open handle. They are few.
+using OpenObjects = std::vector<OpenObject *>;
 
-struct OpenObject {
-  OpenObject(OpenObjects &among, const ObjectKey &object_key) : table(among), key(object_key) {}
-  ~OpenObject() { table.erase(key); }
+struct OpenObject : std::enable_shared_from_this<OpenObject> {
+  OpenObject(OpenObjects &among, const ObjectKey &object_key) : table(among), key(object_key) {
+    table.push_back(this);
+  }
+  ~OpenObject() { std::erase(table, this); }
   OpenObject(const OpenObject &) = delete;
   OpenObject &operator=(const OpenObject &) = delete;
 
