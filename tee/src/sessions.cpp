@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: BSD-2-Clause
 // TA-to-TA sessions (section 4.9).
+#include <algorithm>
+
 #include "error.h"
 #include "host_device.h"
 
@@ -52,20 +54,16 @@ TEE_Result open_ta_session(Instance &caller, const TEE_UUID &destination, Messag
   std::unique_ptr<Session> session;
   const TEE_Result result = caller.device.open_session(destination, identity, message, session);
   if (result != TEE_SUCCESS) return result;
-  try {
-    *handle = caller.sessions.emplace(session.get(), std::move(session)).first->first;
-  } catch (...) {
-    caller.device.close_session(std::move(session));
-    throw;
-  }
+  *handle = session.get();
+  caller.sessions.push_back(std::move(session));
   return TEE_SUCCESS;
 }
 
-Session &checked_session(TEE_TASessionHandle handle, const char *call) {
-  const auto &sessions = current_instance().sessions;
-  const auto session = sessions.find(handle);
+std::unique_ptr<Session> &checked_session(TEE_TASessionHandle handle, const char *call) {
+  auto &sessions = current_instance().sessions;
+  const auto session = std::ranges::find(sessions, handle, &std::unique_ptr<Session>::get);
   if (session == sessions.end()) panic(call, "not a session that this instance has open");
-  return *session->second;
+  return *session;
 }
 
 void tell(uint32_t *where, uint32_t origin) {
@@ -96,7 +94,7 @@ TEE_Result TEE_OpenTASession(const TEE_UUID *destination, uint32_t, uint32_t par
 
 TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t, uint32_t commandID,
                                uint32_t paramTypes, TEE_Param params[4], uint32_t *returnOrigin) {
-  Session &known = checked_session(session, __func__);
+  Session &known = *checked_session(session, __func__);
   if (TEE_Result code; fault_due(Fault::kTaCall, __func__, TEE_ERROR_COMMUNICATION, &code)) {
     tell(returnOrigin, TEE_ORIGIN_COMMS);
     return code;
@@ -111,7 +109,8 @@ TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t, uint32_t c
 
 void TEE_CloseTASession(TEE_TASessionHandle session) {
   if (session == TEE_HANDLE_NULL) return;
-  checked_session(session, __func__);
+  std::unique_ptr<Session> closing = std::move(checked_session(session, __func__));
   Instance &caller = current_instance();
-  caller.device.close_session(std::move(caller.sessions.extract(session).mapped()));
+  std::erase(caller.sessions, nullptr);
+  caller.device.close_session(std::move(closing));
 }

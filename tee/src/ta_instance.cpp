@@ -24,17 +24,15 @@ Instance::Instance(HostDevice &on_device, Program runs)
 
 Instance::~Instance() {
   const Running running(*this);
-  while (!sessions.empty()) {
-    device.close_session(std::move(sessions.extract(sessions.begin()).mapped()));
-  }
+  for (std::unique_ptr<Session> &session : sessions) device.close_session(std::move(session));
   while (!handles.operations.empty()) TEE_FreeOperation(handles.operations.newest());
   while (!handles.objects.empty()) close_handle(handles.objects.newest());
 }
 
 // Ends, for no session is opened that would close a cycle.
 bool Instance::reaches(const Instance &other) const {
-  return std::ranges::any_of(sessions, [&](const auto &entry) {
-    const Instance &next = *entry.second->instance;
+  return std::ranges::any_of(sessions, [&](const auto &session) {
+    const Instance &next = *session->instance;
     return &next == &other || next.reaches(other);
   });
 }

@@ -8,7 +8,7 @@
 
 #include <memory>
 #include <string>
-#include <unordered_map>
+#include <vector>
 
 #include "heap.h"
 #include "running.h"
@@ -56,7 +56,7 @@ class Instance {
   const UuidBytes uuid;
   Heap heap;
   OpenHandles handles;
-  std::unordered_map<TEE_TASessionHandle, std::unique_ptr<Session>> sessions;
+  std::vector<std::unique_ptr<Session>> sessions;
   uint32_t num_clients = 0;  // sessions that others have with it
   bool entered = false;      // an entry point of it is on some stack
 };
