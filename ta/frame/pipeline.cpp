@@ -106,7 +106,7 @@ static TEE_Result read_frame_head(reader *in, uint32_t *message_id) {
 static const char kName[] = "OTrP_TaInvokeCmd";
 
 static TEE_Result verify(const message_entry *entry, const jsmn_string *message,
-                         secret_bytes *payload, token_object_ptr *tokens) {
+                         secret_bytes *payload, token_object_ptr *request) {
   request_context context = {};
   context.message = reinterpret_cast<const uint8_t *>(message->data);
   context.message_len = message->len;
@@ -114,16 +114,15 @@ static TEE_Result verify(const message_entry *entry, const jsmn_string *message,
   const TEE_Result result = entry->verify(&context);
   payload->data = context.payload;
   payload->len = context.payload_len;
-  tokens->reset(context.tokens);
+  request->reset(context.tokens);
   CHECK_AS(kName, result == TEE_SUCCESS, result, "Failed to verify message");
   return TEE_SUCCESS;
 }
 
 // Finds out which TSM sent the message; a GetTAInfo request names none. One that is named and
 // cannot be copied is not left out: the message would fail as another TSM's.
-static TEE_Result read_sender(const jsmn_object *tokens, work *job) {
-  job->request.reset(tokens != nullptr ? jsmn_copy_object(tokens)
-                                       : jsmn_init_object(job->message.get()));
+static TEE_Result read_sender(work *job) {
+  if (!job->request) job->request.reset(jsmn_init_object(job->message.get()));
   CHECK_AS(kName, job->request, OTRP_BAD_REQUEST, "init request_json get NULL");
   const slice_ptr tsmid(jsmn_object_get_string(job->request.get(), "tsmid"));
   CHECK_AS(kName, tsmid, OTRP_NO_MEMORY, "no memory for tsmid");
@@ -196,10 +195,8 @@ static TEE_Result answer_message(reader *in, uint32_t message_id, work *job, out
 
   secret_bytes payload;
   slice_ptr placed;
-  token_object_ptr tokens;
-  TRY(verify(entry, job->message.get(), &payload, &tokens));
-  TRY(read_sender(tokens.get(), job));
-  tokens.reset();
+  TRY(verify(entry, job->message.get(), &payload, &job->request));
+  TRY(read_sender(job));
   TRY(place_payload(&payload, *out, job, &placed));
   TRY(process(entry, *out, placed, job));
   TRY(encode(entry, *job, out));

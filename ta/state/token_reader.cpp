@@ -11,8 +11,8 @@
 struct jsmn_token : jsmntok_t {};
 static_assert(sizeof(jsmn_token) == sizeof(jsmntok_t));
 
-static constexpr int kUsualTokens = 64;
-static constexpr int kManyTokens = 256;  // more are read, but not without a word
+static constexpr uint32_t kUsualTokens = 64;
+static constexpr uint32_t kManyTokens = 256;  // more are read, but not without a word
 
 // ---- Slices
 
@@ -91,78 +91,82 @@ static void pass_over_values(jsmn_parser *parser, const jsmn_string &text, jsmn_
 }
 
 // The same as tokenize() for a text of few tokens, which may be large. An error may be another one.
-static int tokenize_few(const jsmn_string &text, jsmn_token *tokens, int num_tokens) {
+static int tokenize_few(const jsmn_string &text, jsmn_token *tokens, uint32_t num_tokens) {
   if (text.data == nullptr || text.len == 0 || text.len > INT32_MAX) return JSMN_ERROR_NOMEM;
   jsmn_parser parser;
   jsmn_init(&parser);
-  pass_over_values(&parser, text, tokens, static_cast<unsigned>(num_tokens));
-  return jsmn_parse(&parser, text.data, text.len, tokens, static_cast<unsigned>(num_tokens));
-}
-
-static tee_ptr<jsmn_token> allocate_tokens(int num_tokens) {
-  const uint64_t len = static_cast<uint64_t>(num_tokens) * sizeof(jsmn_token);
-  if (len > UINT32_MAX) return {};
-  return tee_ptr<jsmn_token>(
-      reinterpret_cast<jsmn_token *>(allocate_bytes(static_cast<uint32_t>(len))));
+  pass_over_values(&parser, text, tokens, num_tokens);
+  return jsmn_parse(&parser, text.data, text.len, tokens, num_tokens);
 }
 
 static const char kInitObject[] = "jsmn_init_object";
 
-static const char kNoMemory[] = "malloc jsmn_object error no memory";
+namespace {
 
-static int count_and_tokenize(const jsmn_string &text, tee_ptr<jsmn_token> *tokens) {
-  const int num_tokens = tokenize(text, nullptr, 0);
-  CHECK_AS(kInitObject, num_tokens >= 1, -1, "compute jsmn_string tokens fail with code: %d\n",
-           num_tokens);
+// Its tokens follow it in the same block.
+struct object_block {
+  jsmn_object object;
+  jsmn_string text;
+};
+
+}  // namespace
+
+// An object with room for its tokens.
+static jsmn_object *new_object(const jsmn_string &text, uint32_t num_tokens) {
   if (num_tokens > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
-  *tokens = allocate_tokens(num_tokens);
-  CHECK_AS(kInitObject, *tokens, -1, "%s", kNoMemory);
-  const int count = tokenize(text, tokens->get(), num_tokens);
-  CHECK_AS(kInitObject, count >= 0, -1, "Failed to parse JSON: %d\n", count);
-  return count;
+  const uint64_t len = sizeof(object_block) + uint64_t{num_tokens} * sizeof(jsmn_token);
+  auto *block = reinterpret_cast<object_block *>(
+      len <= UINT32_MAX ? allocate_bytes(static_cast<uint32_t>(len)) : nullptr);
+  CHECK_AS(kInitObject, block != nullptr, nullptr, "malloc jsmn_object error no memory");
+  block->text = text;
+  block->object = {reinterpret_cast<jsmn_token *>(block + 1), num_tokens, &block->text};
+  return &block->object;
 }
 
-// Most texts have few tokens, however large they are: they are read once, and counted first only
-// when they have more, or to find out what is wrong with them. Negative when it fails.
-static int tokenize_text(const jsmn_string &text, tee_ptr<jsmn_token> *tokens) {
-  tee_ptr<jsmn_token> room = allocate_tokens(kUsualTokens);
-  CHECK_AS(kInitObject, room, -1, "%s", kNoMemory);
-  const int count = tokenize_few(text, room.get(), kUsualTokens);
-  if (count < 1) {
-    room.reset();
-    return count_and_tokenize(text, tokens);
-  }
-  *tokens = allocate_tokens(count);
-  CHECK_AS(kInitObject, *tokens, -1, "%s", kNoMemory);
-  memcpy(tokens->get(), room.get(), static_cast<size_t>(count) * sizeof(jsmn_token));
-  return count;
-}
-
-static jsmn_object *make_object(const jsmn_string &text, tee_ptr<jsmn_token> *tokens,
+// An object over the part of a text that begins at `offset`, from the part's tokens. The text,
+// which may be large, is not read again.
+static jsmn_object *copy_tokens(const jsmn_string &part, int offset, const jsmn_token *from,
                                 uint32_t count) {
-  token_object_ptr object(reinterpret_cast<jsmn_object *>(allocate_bytes(sizeof(jsmn_object))));
-  CHECK_AS(kInitObject, object, nullptr, "%s", kNoMemory);
-  object->text = jsmn_init_string();
-  if (object->text == nullptr) return nullptr;
-  *object->text = text;
-  object->tokens = tokens->release();
-  object->count = count;
+  jsmn_object *copy = new_object(part, count);
+  for (uint32_t i = 0; copy != nullptr && i < count; ++i) {
+    copy->tokens[i] = from[i];
+    copy->tokens[i].start -= offset;
+    copy->tokens[i].end -= offset;
+  }
+  return copy;
+}
+
+static jsmn_object *count_and_tokenize(const jsmn_string &text) {
+  const int num_tokens = tokenize(text, nullptr, 0);
+  CHECK_AS(kInitObject, num_tokens >= 1, nullptr, "compute jsmn_string tokens fail with code: %d\n",
+           num_tokens);
+  token_object_ptr object(new_object(text, static_cast<uint32_t>(num_tokens)));
+  if (!object) return nullptr;
+  const int count = tokenize(text, object->tokens, num_tokens);
+  CHECK_AS(kInitObject, count >= 0, nullptr, "Failed to parse JSON: %d\n", count);
+  object->count = static_cast<uint32_t>(count);
   return object.release();
 }
 
+// Most texts have few tokens, however large they are: they are read once, and counted first only
+// when they have more, or to find out what is wrong with them.
+static jsmn_object *tokenize_text(const jsmn_string &text) {
+  token_object_ptr room(new_object(text, kUsualTokens));
+  if (!room) return nullptr;
+  const int count = tokenize_few(text, room->tokens, kUsualTokens);
+  if (count >= 1) return copy_tokens(text, 0, room->tokens, static_cast<uint32_t>(count));
+  room.reset();
+  return count_and_tokenize(text);
+}
+
 jsmn_object *jsmn_init_object(const jsmn_string *slice) {
-  const jsmn_string text = slice != nullptr ? *slice : jsmn_string{};
-  tee_ptr<jsmn_token> tokens;
-  const int count = tokenize_text(text, &tokens);
-  if (count < 0) return nullptr;
-  CHECK(count >= 1 && tokens.get()->type == JSMN_OBJECT, nullptr, "Object expected\n");
-  return make_object(text, &tokens, static_cast<uint32_t>(count));
+  token_object_ptr object(tokenize_text(slice != nullptr ? *slice : jsmn_string{}));
+  if (!object) return nullptr;
+  CHECK(object->count >= 1 && object->tokens->type == JSMN_OBJECT, nullptr, "Object expected\n");
+  return object.release();
 }
 
 void jsmn_free_object(jsmn_object *object) {
-  if (object == nullptr) return;
-  jsmn_free_string(object->text);
-  TEE_Free(object->tokens);
   TEE_Free(object);
 }
 
@@ -193,25 +197,6 @@ jsmn_string *jsmn_object_get_string(const jsmn_object *object, const char *key) 
   jsmn_string *slice = jsmn_init_string();
   if (slice != nullptr) *slice = text_of(object, find_value(object, key));
   return slice;
-}
-
-// An object over the part of a text that begins at `offset`, from the part's tokens. The text,
-// which may be large, is not read again.
-static jsmn_object *copy_tokens(const jsmn_string &part, int offset, const jsmn_token *from,
-                                uint32_t count) {
-  if (count > kManyTokens) trace_error(kInitObject, __LINE__, "json object too big");
-  tee_ptr<jsmn_token> tokens = allocate_tokens(static_cast<int>(count));
-  CHECK_AS(kInitObject, tokens, nullptr, "%s", kNoMemory);
-  for (uint32_t i = 0; i < count; ++i) {
-    tokens.get()[i] = from[i];
-    tokens.get()[i].start -= offset;
-    tokens.get()[i].end -= offset;
-  }
-  return make_object(part, &tokens, count);
-}
-
-jsmn_object *jsmn_copy_object(const jsmn_object *object) {
-  return copy_tokens(*object->text, 0, object->tokens, object->count);
 }
 
 // The tokens of an inner object follow its own.

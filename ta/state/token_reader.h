@@ -25,7 +25,7 @@ struct jsmn_string {
 struct jsmn_object {
   jsmn_token *tokens;  // in text order; the first is the object itself
   uint32_t count;
-  jsmn_string *text;
+  jsmn_string *text;  // it and the tokens belong to the object
 };
 
 /// A new empty slice, for the caller to point at a text; NULL: no memory.
@@ -34,9 +34,6 @@ jsmn_string *jsmn_init_string();
 /// A new object over the text of `slice`, up to a NUL in it. NULL, and a line in the log, when the
 /// text is no JSON whose first value is an object, or memory ran out.
 jsmn_object *jsmn_init_object(const jsmn_string *slice);
-
-/// A new object like `object`, over the same text, which is not read again.
-jsmn_object *jsmn_copy_object(const jsmn_object *object);
 
 /// A new slice of the value behind `key`, without the quotes of a string. A value that is missing
 /// has NULL `data`, an empty string has not. NULL: no memory.
