@@ -255,8 +255,9 @@ dsi_json_str_t *init_dsi() {
 
 // Makes `*list` a member of `into`; the setter's status when it cannot.
 static TEE_Result hand_over(JSON_Object *into, const char *key, JSON_Value **list) {
-  const JSON_Status set = json_object_set_value(into, key, *list);
-  if (set == JSONSuccess) *list = nullptr;
+  json_ptr value(*list);
+  const JSON_Status set = json_object_take(into, key, &value);
+  *list = value.release();  // NULL when it has been taken
   return static_cast<TEE_Result>(set);
 }
 

@@ -373,21 +373,28 @@ static void put_member(JSON_Object *object, const member_place &place, JSON_Valu
   detach_and_free(place.old);
 }
 
-JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Value *value) {
+// The name is not copied.
+static JSON_Status link_member(JSON_Object *object, const char *name, JSON_Value *value) {
   if (object == nullptr || name == nullptr || value == nullptr) return JSONFailure;
   member_place place;
-  if (value->next != nullptr || holds(value, &object->node)) return JSONFailure;
-  if (!find_place(object, name, &place)) return JSONFailure;
-
   const text_form form = form_of(name);
-  if (form.len >= UINT32_MAX) return JSONFailure;
-  const auto len = static_cast<uint32_t>(form.len);
-  auto *copy = reinterpret_cast<char *>(allocate_bytes(len + 1));
-  if (copy == nullptr) return JSONFailure;
-  memcpy(copy, name, len);
-  set_name(value, copy, len, form.plain);
-  value->flags |= kOwnsName;
+  if (value->next != nullptr || holds(value, &object->node) || form.len >= UINT32_MAX ||
+      !find_place(object, name, &place)) {
+    return JSONFailure;
+  }
+  set_name(value, const_cast<char *>(name), static_cast<uint32_t>(form.len), form.plain);
   put_member(object, place, value);
+  return JSONSuccess;
+}
+
+JSON_Status json_object_set_value(JSON_Object *object, const char *name, JSON_Value *value) {
+  const size_t len = name != nullptr ? strlen(name) : UINT32_MAX;
+  if (len >= UINT32_MAX) return JSONFailure;
+  secret_text copy(reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(len) + 1)));
+  if (copy) memcpy(copy.get(), name, len);
+  if (link_member(object, copy.get(), value) != JSONSuccess) return JSONFailure;
+  (void)copy.release();
+  value->flags |= kOwnsName;
   return JSONSuccess;
 }
 
@@ -450,7 +457,7 @@ JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
 }
 
 JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value) {
-  const JSON_Status set = json_object_set_value(object, name, value->get());
+  const JSON_Status set = link_member(object, name, value->get());
   if (set == JSONSuccess) (void)value->release();
   return set;
 }

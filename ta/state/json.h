@@ -104,7 +104,8 @@ json_match json_array_match(const JSON_Array *array, size_t index, const char *n
 [[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
 
 /// The same for a value, or a text, that has an owner, which holds it no longer after a success.
-/// A text is not looked at: it must have come from base64urlEncodeAddEndZero.
+/// The name of a value is not copied: it is a literal, or else outlives the document. A text is not
+/// looked at: it must have come from base64urlEncodeAddEndZero.
 [[nodiscard]] JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value);
 [[nodiscard]] JSON_Status json_object_take_base64url(JSON_Object *object, const char *name,
                                                      tee_ptr<char> *text);
