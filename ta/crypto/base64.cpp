@@ -82,13 +82,8 @@ static uint32_t num_characters_for(uint32_t num_bytes) {
 }
 
 template <const alphabet &To>
-static char *encode(const uint8_t *data, uint32_t len) {
-  const uint64_t padded_len = (uint64_t{len} + 2) / 3 * 4;
-  if (data == nullptr || padded_len >= UINT32_MAX) return nullptr;
-  auto *text = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(padded_len) + 1));
-  if (text == nullptr) return nullptr;
-
-  char *at = text;
+static void encode_to(const uint8_t *data, uint32_t len, char *at) {
+  const char *end = at + base64_room(len) - 1;
   for (; len > kBlockLen; len -= kBlockLen, data += kBlockLen, at += kNumCharacters) {
     encode_block<To>(data, at);
   }
@@ -100,7 +95,15 @@ static char *encode(const uint8_t *data, uint32_t len) {
   at += num_characters_for(len);
   wipe(last, sizeof last);
   wipe(last_text, sizeof last_text);
-  for (const char *end = text + padded_len; at != end;) *at++ = To.padding;
+  while (at != end) *at++ = To.padding;
+}
+
+template <const alphabet &To>
+static char *encode(const uint8_t *data, uint32_t len) {
+  const uint64_t room = base64_room(len);
+  if (data == nullptr || room > UINT32_MAX) return nullptr;
+  auto *text = reinterpret_cast<char *>(allocate_bytes(static_cast<uint32_t>(room)));
+  if (text != nullptr) encode_to<To>(data, len, text);
   return text;
 }
 
@@ -112,6 +115,11 @@ char *base64urlEncodeAddEndZero(const uint8_t *data, uint32_t len) {
   char *text = encode<kUrl>(data, len);
   CHECK(text != nullptr, nullptr, "bad parameter");
   return text;
+}
+
+uint32_t base64url_encode_to(const data_part &bytes, char *text) {
+  encode_to<kUrl>(static_cast<const uint8_t *>(bytes.data), bytes.len, text);
+  return num_characters_for(bytes.len);
 }
 
 // ---- Decoding

@@ -13,9 +13,19 @@
 
 #include <stdint.h>
 
+#include "data_part.h"
+
 /// Without `data` NULL and nothing in the log; for want of memory NULL and a line.
 char *base64EncodeAddEndZero(const uint8_t *data, uint32_t len);
 char *base64urlEncodeAddEndZero(const uint8_t *data, uint32_t len);
+
+/// Number of characters, with the NUL, that the text of so many bytes needs room for.
+inline uint64_t base64_room(uint32_t len) {
+  return (uint64_t{len} + 2) / 3 * 4 + 1;
+}
+
+/// The URL text goes to zeros that have room for it. Returns its length.
+uint32_t base64url_encode_to(const data_part &bytes, char *text);
 
 /// Number of decoded bytes. `*bytes` receives a new buffer, which is the caller's also when that
 /// number is 0; NULL, with a line in the log, when memory ran out. It is left alone when `text` is

@@ -42,9 +42,8 @@ TEE_Result encode_aik(tlv_box *box, char **encoded, const char *as) {
 
 TEE_Result set_teespaik(JSON_Object *content, const uint8_t *pubkey, uint32_t pubkey_len,
                         const char *as) {
-  const tee_ptr<char> text(base64urlEncodeAddEndZero(pubkey, pubkey_len));
-  CHECK_AS(as, text, OTRP_NO_MEMORY, "base64urlEncodeAddEndZero aik_data_buf len: 0x%x failed.\n",
-           pubkey_len);
-  const bool set = json_object_set_string(content, "teespaik", text.get()) == JSONSuccess;
-  return set ? TEE_SUCCESS : OTRP_NO_MEMORY;
+  const data_part key = {pubkey, pubkey_len};
+  CHECK_AS(as, json_object_set_base64url(content, "teespaik", key) == JSONSuccess, OTRP_NO_MEMORY,
+           "base64urlEncodeAddEndZero aik_data_buf len: 0x%x failed.\n", pubkey_len);
+  return TEE_SUCCESS;
 }

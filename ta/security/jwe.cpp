@@ -100,11 +100,10 @@ TEE_Result verify_jwe_auth_tag(const uint8_t *cek, uint32_t cek_len, const uint8
 
 // ---- Encryption
 
-static bool set_encoded(JSON_Object *into, const char *key, const uint8_t *bytes, uint32_t len,
+static bool set_encoded(JSON_Object *into, const char *key, const data_part &bytes,
                         const char *failed, const char *as = __builtin_FUNCTION()) {
-  tee_ptr<char> text(base64urlEncodeAddEndZero(bytes, len));
-  CHECK_AS(as, text, false, "%s", failed);
-  return json_object_take_base64url(into, key, &text) == JSONSuccess;
+  CHECK_AS(as, json_object_set_base64url(into, key, bytes) == JSONSuccess, false, "%s", failed);
+  return true;
 }
 
 JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,
@@ -122,15 +121,14 @@ JSON_Value *construct_json_encrypt(const char *header, uint32_t header_len,
   JSON_Object *recipient = json_array_get_object(recipients, 0);
   CHECK(recipient != nullptr, nullptr, "recipient is null");
 
-  // One text at a time: a ciphertext may be large.
   const bool complete =
-      set_encoded(members, "protect", bytes_of(header), header_len,
-                  "base64url encode protect error") &&
-      set_encoded(recipient, "encrypted_key", encrypted_cek, encrypted_cek_len,
+      set_encoded(members, "protect", {header, header_len}, "base64url encode protect error") &&
+      set_encoded(recipient, "encrypted_key", {encrypted_cek, encrypted_cek_len},
                   "base64url encode encrypted_cek error") &&
-      set_encoded(members, "iv", iv, iv_len, "base64url encode iv error") &&
-      set_encoded(members, "ciphertext", cipher, cipher_len, "base64url encode ciphertext error") &&
-      set_encoded(members, "tag", tag, tag_len, "base64url encode tag error");
+      set_encoded(members, "iv", {iv, iv_len}, "base64url encode iv error") &&
+      set_encoded(members, "ciphertext", {cipher, cipher_len},
+                  "base64url encode ciphertext error") &&
+      set_encoded(members, "tag", {tag, tag_len}, "base64url encode tag error");
   return complete ? jwe.release() : nullptr;
 }
 

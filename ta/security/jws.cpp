@@ -250,18 +250,10 @@ static jsmn_string slice_of(const char *text) {
   return {text, static_cast<uint32_t>(strlen(text))};
 }
 
-// base64url of `text` up to its terminator, as a member of `into`.
-static char *encode_text(const char *text, const char *failed,
-                         const char *as = __builtin_FUNCTION()) {
-  char *encoded = base64urlEncodeAddEndZero(reinterpret_cast<const uint8_t *>(text),
-                                            static_cast<uint32_t>(strlen(text)));
-  CHECK_AS(as, encoded != nullptr, nullptr, "%s", failed);
-  return encoded;
-}
-
-static char *encode_signature(const char *payload, const char *protect, TEE_ObjectHandle key,
-                              const char *as = __builtin_FUNCTION()) {
-  const jsmn_string payload_slice = slice_of(payload);
+// Signs the payload that is in the envelope already.
+static bool add_signature(JSON_Object *envelope, const char *protect, TEE_ObjectHandle key,
+                          const char *as = __builtin_FUNCTION()) {
+  const jsmn_string payload_slice = slice_of(json_object_get_string(envelope, "payload"));
   const jsmn_string protect_slice = slice_of(protect);
   tee_ptr<uint8_t> signature;
   uint32_t len = 0;
@@ -269,10 +261,11 @@ static char *encode_signature(const char *payload, const char *protect, TEE_Obje
       key != TEE_HANDLE_NULL
           ? sign_with_spaik_key(&payload_slice, &protect_slice, out(signature), &len, key)
           : sign_with_tee_key(&payload_slice, &protect_slice, out(signature), &len);
-  if (result != TEE_SUCCESS) return nullptr;
-  char *encoded = base64urlEncodeAddEndZero(signature.get(), len);
-  CHECK_AS(as, encoded != nullptr, nullptr, "base64url encode signature error");
-  return encoded;
+  if (result != TEE_SUCCESS) return false;
+  CHECK_AS(as,
+           json_object_set_base64url(envelope, "signature", {signature.get(), len}) == JSONSuccess,
+           false, "base64url encode signature error");
+  return true;
 }
 
 char *construct_json_signature(const char *name, const char *payload, const char *protect,
@@ -281,20 +274,19 @@ char *construct_json_signature(const char *name, const char *payload, const char
   const json_ptr root(json_value_init_object());
   CHECK(name != nullptr && payload != nullptr && protect != nullptr, nullptr, "null parameter");
   CHECK(root, nullptr, "init response json error");
-  tee_ptr<char> payload_text(encode_text(payload, "base64url encode payload error"));
-  if (!payload_text) return nullptr;
-  tee_ptr<char> protect_text(encode_text(protect, "base64url encode protect error"));
-  if (!protect_text) return nullptr;
-  tee_ptr<char> signature_text(encode_signature(payload_text.get(), protect_text.get(), key));
-  if (!signature_text) return nullptr;
-
   json_ptr envelope(json_value_init_object());
   CHECK(envelope, nullptr, "json_parse_string error");
   JSON_Object *members = json_value_get_object(envelope.get());
+  CHECK(json_object_set_base64url(members, "payload", text_part(payload)) == JSONSuccess, nullptr,
+        "base64url encode payload error");
+  const data_part header_part = text_part(protect);
+  const tee_ptr<char> protect_text(
+      base64urlEncodeAddEndZero(static_cast<const uint8_t *>(header_part.data), header_part.len));
+  CHECK(protect_text, nullptr, "base64url encode protect error");
+
   const bool complete =
-      json_object_take_base64url(members, "payload", &payload_text) == JSONSuccess &&
-      json_object_take_base64url(members, "signature", &signature_text) == JSONSuccess &&
-      json_object_take_base64url(members, "protect", &protect_text) == JSONSuccess &&
+      add_signature(members, protect_text.get(), key) &&
+      json_object_set_string(members, "protect", protect_text.get()) == JSONSuccess &&
       add_signature_header(members, TA_SIGNATURE_HEADER_MODE);
   if (!complete) return nullptr;
   if (own_header && json_object_take(members, "header", &own_header) != JSONSuccess) return nullptr;

@@ -148,16 +148,15 @@ TEE_Result judge_sp_exist(const JSON_Value *spl, const char *spid) {
 
 TEE_Result append_aik_entry(JSON_Value *spl, const char *spid, const uint8_t *key, uint32_t key_len,
                             const char *spaiktype, const char *as) {
-  const tee_ptr<char> spaik(base64urlEncodeAddEndZero(key, key_len));
-  CHECK_AS(as, spaik, TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero pubkey fail");
   json_ptr entry(json_value_init_object());
   CHECK_AS(as, entry, TEE_ERROR_OUT_OF_MEMORY, "json_value_init_object teeaiklist_item_value fail");
   JSON_Object *members = json_value_get_object(entry.get());
   CHECK_AS(as, members != nullptr, TEE_ERROR_OUT_OF_MEMORY,
            "json_value_get_object teeaiklist_item_object fail");
 
-  const bool filled = json_object_set_string(members, "spaik", spaik.get()) == JSONSuccess &&
-                      json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
+  CHECK_AS(as, json_object_set_base64url(members, "spaik", {key, key_len}) == JSONSuccess,
+           TEE_ERROR_OUT_OF_MEMORY, "base64urlEncodeAddEndZero pubkey fail");
+  const bool filled = json_object_set_string(members, "spaiktype", spaiktype) == JSONSuccess &&
                       json_object_set_string(members, "spid", spid) == JSONSuccess &&
                       json_array_take(json_value_get_array(spl), &entry) == JSONSuccess;
   CHECK_AS(as, filled, TEE_ERROR_OUT_OF_MEMORY, "set dsi->spl fail");

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: BSD-2-Clause
 #include "state/json.h"
 
+#include "crypto/base64.h"
+#include "failure.h"
 #include "state/json_node.h"
 
 // ---- Blocks
@@ -305,22 +307,22 @@ static void set_text(JSON_Value *value, char *text, const text_form &form) {
   if (form.plain) value->flags |= kPlainText;
 }
 
-// A value in a block of its own, together with its name and its text, where it has them.
-static JSON_Value *new_value(json_type type, const char *name, const char *text,
-                             const text_form &form) {
-  const text_form name_form = name != nullptr ? form_of(name) : text_form{};
-  json_extent extent = {1, 0, 0};
-  if (name != nullptr) extent.text_len += uint64_t{name_form.len} + 1;
-  if (text != nullptr) extent.text_len += uint64_t{form.len} + 1;
+// A value in a block of its own, together with its name, where it has one, and room for a text.
+static JSON_Value *new_value(json_type type, const char *name, uint64_t text_len, json_room *room) {
+  const text_form form = name != nullptr ? form_of(name) : text_form{};
+  if (name != nullptr) text_len += uint64_t{form.len} + 1;
+  JSON_Value *value = new_block({1, 0, text_len}, type, room);
+  if (value == nullptr || name == nullptr) return value;
+  const auto len = static_cast<uint32_t>(form.len);
+  set_name(value, new_text(room, name, len), len, form.plain);
+  return value;
+}
+
+static JSON_Value *new_string(const char *name, const char *text, const text_form &form) {
   json_room room;
-  JSON_Value *value = new_block(extent, type, &room);
+  JSON_Value *value = new_value(kJsonString, name, uint64_t{form.len} + 1, &room);
   if (value == nullptr) return nullptr;
-  if (name != nullptr) {
-    const auto len = static_cast<uint32_t>(name_form.len);
-    set_name(value, new_text(&room, name, len), len, name_form.plain);
-  }
-  if (text != nullptr)
-    set_text(value, new_text(&room, text, static_cast<uint32_t>(form.len)), form);
+  set_text(value, new_text(&room, text, static_cast<uint32_t>(form.len)), form);
   return value;
 }
 
@@ -403,21 +405,23 @@ JSON_Status json_object_set_string(JSON_Object *object, const char *name, const 
   const text_form form = form_of(string);
   member_place place;
   if (!form.utf8 || !find_place(object, name, &place)) return JSONFailure;
-  JSON_Value *member = new_value(kJsonString, name, string, form);
+  JSON_Value *member = new_string(name, string, form);
   if (member == nullptr) return JSONFailure;
   put_member(object, place, member);
   return JSONSuccess;
 }
 
-JSON_Status json_object_take_base64url(JSON_Object *object, const char *name, tee_ptr<char> *text) {
-  if (object == nullptr || name == nullptr || !*text) return JSONFailure;
-  const text_form form = {strlen(text->get()), true, true};
+JSON_Status json_object_set_base64url(JSON_Object *object, const char *name,
+                                      const data_part &bytes) {
   member_place place;
-  if (form.len >= UINT32_MAX || !find_place(object, name, &place)) return JSONFailure;
-  JSON_Value *member = new_value(kJsonString, name, nullptr, {});
-  if (member == nullptr) return JSONFailure;
-  set_text(member, text->release(), form);
-  member->flags |= kOwnsText;
+  if (object == nullptr || name == nullptr || bytes.data == nullptr ||
+      !find_place(object, name, &place)) {
+    return JSONFailure;
+  }
+  json_room room;
+  JSON_Value *member = new_value(kJsonString, name, base64_room(bytes.len), &room);
+  CHECK_AS("base64urlEncodeAddEndZero", member != nullptr, JSONFailure, "bad parameter");
+  set_text(member, room.texts, {base64url_encode_to(bytes, room.texts), true, true});
   put_member(object, place, member);
   return JSONSuccess;
 }
@@ -426,7 +430,8 @@ JSON_Status json_object_set_number(JSON_Object *object, const char *name, double
   if (object == nullptr || name == nullptr || number - number != 0) return JSONFailure;
   member_place place;
   if (!find_place(object, name, &place)) return JSONFailure;
-  JSON_Value *member = new_value(kJsonNumber, name, nullptr, {});
+  json_room room;
+  JSON_Value *member = new_value(kJsonNumber, name, 0, &room);
   if (member == nullptr) return JSONFailure;
   member->number = number;
   put_member(object, place, member);
@@ -450,7 +455,7 @@ JSON_Status json_array_append_string(JSON_Array *array, const char *string) {
     return JSONFailure;
   const text_form form = form_of(string);
   if (!form.utf8) return JSONFailure;
-  JSON_Value *value = new_value(kJsonString, nullptr, string, form);
+  JSON_Value *value = new_string(nullptr, string, form);
   if (value == nullptr) return JSONFailure;
   append(array, value);
   return JSONSuccess;

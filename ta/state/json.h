@@ -18,6 +18,7 @@
 
 #include <stddef.h>
 
+#include "data_part.h"
 #include "ownership.h"
 
 struct JSON_Value;
@@ -92,10 +93,14 @@ json_match json_array_match(const JSON_Array *array, size_t index, const char *n
 ///
 /// json_object_set_value takes `value` over only when it succeeds. It refuses one that is part of
 /// a document already, or that holds `object`. A string must be well-formed UTF-8, a number finite.
+/// json_object_set_base64url sets the text that the bytes are encoded to; for want of memory it
+/// logs what the encoder would.
 [[nodiscard]] JSON_Status json_object_set_value(JSON_Object *object, const char *name,
                                                 JSON_Value *value);
 [[nodiscard]] JSON_Status json_object_set_string(JSON_Object *object, const char *name,
                                                  const char *string);
+[[nodiscard]] JSON_Status json_object_set_base64url(JSON_Object *object, const char *name,
+                                                    const data_part &bytes);
 [[nodiscard]] JSON_Status json_object_set_number(JSON_Object *object, const char *name,
                                                  double number);
 
@@ -103,12 +108,9 @@ json_match json_array_match(const JSON_Array *array, size_t index, const char *n
 [[nodiscard]] JSON_Status json_array_append_value(JSON_Array *array, JSON_Value *value);
 [[nodiscard]] JSON_Status json_array_append_string(JSON_Array *array, const char *string);
 
-/// The same for a value, or a text, that has an owner, which holds it no longer after a success.
-/// The name of a value is not copied: it is a literal, or else outlives the document. A text is not
-/// looked at: it must have come from base64urlEncodeAddEndZero.
+/// The same for a value that has an owner, which holds it no longer after a success. The name is
+/// not copied: it is a literal, or else outlives the document.
 [[nodiscard]] JSON_Status json_object_take(JSON_Object *object, const char *name, json_ptr *value);
-[[nodiscard]] JSON_Status json_object_take_base64url(JSON_Object *object, const char *name,
-                                                     tee_ptr<char> *text);
 [[nodiscard]] JSON_Status json_array_take(JSON_Array *array, json_ptr *value);
 
 /// Frees an element; the array's last one moves there.
