@@ -26,7 +26,7 @@ struct work {
   slice_ptr payload;
   token_object_ptr request;
   tee_ptr<char> tsmid;
-  secret_text response;
+  tee_ptr<char> response;
   secret_bytes image;
 };
 

@@ -139,14 +139,13 @@ JSON_Value *encrypt_json_with_cbc_iv_cek(TEE_ObjectHandle key, const JSON_Value 
   if (cek_len != kCbcCekLen) return nullptr;
   const tee_ptr<char> aad(base64urlEncodeAddEndZero(bytes_of(header), header_len));
   CHECK(aad, nullptr, "base64urlEncodeAddEndZero protect error");
-  json_text plain(json_serialize_to_string(value));
-  CHECK(plain, nullptr, "json_serialize_to_string error");
+  secret_bytes plain;
+  CHECK(json_serialize_to_bytes(value, &plain), nullptr, "json_serialize_to_string error");
 
   tee_ptr<uint8_t> cipher;
   uint32_t cipher_len = 0;
-  const TEE_Result encrypted =
-      aes_cbc_encrypt(get_aes_key_from_cek(cek), kAesBlockLen, iv, iv_len, bytes_of(plain.get()),
-                      len_of(plain.get()), out(cipher), &cipher_len);
+  const TEE_Result encrypted = aes_cbc_encrypt(get_aes_key_from_cek(cek), kAesBlockLen, iv, iv_len,
+                                               plain.data, plain.len, out(cipher), &cipher_len);
   if (encrypted != TEE_SUCCESS) return nullptr;
   plain.reset();
   tee_ptr<uint8_t> tag;
@@ -168,8 +167,8 @@ JSON_Value *encrypt_json_with_gcm_iv_cek(TEE_ObjectHandle key, const JSON_Value 
                                          const uint8_t *iv, uint32_t iv_len, const uint8_t *cek,
                                          uint32_t cek_len, const char *header,
                                          uint32_t header_len) {
-  json_text plain(json_serialize_to_string(value));
-  CHECK(plain, nullptr, "json_serialize_to_string json error");
+  secret_bytes plain;
+  CHECK(json_serialize_to_bytes(value, &plain), nullptr, "json_serialize_to_string json error");
   const tee_ptr<char> aad(base64urlEncodeAddEndZero(bytes_of(header), header_len));
   CHECK(aad, nullptr, "base64urlEncodeAddEndZero protect get tmp_protect is null");
 
@@ -177,9 +176,9 @@ JSON_Value *encrypt_json_with_gcm_iv_cek(TEE_ObjectHandle key, const JSON_Value 
   uint32_t cipher_len = 0;
   tee_ptr<uint8_t> tag;
   uint32_t tag_len = 0;
-  const TEE_Result encrypted = aes_gcm_encrypt(
-      cek, cek_len, iv, iv_len, bytes_of(aad.get()), len_of(aad.get()), bytes_of(plain.get()),
-      len_of(plain.get()), out(cipher), &cipher_len, out(tag), &tag_len);
+  const TEE_Result encrypted =
+      aes_gcm_encrypt(cek, cek_len, iv, iv_len, bytes_of(aad.get()), len_of(aad.get()), plain.data,
+                      plain.len, out(cipher), &cipher_len, out(tag), &tag_len);
   if (encrypted != TEE_SUCCESS) return nullptr;
   plain.reset();
   tee_ptr<uint8_t> encrypted_cek;

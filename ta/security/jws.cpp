@@ -253,7 +253,8 @@ static jsmn_string slice_of(const char *text) {
 // Signs the payload that is in the envelope already.
 static bool add_signature(JSON_Object *envelope, const char *protect, TEE_ObjectHandle key,
                           const char *as = __builtin_FUNCTION()) {
-  const jsmn_string payload_slice = slice_of(json_object_get_string(envelope, "payload"));
+  const data_part payload = json_object_get_text(envelope, "payload");
+  const jsmn_string payload_slice = {static_cast<const char *>(payload.data), payload.len};
   const jsmn_string protect_slice = slice_of(protect);
   tee_ptr<uint8_t> signature;
   uint32_t len = 0;
@@ -302,7 +303,7 @@ TEE_Result sign_encode_by_name_with_key(const char *response, const char *name,
   const uint32_t capacity = *len;
   *len = 0;
   CHECK(response != nullptr, OTRP_MISSING, "sign_encode_by_name_with_key input is NULL");
-  const json_text envelope(
+  const tee_ptr<char> envelope(
       construct_json_signature(name, response, JWS_HEADER_RS256, nullptr, key));
   CHECK(envelope, OTRP_RESPONSE_FAILED, "construct_json_signature error");
   const size_t envelope_len = strlen(envelope.get());

@@ -313,10 +313,10 @@ JSON_Value *construct_dsi() {
 
 // ---- Its hash
 
-static char *dsi_serialize_to_json(dsi_t *lists) {
+static bool dsi_serialize_to_json(dsi_t *lists, secret_bytes *text) {
   const json_ptr document(make_document(lists, "dsi_get_json_dsi"));
-  CHECK(document, nullptr, "dsi_get_json_dsi error");
-  return json_serialize_to_string(document.get());
+  CHECK(document, false, "dsi_get_json_dsi error");
+  return json_serialize_to_bytes(document.get(), text);
 }
 
 static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
@@ -330,13 +330,13 @@ static void write_hex(const uint8_t *bytes, uint32_t len, char *text) {
 // What a TSM hashes is what it got: the document in base64.
 static TEE_Result digest_dsi(dsi_t *lists, uint8_t *digest, uint32_t digest_len,
                              const char *as = __builtin_FUNCTION()) {
-  const json_text text(dsi_serialize_to_json(lists));
-  CHECK_AS(as, text, TEE_ERROR_GENERIC, "dsi_serialize_to_json error");
-  const tee_ptr<char> encoded(base64EncodeAddEndZero(reinterpret_cast<const uint8_t *>(text.get()),
-                                                     static_cast<uint32_t>(strlen(text.get()))));
+  secret_bytes text;
+  CHECK_AS(as, dsi_serialize_to_json(lists, &text), TEE_ERROR_GENERIC,
+           "dsi_serialize_to_json error");
+  const tee_ptr<char> encoded(base64EncodeAddEndZero(text.data, text.len));
   CHECK_AS(as, encoded, TEE_ERROR_OUT_OF_MEMORY, "base64EncodeAddEndZero error now_dsi_str error");
-  return do_digest_with_sha(TEE_ALG_SHA256, encoded.get(),
-                            static_cast<uint32_t>(strlen(encoded.get())), digest, &digest_len);
+  const auto encoded_len = static_cast<uint32_t>(base64_room(text.len) - 1);
+  return do_digest_with_sha(TEE_ALG_SHA256, encoded.get(), encoded_len, digest, &digest_len);
 }
 
 TEE_Result dsi_validate_dsi_hash(const dsi_json_str_t *dsi, const char *hash) {

@@ -190,6 +190,12 @@ const char *json_object_get_string(const JSON_Object *object, const char *name) 
   return value_text(json_object_get_value(object, name));
 }
 
+data_part json_object_get_text(const JSON_Object *object, const char *name) {
+  const JSON_Value *value = json_object_get_value(object, name);
+  const char *text = value_text(value);
+  return {text, text != nullptr ? value->count : 0};
+}
+
 JSON_Object *json_object_get_object(const JSON_Object *object, const char *name) {
   return json_value_get_object(json_object_get_value(object, name));
 }

@@ -67,6 +67,7 @@ JSON_Array *json_value_get_array(const JSON_Value *value);
 
 JSON_Value *json_object_get_value(const JSON_Object *object, const char *name);
 const char *json_object_get_string(const JSON_Object *object, const char *name);
+data_part json_object_get_text(const JSON_Object *object, const char *name);  // with its length
 JSON_Object *json_object_get_object(const JSON_Object *object, const char *name);
 JSON_Array *json_object_get_array(const JSON_Object *object, const char *name);
 
@@ -124,6 +125,9 @@ json_match json_array_match(const JSON_Array *array, size_t index, const char *n
 /// A new text without white space outside strings. Slashes are escaped, control characters that
 /// have no letter of their own and bytes above 0x7F stand as they are.
 char *json_serialize_to_string(const JSON_Value *value);
+
+/// The same with its length, for a text that is long.
+[[nodiscard]] bool json_serialize_to_bytes(const JSON_Value *value, secret_bytes *text);
 
 /// The same, one member or element a line, indented by four spaces a level.
 char *json_serialize_to_string_pretty(const JSON_Value *value);

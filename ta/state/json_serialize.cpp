@@ -260,7 +260,8 @@ static void put_document(text_sink *out, const JSON_Value *root, bool pretty) {
   }
 }
 
-static char *serialize(const JSON_Value *value, bool pretty) {
+static char *serialize(const JSON_Value *value, bool pretty, uint32_t *len) {
+  *len = 0;
   if (value == nullptr) return nullptr;
   text_sink out = {};
   put_document(&out, value, pretty);
@@ -270,13 +271,21 @@ static char *serialize(const JSON_Value *value, bool pretty) {
   out = {text, 0};
   put_document(&out, value, pretty);
   text[out.len] = 0;
+  *len = static_cast<uint32_t>(out.len);
   return text;
 }
 
 char *json_serialize_to_string(const JSON_Value *value) {
-  return serialize(value, false);
+  uint32_t len;
+  return serialize(value, false, &len);
+}
+
+bool json_serialize_to_bytes(const JSON_Value *value, secret_bytes *text) {
+  text->data = reinterpret_cast<uint8_t *>(serialize(value, false, &text->len));
+  return text->data != nullptr;
 }
 
 char *json_serialize_to_string_pretty(const JSON_Value *value) {
-  return serialize(value, true);
+  uint32_t len;
+  return serialize(value, true, &len);
 }
