@@ -20,10 +20,8 @@ constexpr uint32_t kAlLen = 8;
 
 const char kGcmHeader[] = JWE_HEADER_A128GCM;
 
-const char kJweTemplate[] =
-    "{\"protect\":\"\","
-    "\"recipients\":[{\"header\":{\"alg\":\"RSA1_5\"},\"encrypted_key\":\"\"}],"
-    "\"iv\":\"\",\"ciphertext\":\"\",\"tag\":\"\"}";
+// What is set besides comes behind it, in its objects.
+const char kJweTemplate[] = "{\"protect\":\"\",\"recipients\":[{\"header\":{\"alg\":\"RSA1_5\"}}]}";
 
 // The members of a JWE object, as they stand in it and decoded.
 struct jwe_text {

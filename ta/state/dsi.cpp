@@ -20,7 +20,7 @@ namespace {
 
 const char kSdEntryTemplate[] = "{\"name\":\"\",\"spid\":\"\",\"talist\":[]}";
 
-// Members marked "..." are replaced; the order of all is the order in the document.
+// The lists come behind what is here: "cnt" and "sd" into "sdlist", and "teeaiklist".
 const char kDsiTemplate[] =
     "{\"dsi\":{"
     "\"tfwdata\":{"
@@ -33,8 +33,7 @@ const char kDsiTemplate[] =
     "\"ver\":\"TEE version\","
     "\"cert\":\"BASE64 encoded TEE cert\","
     "\"cacert\":\"JSON array value of CA certificates up to the root CA\","
-    "\"sdlist\":{\"cnt\":\"...\",\"sd\":\"...\"},"
-    "\"teeaiklist\":\"...\"}}}";
+    "\"sdlist\":{}}}}";
 
 constexpr uint32_t kHashTextLen = 2 * kSha256Len;
 
