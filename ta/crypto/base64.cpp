@@ -53,15 +53,19 @@ static inline quartets first_byte_lowest(quartets numbers) {
 // ---- Encoding
 
 static uint32_t load_big_endian(const uint8_t *bytes) {
-  return uint32_t{bytes[0]} << 24 | uint32_t{bytes[1]} << 16 | uint32_t{bytes[2]} << 8 | bytes[3];
+  uint32_t number;
+  memcpy(&number, bytes, sizeof number);
+  return kLittleEndian ? __builtin_bswap32(number) : number;
 }
 
 // Reads one byte more than it encodes.
 template <const alphabet &To>
 static void encode_block(const uint8_t *bytes, char *text) {
-  quartets bits;
+  uint32_t groups[kNumQuartets];
 #pragma GCC unroll 4
-  for (uint32_t i = 0; i < kNumQuartets; ++i) bits[i] = load_big_endian(bytes + 3 * i);
+  for (uint32_t i = 0; i < kNumQuartets; ++i) groups[i] = load_big_endian(bytes + 3 * i);
+  quartets bits;
+  memcpy(&bits, groups, sizeof bits);
   const quartets pairs = bits >> 20 | ((bits << 8) & 0x0FFF0000);
   const quartets split = first_byte_lowest(((pairs >> 6) & 0x003F003F) | (pairs & 0x003F003F) << 8);
   characters values;
