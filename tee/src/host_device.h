@@ -13,6 +13,7 @@
 #include <mutex>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "faults.h"
 #include "persistent.h"
@@ -45,7 +46,7 @@ class HostDevice {
   std::recursive_mutex lock;  // guards everything but `faults`, which locks itself
   FaultPlans faults;
   std::unique_ptr<Storage> storage;
-  OpenObjects open_objects;
+  std::vector<OpenData *> open_data;                  // of all instances
   std::function<void(std::string_view)> watch_freed;  // for tests; empty: nobody does
   bool creates_at_once = false;  // a creation without data is stored like one with data
 

@@ -7,25 +7,20 @@
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 
+#include "persistent.h"
 #include "rsa_key.h"
 
-namespace tee {
-struct OpenData;  // an open data stream of the object store
-}
-
 struct __TEE_ObjectHandle {
-  __TEE_ObjectHandle();
-  ~__TEE_ObjectHandle();
-
   uint32_t type = TEE_TYPE_DATA;
   uint32_t max_size = 0;  // bits
   uint32_t size = 0;      // bits; 0 until populated or generated
   uint32_t usage = 0xFFFFFFFF;
   uint32_t handle_flags = 0;  // TEE_HANDLE_FLAG_*, and TEE_DATA_FLAG_* of a persistent object
   tee::Attributes attributes;
-  tee::SharedKey rsa;                         // made of them once; NULL unless an RSA key is set
-  std::unique_ptr<tee::OpenData> persistent;  // NULL for a transient object
+  tee::SharedKey rsa;                       // made of them once; NULL unless an RSA key is set
+  std::optional<tee::OpenData> persistent;  // nothing for a transient object
 };
 
 namespace tee {

@@ -8,12 +8,7 @@
 
 #include "error.h"
 #include "object.h"
-#include "persistent.h"
 #include "running.h"
-
-__TEE_ObjectHandle::__TEE_ObjectHandle() = default;
-
-__TEE_ObjectHandle::~__TEE_ObjectHandle() = default;
 
 namespace tee {
 
@@ -116,7 +111,7 @@ bool set_key(__TEE_ObjectHandle &object) {
 
 __TEE_ObjectHandle &checked_blank_object(TEE_ObjectHandle handle, const char *call) {
   __TEE_ObjectHandle &object = checked_object(handle, call);
-  if (object.persistent != nullptr) panic(call, "object is persistent");
+  if (object.persistent) panic(call, "object is persistent");
   if ((object.handle_flags & TEE_HANDLE_FLAG_INITIALIZED) != 0) {
     panic(call, "object is initialized already");
   }
@@ -173,7 +168,7 @@ void close_handle(TEE_ObjectHandle handle) {
 }
 
 TEE_Result closed_if_corrupt(TEE_ObjectHandle handle, TEE_Result result) {
-  if (result == TEE_ERROR_CORRUPT_OBJECT && handle->persistent != nullptr) close_handle(handle);
+  if (result == TEE_ERROR_CORRUPT_OBJECT && handle->persistent) close_handle(handle);
   return result;
 }
 
@@ -189,7 +184,7 @@ using namespace tee;
 
 TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo *objectInfo) {
   const __TEE_ObjectHandle &known = checked_object(object, __func__);
-  const Fault kind = known.persistent != nullptr ? Fault::kStorage : Fault::kCrypto;
+  const Fault kind = known.persistent ? Fault::kStorage : Fault::kCrypto;
   if (TEE_Result code; fault_due(kind, __func__, TEE_ERROR_CORRUPT_OBJECT, &code)) {
     return closed_if_corrupt(object, code);
   }
@@ -199,8 +194,8 @@ TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo *objectInf
       .objectSize = known.size,
       .maxObjectSize = known.max_size,
       .objectUsage = known.usage,
-      .dataSize = known.persistent != nullptr ? known.persistent->data_size() : 0,
-      .dataPosition = known.persistent != nullptr ? known.persistent->position() : 0,
+      .dataSize = known.persistent ? known.persistent->data_size() : 0,
+      .dataPosition = known.persistent ? known.persistent->position() : 0,
       .handleFlags = known.handle_flags,
   };
   return TEE_SUCCESS;
@@ -245,9 +240,7 @@ TEE_Result TEE_AllocateTransientObject(TEE_ObjectType objectType, uint32_t maxOb
 
 void TEE_FreeTransientObject(TEE_ObjectHandle object) {
   if (object == TEE_HANDLE_NULL) return;
-  if (checked_object(object, __func__).persistent != nullptr) {
-    panic(__func__, "object is persistent");
-  }
+  if (checked_object(object, __func__).persistent) panic(__func__, "object is persistent");
   close_handle(object);
 }
 

@@ -24,13 +24,12 @@ constexpr size_t kMaxObjectLen = 0x20000000;
 
 OpenData::OpenData(HostDevice &of_device, std::shared_ptr<OpenObject> opened, uint32_t handle_flags)
     : device(of_device), object(std::move(opened)), flags(handle_flags) {
-  object->handles.push_back(flags);
+  device.open_data.push_back(this);
 }
 
 OpenData::~OpenData() {
   const std::lock_guard guard(device.lock);
-  object->handles.erase(std::ranges::find(object->handles, flags));
-  object.reset();
+  std::erase(device.open_data, this);
 }
 
 void OpenData::store(Bytes data) {
@@ -57,20 +56,26 @@ void check_flags(uint32_t flags, uint32_t allowed, const char *call) {
 }
 
 OpenData &checked_data(TEE_ObjectHandle handle, uint32_t right, const char *call) {
-  const __TEE_ObjectHandle &object = checked_object(handle, call);
+  __TEE_ObjectHandle &object = checked_object(handle, call);
   if (!object.persistent) panic(call, "object is not persistent");
   if ((object.persistent->flags & right) == 0) panic(call, "handle lacks the access right");
   return *object.persistent;
 }
 
+std::shared_ptr<OpenObject> find_open(const HostDevice &device, const ObjectKey &key) {
+  const auto known = std::ranges::find_if(
+      device.open_data, [&](const OpenData *data) { return data->object->key == key; });
+  return known != device.open_data.end() ? (*known)->object : nullptr;
+}
+
 // Among several handles, a right that one of them has must be shared by all (section 5.7).
-bool may_join(const std::vector<uint32_t> &handles, uint32_t flags) {
-  if (handles.empty()) return true;
+bool may_join(const HostDevice &device, const OpenObject &object, uint32_t flags) {
   uint32_t used = flags;
   uint32_t shared = flags;
-  for (const uint32_t other : handles) {
-    used |= other;
-    shared &= other;
+  for (const OpenData *other : device.open_data) {
+    if (other->object.get() != &object) continue;
+    used |= other->flags;
+    shared &= other->flags;
   }
   const bool reads = (used & TEE_DATA_FLAG_ACCESS_READ) != 0;
   const bool writes = (used & TEE_DATA_FLAG_ACCESS_WRITE) != 0;
@@ -79,35 +84,26 @@ bool may_join(const std::vector<uint32_t> &handles, uint32_t flags) {
          (!writes || (shared & TEE_DATA_FLAG_SHARE_WRITE) != 0);
 }
 
-std::shared_ptr<OpenObject> find_open(HostDevice &device, const ObjectKey &key) {
-  const auto open = std::ranges::find(device.open_objects, key, &OpenObject::key);
-  return open != device.open_objects.end() ? (*open)->shared_from_this() : nullptr;
-}
-
-// NULL when there is no such object.
-std::shared_ptr<OpenObject> find_or_load(HostDevice &device, const ObjectKey &key) {
-  if (auto open = find_open(device, key)) return open;
-  std::optional<Bytes> data = device.storage->load(key);
-  if (!data) return nullptr;
-  auto object = std::make_shared<OpenObject>(device.open_objects, key);
-  object->data = std::move(*data);
-  return object;
-}
-
-TEE_ObjectHandle hand_out(std::unique_ptr<OpenData> data) {
-  auto object = std::make_unique<__TEE_ObjectHandle>();
-  object->handle_flags = data->flags | TEE_HANDLE_FLAG_PERSISTENT | TEE_HANDLE_FLAG_INITIALIZED;
-  object->persistent = std::move(data);
-  return open_handle(std::move(object));
+std::unique_ptr<__TEE_ObjectHandle> new_handle(HostDevice &device,
+                                               std::shared_ptr<OpenObject> object, uint32_t flags) {
+  auto handle = std::make_unique<__TEE_ObjectHandle>();
+  handle->handle_flags = flags | TEE_HANDLE_FLAG_PERSISTENT | TEE_HANDLE_FLAG_INITIALIZED;
+  handle->persistent.emplace(device, std::move(object), flags);
+  return handle;
 }
 
 TEE_Result open_object(const ObjectKey &key, uint32_t flags, TEE_ObjectHandle *handle) {
   HostDevice &device = current_instance().device;
   const std::lock_guard guard(device.lock);
-  std::shared_ptr<OpenObject> object = find_or_load(device, key);
-  if (!object) return TEE_ERROR_ITEM_NOT_FOUND;
-  if (!may_join(object->handles, flags)) return TEE_ERROR_ACCESS_CONFLICT;
-  *handle = hand_out(std::make_unique<OpenData>(device, std::move(object), flags));
+  std::shared_ptr<OpenObject> object = find_open(device, key);
+  if (object == nullptr) {
+    std::optional<Bytes> data = device.storage->load(key);
+    if (!data) return TEE_ERROR_ITEM_NOT_FOUND;
+    object = std::make_shared<OpenObject>(OpenObject{key, std::move(*data)});
+  } else if (!may_join(device, *object, flags)) {
+    return TEE_ERROR_ACCESS_CONFLICT;
+  }
+  *handle = open_handle(new_handle(device, std::move(object), flags));
   return TEE_SUCCESS;
 }
 
@@ -121,12 +117,12 @@ TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
   }
   if (data.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
 
-  auto object = std::make_shared<OpenObject>(device.open_objects, key);
-  auto opened =
-      std::make_unique<OpenData>(device, std::move(object), flags & (kAccessFlags | kShareFlags));
-  opened->object->creation_waits = true;
-  if (!data.empty() || device.creates_at_once) opened->store({data.begin(), data.end()});
-  *handle = hand_out(std::move(opened));
+  auto object = std::make_shared<OpenObject>(OpenObject{key, {}, true});
+  auto created = new_handle(device, std::move(object), flags & (kAccessFlags | kShareFlags));
+  if (!data.empty() || device.creates_at_once) {
+    created->persistent->store({data.begin(), data.end()});
+  }
+  *handle = open_handle(std::move(created));
   return TEE_SUCCESS;
 }
 
@@ -210,9 +206,9 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void *objectID,
 
 void TEE_CloseObject(TEE_ObjectHandle object) {
   if (object == TEE_HANDLE_NULL) return;
-  if (OpenData *data = checked_object(object, __func__).persistent.get()) {
+  if (checked_object(object, __func__).persistent) {
     result_of([&] {
-      store_waiting_creation(*data);
+      store_waiting_creation(*object->persistent);
       return TEE_SUCCESS;
     });
   }

@@ -21,27 +21,15 @@
 namespace tee {
 
 class HostDevice;
-struct OpenObject;
 
-/// The objects of a device that have an open handle. They are few.
-using OpenObjects = std::vector<OpenObject *>;
-
-struct OpenObject : std::enable_shared_from_this<OpenObject> {
-  OpenObject(OpenObjects &among, const ObjectKey &object_key) : table(among), key(object_key) {
-    table.push_back(this);
-  }
-  ~OpenObject() { std::erase(table, this); }
-  OpenObject(const OpenObject &) = delete;
-  OpenObject &operator=(const OpenObject &) = delete;
-
-  OpenObjects &table;
+/// An object that has an open handle.
+struct OpenObject {
   const ObjectKey key;
   Bytes data;
-  bool creation_waits = false;    // storage has no such object yet, or the one that it replaces
-  std::vector<uint32_t> handles;  // TEE_DATA_FLAG_* of each
+  bool creation_waits = false;  // storage has no such object yet, or the one that it replaces
 };
 
-/// What one handle knows of its object.
+/// What one handle knows of its object. The device has a list of them.
 struct OpenData {
   OpenData(HostDevice &of_device, std::shared_ptr<OpenObject> opened, uint32_t handle_flags);
   ~OpenData();
@@ -56,7 +44,7 @@ struct OpenData {
 
   HostDevice &device;
   std::shared_ptr<OpenObject> object;
-  const uint32_t flags;
+  const uint32_t flags;  // TEE_DATA_FLAG_*
   uint32_t at = 0;
 };
 
