@@ -109,7 +109,8 @@ class Device {
 };
 
 /// Makes this thread run as an instance of a trusted application of `device` while it lives, so
-/// that a unit test may call TEE_* functions, or code that does, directly.
+/// that a unit test may call TEE_* functions, or code that does, directly. Other threads do not
+/// enter the device meanwhile.
 class InsideTa {
  public:
   /// An instance with a heap of its own; its entry points are not called. `device` must live

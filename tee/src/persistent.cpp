@@ -28,7 +28,6 @@ OpenData::OpenData(HostDevice &of_device, std::shared_ptr<OpenObject> opened, ui
 }
 
 OpenData::~OpenData() {
-  const std::lock_guard guard(device.lock);
   std::erase(device.open_data, this);
 }
 
@@ -94,7 +93,6 @@ std::unique_ptr<__TEE_ObjectHandle> new_handle(HostDevice &device,
 
 TEE_Result open_object(const ObjectKey &key, uint32_t flags, TEE_ObjectHandle *handle) {
   HostDevice &device = current_instance().device;
-  const std::lock_guard guard(device.lock);
   std::shared_ptr<OpenObject> object = find_open(device, key);
   if (object == nullptr) {
     std::optional<Bytes> data = device.storage->load(key);
@@ -110,7 +108,6 @@ TEE_Result open_object(const ObjectKey &key, uint32_t flags, TEE_ObjectHandle *h
 TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
                          TEE_ObjectHandle *handle) {
   HostDevice &device = current_instance().device;
-  const std::lock_guard guard(device.lock);
   if (find_open(device, key)) return TEE_ERROR_ACCESS_CONFLICT;
   if ((flags & TEE_DATA_FLAG_OVERWRITE) == 0 && device.storage->load(key)) {
     return TEE_ERROR_ACCESS_CONFLICT;
@@ -127,7 +124,6 @@ TEE_Result create_object(const ObjectKey &key, uint32_t flags, ByteView data,
 }
 
 TEE_Result write_data(OpenData &data, ByteView bytes) {
-  const std::lock_guard guard(data.device.lock);
   if (bytes.empty() && !data.object->creation_waits) return TEE_SUCCESS;
   if (data.at + bytes.size() > kMaxObjectLen) return TEE_ERROR_STORAGE_NO_SPACE;
   Bytes stream = data.object->data;
@@ -139,12 +135,10 @@ TEE_Result write_data(OpenData &data, ByteView bytes) {
 }
 
 void store_waiting_creation(OpenData &data) {
-  const std::lock_guard guard(data.device.lock);
   if (data.object->creation_waits) data.store(data.object->data);
 }
 
 TEE_Result delete_object(OpenData &data) {
-  const std::lock_guard guard(data.device.lock);
   data.device.storage->remove(data.object->key);
   data.object->creation_waits = false;
   return TEE_SUCCESS;
@@ -237,7 +231,6 @@ TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void *buffer, TEE_LengthT
   *count = 0;
   if (TEE_Result code; storage_fault_due(__func__, &code)) return closed_if_corrupt(object, code);
 
-  const std::lock_guard guard(data.device.lock);
   const Bytes &stream = data.object->data;
   const uint32_t left = data.at < stream.size() ? data.data_size() - data.at : 0;
   uint32_t len = std::min(size, left);

@@ -47,7 +47,6 @@ bool closes_cycle(HostDevice &device, const TEE_UUID &destination, const Instanc
 
 TEE_Result open_ta_session(Instance &caller, const TEE_UUID &destination, Message &message,
                            TEE_TASessionHandle *handle) {
-  const std::lock_guard guard(caller.device.lock);
   if (closes_cycle(caller.device, destination, caller)) return TEE_ERROR_BUSY;
   caller.sessions.reserve(caller.sessions.size() + 1);
   const TEE_Identity identity = {TEE_LOGIN_TRUSTED_APP, caller.program.uuid};

@@ -68,8 +68,8 @@ struct Message {
   uint32_t origin = TEE_ORIGIN_TEE;  // where the result arose
 };
 
-/// Makes the calling thread run as `instance` while it lives; `client` is who called with what
-/// message, NULL where there is none.
+/// Makes the calling thread, which holds the lock of the device, run as `instance` while it lives;
+/// `client` is who called with what message, NULL where there is none.
 class Running {
  public:
   explicit Running(Instance &instance, const TEE_Identity *client = nullptr,

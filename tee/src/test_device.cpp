@@ -133,6 +133,7 @@ void reuse_generated_keys(unsigned count, const std::string &folder) {
 
 struct InsideTa::Impl {
   std::shared_ptr<HostDevice> device;
+  std::lock_guard<std::recursive_mutex> entered{device->lock};
   Instance instance;
   Running running;
 
