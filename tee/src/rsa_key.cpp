@@ -132,6 +132,36 @@ SharedKey make_key(const Attributes &given, const Attributes &completion) {
   return made ? share(key) : nullptr;
 }
 
+// The public keys that a thread had last, the latest first. A device gets messages of few senders,
+// with their keys in each, and to import a key takes as long as half a verification with it.
+class PublicKeys {
+ public:
+  SharedKey get(const Attributes &attributes) {
+    const Attributes::Value n = attributes.at(TEE_ATTR_RSA_MODULUS);
+    const Attributes::Value e = attributes.at(TEE_ATTR_RSA_PUBLIC_EXPONENT);
+    auto known = std::ranges::find_if(keys_, [&](const PublicKey &public_key) {
+      return std::ranges::equal(public_key.n, n) && std::ranges::equal(public_key.e, e);
+    });
+    if (known == keys_.end()) {
+      SharedKey key = make_key(attributes, Attributes());
+      if (key == nullptr) return nullptr;
+      if (keys_.size() == kMaxCount) keys_.pop_back();
+      keys_.push_back({{n.begin(), n.end()}, {e.begin(), e.end()}, std::move(key)});
+      known = keys_.end() - 1;
+    }
+    std::rotate(keys_.begin(), known, known + 1);
+    return keys_.front().key;
+  }
+
+ private:
+  static constexpr size_t kMaxCount = 8;
+  struct PublicKey {
+    std::vector<uint8_t> n, e;
+    SharedKey key;
+  };
+  std::vector<PublicKey> keys_;
+};
+
 }  // namespace
 
 uint32_t num_bits(Attributes::Value number) {
@@ -144,11 +174,12 @@ uint32_t num_bits(Attributes::Value number) {
 SharedKey import_rsa_key(const Attributes &attributes) {
   const QuietErrors quiet;
   if (!is_plausible(attributes)) return nullptr;
-  Attributes completion;
-  if (attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT) &&
-      !attributes.contains(TEE_ATTR_RSA_PRIME1)) {
-    find_crt_part(attributes, &completion);
+  if (!attributes.contains(TEE_ATTR_RSA_PRIVATE_EXPONENT)) {
+    static thread_local PublicKeys public_keys;
+    return public_keys.get(attributes);
   }
+  Attributes completion;
+  if (!attributes.contains(TEE_ATTR_RSA_PRIME1)) find_crt_part(attributes, &completion);
   return make_key(attributes, completion);
 }
 

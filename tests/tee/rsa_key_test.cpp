@@ -74,4 +74,24 @@ TEST(RsaKey, APairIsCompletedOrWorksAsItIs) {
   }
 }
 
+// More of them than are kept, and each of them again.
+TEST(RsaKey, APublicKeyIsTheOneOfItsNumbers) {
+  for (uint8_t i = 0; i < 40; ++i) {
+    std::vector<uint8_t> n(64, 0xff), e(1, i % 2 == 0 ? 3 : 5);
+    n[1] = i % 20 & 0xfe;
+    tee::Attributes attributes(n.size() + e.size());
+    attributes.add(TEE_ATTR_RSA_MODULUS, n);
+    attributes.add(TEE_ATTR_RSA_PUBLIC_EXPONENT, e);
+    const tee::SharedKey key = tee::import_rsa_key(attributes);
+    for (auto [name, number] : {std::pair{"n", n}, std::pair{"e", e}}) {
+      BIGNUM *value = nullptr;
+      ASSERT_EQ(EVP_PKEY_get_bn_param(key.get(), name, &value), 1);
+      const tee::Number owned(value);
+      std::vector<uint8_t> bytes(static_cast<size_t>(BN_num_bytes(value)));
+      BN_bn2bin(value, bytes.data());
+      EXPECT_EQ(bytes, number) << int{i};
+    }
+  }
+}
+
 }  // namespace
