@@ -103,11 +103,11 @@ Work rsa(Form form, Keys keys, int (*start)(EVP_PKEY_CTX *, const OSSL_PARAM *),
     return context;
   };
   const Work make = [=] { run(make_context(numbers->make_key()).get()); };
-  if (keys == Keys::kNew) {
+  if (keys == Keys::kNew && form != Form::kPublic) {
     return form == Form::kPairWithoutPrimes ? in_order({completion(), make}) : make;
   }
   const auto key = numbers->make_key();
-  if (keys == Keys::kAtHand) return [=] { run(make_context(key).get()); };
+  if (keys != Keys::kPrepared) return [=] { run(make_context(key).get()); };
   return [context = make_context(key), run] { run(context.get()); };
 }
 

@@ -11,7 +11,7 @@ namespace bench {
 enum class Keys {
   kPrepared,  // with their contexts
   kAtHand,    // a context is made for each operation
-  kNew,       // so is the key, of its numbers, as by a device that keeps none
+  kNew,       // so is a key pair, of its numbers; public keys, which come again, are kept
 };
 
 enum class Form { kPublic, kPair, kPairWithoutPrimes };
