@@ -1,6 +1,10 @@
 // SPDX-License-Identifier: BSD-2-Clause
+#include <algorithm>
+#include <map>
+#include <random>
 #include <vector>
 
+#include "../../tee/src/arena.h"
 #include "tee_support.h"
 
 using namespace tee::test;
@@ -50,6 +54,34 @@ TEST(Heap, KeepsTrackOfManyBlocks) {
   }
   EXPECT_EQ(ta.stats().live_blocks, 0u);
   EXPECT_EQ(ta.stats().in_use, 0u);
+}
+
+// The heap has none where it runs under a sanitizer.
+TEST(Arena, BlocksAreZeroedAndApartAndKnown) {
+  tee::Arena arena;
+  std::map<uint8_t *, uint32_t> live;
+  std::minstd_rand random;
+  bool was_full = false;
+  for (int i = 0; i < 20000; ++i) {
+    const auto len = static_cast<uint32_t>(random() % (tee::Arena::kMaxLen + 1));
+    auto at = live.lower_bound(live.empty() ? nullptr : live.begin()->first + random() % 32768);
+    if (random() % 2 != 0 && at != live.end()) {
+      ASSERT_EQ(arena.length_of(at->first), at->second);
+      arena.give_back(at->first, at->second);
+      ASSERT_FALSE(arena.length_of(at->first));
+      live.erase(at);
+    } else if (auto *block = static_cast<uint8_t *>(arena.take(len))) {
+      ASSERT_TRUE(arena.holds(block) && !arena.length_of(block + 1));
+      ASSERT_EQ(std::count(block, block + len, 0), len);
+      std::fill_n(block, len, 1);
+      at = live.insert({block, len}).first;
+      ASSERT_TRUE(std::next(at) == live.end() || block + std::max(len, 1u) <= std::next(at)->first);
+      ASSERT_TRUE(at == live.begin() || std::prev(at)->first + std::prev(at)->second <= block);
+    } else {
+      was_full = true;
+    }
+  }
+  EXPECT_TRUE(was_full);
 }
 
 TEST(HeapDeathTest, MisusePanics) {
