@@ -253,9 +253,8 @@ dsi_json_str_t *init_dsi() {
 
 // Makes `*list` a member of `into`; the setter's status when it cannot.
 static TEE_Result hand_over(JSON_Object *into, const char *key, JSON_Value **list) {
-  json_ptr value(*list);
-  const JSON_Status set = json_object_take(into, key, &value);
-  *list = value.release();  // NULL when it has been taken
+  const JSON_Status set = json_object_set_value(into, key, *list);
+  if (set == JSONSuccess) *list = nullptr;
   return static_cast<TEE_Result>(set);
 }
 
